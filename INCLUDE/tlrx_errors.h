@@ -1,0 +1,107 @@
+// Numbered errors: code arithmetic, catalogues, the exception record and the
+// raising protocol shared by every module.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+constexpr int32_t CTLRX_PEC_SIZE = 65280;          // codes per primary class
+constexpr int CTLRX_MAX_LEN_IN_ERROR = 48;         // characters per error-file line
+constexpr int CTLRX_MAX_LINE_IN_ERROR = 3;         // message lines in the error file
+constexpr int CTLRX_MAX_LEN_ERROR_TEXT = 1026;     // catalogue text buffers
+constexpr int CTLRX_MAX_LEN_CATALOGUE_TEXT = 1025; // stored secondary texts are cut here
+constexpr int CTLRX_MAX_LEN_MESSAGE = 1028;        // free message of the exception
+constexpr int CTLRX_MAX_LEN_CONTEXT = 25000;       // formatting buffers and process context
+constexpr int CTLRX_MAX_LEN_FILE = 260;
+
+// code = PEC * 65280 + SEC + 1 (SEC -1 for none)
+constexpr int32_t fdfErrorCode(int32_t thePEC, int32_t theSEC) { return thePEC * CTLRX_PEC_SIZE + theSEC + 1; }
+constexpr int32_t fdfGetPEC(int32_t theCode) { return theCode / CTLRX_PEC_SIZE; }
+constexpr int32_t fdfGetSEC(int32_t theCode) { return theCode % CTLRX_PEC_SIZE - 1; }
+
+// Codes of the runtime services and the entry point.
+constexpr int32_t CTLRX_ERR_ALLOCATION = 195840;        // 3, -1
+constexpr int32_t CTLRX_WARN_LINES_PADDED = 130561;     // 2, 0
+constexpr int32_t CTLRX_ERR_WORKING_FILE_REMOVE = 261120; // 4, -1
+constexpr int32_t CTLRX_ERR_FILE_OPEN = 261122;         // 4, 1
+constexpr int32_t CTLRX_ERR_FILE_COPY = 261123;         // 4, 2
+constexpr int32_t CTLRX_ERR_INTERRUPTED = 326400;       // 5, -1
+constexpr int32_t CTLRX_ERR_PARAMETER_FILE = 456960;    // 7, -1
+constexpr int32_t CTLRX_ERR_UNKNOWN_COMMAND = 456963;   // 7, 2
+constexpr int32_t CTLRX_ERR_SETTING_MISSING = 783360;   // 12, -1
+constexpr int32_t CTLRX_ERR_UNEXPECTED = 913920;        // 14, -1
+constexpr int32_t CTLRX_ERR_UNEXPECTED_RASTER = 913921; // 14, 0
+constexpr int32_t CTLRX_ERR_UNEXPECTED_EXIT = 913922;   // 14, 1
+constexpr int32_t CTLRX_WARNING_STATUS = 65280;         // completion with warnings
+
+// One catalogue of texts (errors or warnings), read from a catalogue file.
+class CErrorCatalogue {
+public:
+  int32_t mPECNbr = 0;
+  std::vector<std::string> mPrimaryTexts;
+  std::vector<int32_t> mSECNbr;
+  std::vector<std::vector<std::string>> mSecondaryTexts;
+
+  // Reads the catalogue file; false (catalogue left empty) when it cannot be
+  // read or is malformed.
+  bool load(const char *thePath);
+  void clear();
+  bool empty() const { return mPECNbr == 0; }
+};
+
+CErrorCatalogue &fdfErrorCatalogue();
+CErrorCatalogue &fdfWarningCatalogue();
+
+// Looks up both texts of a code; out buffers hold CTLRX_MAX_LEN_ERROR_TEXT bytes.
+void fdfLookupErrorTexts(const CErrorCatalogue &theCatalogue, int32_t theCode, char *thePrimary, char *theSecondary);
+// Variants used for the error file, with their own fallback texts.
+void fdfErrorFilePrimaryText(const CErrorCatalogue &theCatalogue, int32_t theCode, char *theOut);
+void fdfErrorFileSecondaryText(const CErrorCatalogue &theCatalogue, int32_t theCode, char *theOut);
+
+// Thrown by value where report-and-exit is off (library use and unit tests).
+class CErrorExceptionManager {
+public:
+  char mContext[CTLRX_MAX_LEN_CONTEXT];
+  char mFile[CTLRX_MAX_LEN_FILE];
+  int32_t mLine;
+  int32_t mCode;
+  int32_t mPrimaryCode;
+  int32_t mSecondaryCode;
+  char mPrimaryText[CTLRX_MAX_LEN_ERROR_TEXT];
+  char mSecondaryText[CTLRX_MAX_LEN_ERROR_TEXT];
+  char mMessage[CTLRX_MAX_LEN_MESSAGE];
+
+  CErrorExceptionManager(int32_t theCode, int32_t theLine, const char *theFile, const char *theContext,
+                         const char *theMessage);
+};
+
+// Report-and-exit switch: on from start-up; off (throwing) for library callers.
+void fdfSetReportAndExit(bool theOn);
+bool fdfIsReportAndExit();
+
+// Raises an error: throws CErrorExceptionManager when report-and-exit is off,
+// otherwise writes every report and ends the process.
+[[noreturn]] void fdfRaiseError(int32_t theCode, const char *theMessage, const char *theFile, int theLine);
+// The same with a printf-style message, formatted into a bounded buffer.
+[[noreturn]] void fdfRaiseErrorF(int32_t theCode, const char *theFile, int theLine, const char *theFormat, ...)
+    __attribute__((format(printf, 4, 5)));
+
+// Long form: texts from the error catalogue. Short form: from the warning catalogue.
+void fdfRaiseWarning(int32_t theCode, const char *theMessage, const char *theFile, int theLine);
+void fdfRaiseShortWarning(int32_t theCode, const char *theMessage, const char *theFile, int theLine);
+int32_t fdfGetWarningCount();
+void fdfResetWarningCount();
+
+// Writes the error file and the error status of the working file; the
+// message list ends with nullptr. Reports whether the last file opened.
+bool fdfWriteErrorFile(int32_t theCode, ...);
+
+// Optional hook called with the code before the error file is written.
+using TLRXErrorHook = void (*)(int32_t theCode);
+void fdfSetErrorHook(TLRXErrorHook theHook);
+
+#define TLRX_RAISE(theCode, theMessage) fdfRaiseError((theCode), (theMessage), __FILE__, __LINE__)
+#define TLRX_RAISE_F(theCode, ...) fdfRaiseErrorF((theCode), __FILE__, __LINE__, __VA_ARGS__)
+#define TLRX_WARNING(theCode, theMessage) fdfRaiseWarning((theCode), (theMessage), __FILE__, __LINE__)
+#define TLRX_SHORT_WARNING(theCode, theMessage) fdfRaiseShortWarning((theCode), (theMessage), __FILE__, __LINE__)

@@ -1,0 +1,114 @@
+#include "tlrx_test_support.h"
+
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+
+#include <cstdlib>
+#include <fstream>
+#include <sstream>
+#include <stdexcept>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+CTempDir::CTempDir() {
+  char aTemplate[] = "/tmp/tlrx_test_XXXXXX";
+  const char *aDir = mkdtemp(aTemplate);
+  if (aDir == nullptr)
+    throw std::runtime_error("mkdtemp failed");
+  mPath = std::string(aDir) + "/";
+}
+
+CTempDir::~CTempDir() {
+  if (std::getenv("TLRX_KEEP_TEST_DIRS") == nullptr)
+    std::system(("rm -rf '" + mPath + "'").c_str());
+}
+
+std::string tlrxReadFile(const std::string &thePath) {
+  std::ifstream aIn(thePath, std::ios::binary);
+  std::ostringstream aText;
+  aText << aIn.rdbuf();
+  return aText.str();
+}
+
+void tlrxWriteFile(const std::string &thePath, const std::string &theContent) {
+  std::ofstream aOut(thePath, std::ios::binary | std::ios::trunc);
+  aOut << theContent;
+}
+
+bool tlrxFileExists(const std::string &thePath) {
+  struct stat aStat;
+  return stat(thePath.c_str(), &aStat) == 0;
+}
+
+std::vector<std::string> tlrxReadLines(const std::string &thePath) {
+  std::vector<std::string> aLines;
+  std::ifstream aIn(thePath);
+  for (std::string aLine; std::getline(aIn, aLine);)
+    aLines.push_back(aLine);
+  return aLines;
+}
+
+std::string tlrxBuildDir() { return TLRX_TEST_BUILD_DIR; }
+std::string tlrxBinPath(const std::string &theName) { return tlrxBuildDir() + "/bin/" + theName; }
+std::string tlrxConfigDir() { return tlrxBuildDir() + "/etc/tellurix"; }
+std::string tlrxDataDir() { return TLRX_TEST_DATA_DIR; }
+
+void tlrxStartLibraryEnvironment(const std::string &theWorkDir) {
+  setenv("TELLURIX_INIT_DIR", tlrxConfigDir().c_str(), 1);
+  setenv("TELLURIX_WORKING_DIR", theWorkDir.c_str(), 1);
+  setenv("TELLURIX_BATCH_DIR", theWorkDir.c_str(), 1);
+  unsetenv("TELLURIX_WORKING_FILE");
+  fdfInitEnvironment(true, "Tellurix test banner");
+  fdfSetReportAndExit(false);
+}
+
+void tlrxWriteConfiguration(const std::string &theDir, const std::map<int, std::string> &theReplace, int theLines) {
+  std::vector<std::string> aLines = tlrxReadLines(tlrxConfigDir() + "/Tellurix_configuration.ini");
+  std::ostringstream aOut;
+  for (int i = 0; i < theLines && i < static_cast<int>(aLines.size()); ++i) {
+    auto aFound = theReplace.find(i + 1);
+    aOut << (aFound != theReplace.end() ? aFound->second : aLines[i]) << "\n";
+  }
+  tlrxWriteFile(theDir + "/Tellurix_configuration.ini", aOut.str());
+}
+
+static std::string tlrxQuote(const std::string &theText) {
+  std::string aOut = "'";
+  for (char aChar : theText)
+    aOut += aChar == '\'' ? std::string("'\\''") : std::string(1, aChar);
+  return aOut + "'";
+}
+
+STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &theArgs,
+                 const std::string &theWorkDir, const std::map<std::string, std::string> &theEnv) {
+  std::map<std::string, std::string> aEnv = {{"TELLURIX_INIT_DIR", tlrxConfigDir()},
+                                             {"TELLURIX_WORKING_DIR", theWorkDir},
+                                             {"TELLURIX_BATCH_DIR", theWorkDir},
+                                             {"TELLURIX_WORKING_FILE", ""}};
+  for (const auto &aEntry : theEnv)
+    aEnv[aEntry.first] = aEntry.second;
+  std::string aCommand = "cd " + tlrxQuote(theWorkDir) + " && env";
+  for (const auto &aEntry : aEnv)
+    aCommand += aEntry.second.empty() ? " -u " + aEntry.first : " " + aEntry.first + "=" + tlrxQuote(aEntry.second);
+  aCommand += " " + tlrxQuote(theProgram.find('/') == std::string::npos ? tlrxBinPath(theProgram) : theProgram);
+  for (const std::string &aArg : theArgs)
+    aCommand += " " + tlrxQuote(aArg);
+  aCommand += " </dev/null 2>&1";
+  STLRXRun aRun;
+  FILE *aPipe = popen(aCommand.c_str(), "r");
+  if (aPipe == nullptr)
+    return aRun;
+  char aBuffer[4096];
+  size_t aRead;
+  while ((aRead = fread(aBuffer, 1, sizeof aBuffer, aPipe)) > 0)
+    aRun.mOutput.append(aBuffer, aRead);
+  int aStatus = pclose(aPipe);
+  aRun.mExitStatus = WIFEXITED(aStatus) ? WEXITSTATUS(aStatus) : 128 + WTERMSIG(aStatus);
+  return aRun;
+}
+
+STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,
+                     const std::map<std::string, std::string> &theEnv) {
+  return tlrxRun("main_features_extraction", {theCommandLine}, theWorkDir, theEnv);
+}

@@ -1,0 +1,53 @@
+// Test support: temporary folders, small file helpers, the library
+// environment in throw mode, and running the built executables.
+#pragma once
+
+#include <map>
+#include <string>
+#include <vector>
+
+// A fresh folder under /tmp, removed with its contents at destruction.
+class CTempDir {
+public:
+  CTempDir();
+  ~CTempDir();
+  CTempDir(const CTempDir &) = delete;
+  CTempDir &operator=(const CTempDir &) = delete;
+  // The folder with a trailing "/".
+  const std::string &path() const { return mPath; }
+  std::string file(const std::string &theName) const { return mPath + theName; }
+
+private:
+  std::string mPath;
+};
+
+std::string tlrxReadFile(const std::string &thePath);
+void tlrxWriteFile(const std::string &thePath, const std::string &theContent);
+bool tlrxFileExists(const std::string &thePath);
+std::vector<std::string> tlrxReadLines(const std::string &thePath);
+
+std::string tlrxBuildDir();
+std::string tlrxBinPath(const std::string &theName);
+std::string tlrxConfigDir(); // build-tree configuration folder
+std::string tlrxDataDir();   // installed data files, in the source tree
+
+// Starts the runtime with the build-tree configuration, the given folder as
+// working and batch folder, then switches to throw mode.
+void tlrxStartLibraryEnvironment(const std::string &theWorkDir);
+
+// Writes a configuration file into theDir from the build-tree one, with
+// lines replaced (1-based line number -> text) and the file cut to theLines.
+void tlrxWriteConfiguration(const std::string &theDir, const std::map<int, std::string> &theReplace = {},
+                            int theLines = 14);
+
+struct STLRXRun {
+  int mExitStatus = -1;
+  std::string mOutput; // standard output and error of the run
+};
+// Runs bin/theProgram with theArgs in theWorkDir as working and batch folder
+// (also its current folder); theEnv adds or overrides variables ("" unsets).
+STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &theArgs,
+                 const std::string &theWorkDir, const std::map<std::string, std::string> &theEnv = {});
+// Shortcut for the main program with one command line.
+STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,
+                     const std::map<std::string, std::string> &theEnv = {});
