@@ -1,0 +1,491 @@
+// Runtime environment: start-up configuration, settings table, log and
+// trace, banners, progress protocol with the host and the closing step.
+#include "tlrx_enviroment.h"
+
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_platform.h"
+#include "tlrx_time_man_utility.h"
+
+#include <cmath>
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <fcntl.h>
+#include <limits>
+#include <memory>
+#include <unistd.h>
+#include <utility>
+#include <vector>
+
+namespace {
+
+using CEnvironmentTable = std::vector<std::pair<std::string, std::string>>;
+
+std::unique_ptr<CEnvironmentTable> theEnvironment;
+std::vector<std::string> theDeferredDeletions;
+char theProcessName[CTLRX_MAX_LEN_PROCESS_NAME + 1] = " -";
+std::string theBanner;
+std::string theWorkingFilePath;
+float theDummyValue = 0.0f;
+double theDummyValueDouble = 0.0;
+bool theTracing = false;
+FILE *theTrace = nullptr;
+FILE *theLog = nullptr;
+
+// Settings read from the configuration file, in line order; line 13 is
+// reserved and has no name.
+const char *const theConfigurationNames[CTLRX_CONFIGURATION_LINES] = {
+    "TELLURIX_KEY_FILES_DIR",        "TELLURIX_MANDATORY_DIR",
+    "TELLURIX_WORKING_DIR",          "TELLURIX_EXE_DIR",
+    "TELLURIX_MAP_FILES_DIR",        "TELLURIX_CEOS_DES_FILES_DIR",
+    "TELLURIX_GCP_DATABASE_DIR",     "TELLURIX_ARESYS_DES_FILES_DIR",
+    "TELLURIX_OTHER_01_DES_FILES_DIR", "TELLURIX_XML_SCHEMA_DES_FILES_DIR",
+    "TELLURIX_DEFAULT_BYTE_ORDER",   "TELLURIX_TRACING",
+    nullptr,                         "TELLURIX_DUMMY_VALUE"};
+
+const std::string theStars(160, '*');
+
+std::string fdfWithSeparator(const char *theDir) {
+  std::string aDir(theDir);
+  if (aDir.empty() || (aDir.back() != '/' && aDir.back() != '\\'))
+    aDir += CTLRX_PATH_SEPARATOR;
+  return aDir;
+}
+
+bool fdfVWrite(FILE *theStream, const char *theFormat, va_list theArgs) {
+  if (theStream == nullptr)
+    return false;
+  char aBuffer[CTLRX_MAX_LEN_CONTEXT];
+  std::vsnprintf(aBuffer, sizeof aBuffer, theFormat, theArgs);
+  std::fputs(aBuffer, theStream);
+  std::fflush(theStream);
+  return std::ferror(theStream) == 0;
+}
+
+bool fdfIsSeparator(char theChar) { return theChar == '\\' || theChar == '/'; }
+
+// One configuration line: at most 511 characters, a stray character after a
+// final separator dropped, the line end (and a carriage return) dropped.
+bool fdfReadConfigurationLine(FILE *theFile, std::string &theLine) {
+  theLine.clear();
+  int aChar;
+  bool aAny = false;
+  while ((aChar = std::fgetc(theFile)) != EOF) {
+    aAny = true;
+    if (aChar == '\n')
+      break;
+    if (theLine.size() < CTLRX_MAX_LEN_CONFIGURATION_LINE)
+      theLine += static_cast<char>(aChar);
+  }
+  if (!aAny)
+    return false;
+  if (!theLine.empty() && theLine.back() == '\r')
+    theLine.pop_back();
+  const size_t aLen = theLine.size();
+  if (aLen >= 2 && !fdfIsSeparator(theLine[aLen - 1]) && fdfIsSeparator(theLine[aLen - 2]))
+    theLine.pop_back();
+  return true;
+}
+
+std::string fdfConfigurationDir() {
+  if (const char *aDir = std::getenv("TELLURIX_INIT_DIR"))
+    return fdfWithSeparator(aDir);
+  if (const char *aDir = std::getenv("windir"))
+    return fdfWithSeparator(aDir);
+  const std::string aInstalled = fdfExecutableDir() + "../etc/tellurix/";
+  if (fdfExistFile((aInstalled + "Tellurix_configuration.ini").c_str()))
+    return aInstalled;
+  TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, "windir");
+}
+
+void fdfReadConfiguration(const std::string &theWorkingDirOverride) {
+  const std::string aPath = fdfConfigurationDir() + "Tellurix_configuration.ini";
+  std::unique_ptr<FILE, int (*)(FILE *)> aFile(std::fopen(aPath.c_str(), "r"), std::fclose);
+  if (!aFile)
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aPath.c_str());
+  std::string aLine;
+  for (int i = 0; i < CTLRX_CONFIGURATION_LINES; ++i) {
+    if (!fdfReadConfigurationLine(aFile.get(), aLine))
+      TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, theConfigurationNames[i] != nullptr ? theConfigurationNames[i]
+                                                                                : "reserved configuration line 13");
+    if (theConfigurationNames[i] != nullptr)
+      fdfSetEnvVar(aLine.c_str(), theConfigurationNames[i]);
+  }
+  if (!theWorkingDirOverride.empty())
+    fdfSetEnvVar(theWorkingDirOverride.c_str(), "TELLURIX_WORKING_DIR");
+}
+
+void fdfExitHandler() {
+  try {
+    for (const std::string &aName : theDeferredDeletions)
+      NTLRX_UTILITY_SpawnDeleteFile(aName.c_str());
+    theDeferredDeletions.clear();
+  } catch (...) {
+    // Exiting already: report without calling exit again.
+    fdfWriteErrorFile(CTLRX_ERR_UNEXPECTED_EXIT, "main_delete_file", static_cast<const char *>(nullptr));
+    _exit(fdfExitStatus(CTLRX_ERR_UNEXPECTED_EXIT));
+  }
+}
+
+void fdfStarsLine(bool theToLog, bool theToTrace, const char *theFormat, ...) __attribute__((format(printf, 3, 4)));
+void fdfStarsLine(bool theToLog, bool theToTrace, const char *theFormat, ...) {
+  va_list aArgs;
+  if (theToLog) {
+    va_start(aArgs, theFormat);
+    fdfVWrite(theLog, theFormat, aArgs);
+    va_end(aArgs);
+  }
+  if (theToTrace && theTracing) {
+    va_start(aArgs, theFormat);
+    fdfVWrite(theTrace, theFormat, aArgs);
+    va_end(aArgs);
+  }
+}
+
+// The banner blocks go to the log and then, the same, to the trace.
+void fdfWriteStartBanner(FILE *theStream, const char *const *theArgv, int theArgc, const char *theParamText) {
+  if (theStream == nullptr)
+    return;
+  std::fprintf(theStream, "\n\n\n%s\nSTART : %s  [ %s ]\n%s%s\n\n", theStars.c_str(), fdfGetProcessName(),
+               theBanner.c_str(), fdfGetAscTime().c_str(), theStars.c_str());
+  if (theParamText != nullptr)
+    std::fputs(theParamText, theStream);
+  else
+    for (int i = 0; i < theArgc; ++i)
+      std::fprintf(theStream, " Parameter %d (%s)\n", i, theArgv[i] != nullptr ? theArgv[i] : "");
+  std::fprintf(theStream, "\n%s\n\n", theStars.c_str());
+  std::fflush(theStream);
+}
+
+} // namespace
+
+bool fdfGetEnvVar(std::string &theValue, const char *theName) {
+  if (!theEnvironment)
+    return false;
+  for (const auto &aEntry : *theEnvironment)
+    if (aEntry.first == theName) {
+      theValue = aEntry.second;
+      return true;
+    }
+  return false;
+}
+
+std::string fdfGetRequiredEnvVar(const char *theName) {
+  std::string aValue;
+  if (!fdfGetEnvVar(aValue, theName))
+    TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, theName);
+  return aValue;
+}
+
+void fdfSetEnvVar(const char *theValue, const char *theName) {
+  if (!theEnvironment) {
+    theEnvironment = std::make_unique<CEnvironmentTable>();
+    theEnvironment->reserve(50);
+  }
+  for (auto &aEntry : *theEnvironment)
+    if (aEntry.first == theName) {
+      aEntry.second = theValue;
+      return;
+    }
+  theEnvironment->emplace_back(theName, theValue);
+}
+
+bool fdfEnvironmentExists() { return theEnvironment != nullptr; }
+void fdfDeleteEnvironment() { theEnvironment.reset(); }
+
+void fdfSetProcessName(const char *theName) {
+  std::snprintf(theProcessName, sizeof theProcessName, " %s", theName != nullptr ? theName : "");
+  for (char *aChar = theProcessName; *aChar != '\0'; ++aChar)
+    if (*aChar == '\n' || *aChar == '\r')
+      *aChar = ' ';
+}
+
+const char *fdfGetProcessName() { return theProcessName; }
+void fdfSetBanner(const char *theText) { theBanner = theText != nullptr ? theText : ""; }
+const char *fdfGetBanner() { return theBanner.c_str(); }
+float fdfGetDummyValue() { return theDummyValue; }
+double fdfGetDummyValueDouble() { return theDummyValueDouble; }
+
+void fdfSetDummyValue(const char *theSetting) {
+  if (std::strncmp(theSetting, "NaN", 3) == 0) {
+    theDummyValue = std::numeric_limits<float>::quiet_NaN();
+    theDummyValueDouble = std::numeric_limits<double>::quiet_NaN();
+    // All exponent and mantissa bits set, sign clear.
+    const uint32_t aBits32 = 0x7fffffffu;
+    const uint64_t aBits64 = 0x7fffffffffffffffull;
+    std::memcpy(&theDummyValue, &aBits32, sizeof aBits32);
+    std::memcpy(&theDummyValueDouble, &aBits64, sizeof aBits64);
+    return;
+  }
+  theDummyValueDouble = std::atof(theSetting);
+  theDummyValue = static_cast<float>(theDummyValueDouble);
+}
+
+const std::string &fdfGetWorkingFilePath() { return theWorkingFilePath; }
+void fdfSetWorkingFilePath(const std::string &thePath) { theWorkingFilePath = thePath; }
+
+bool fdfLogMessage(const char *theFormat, ...) {
+  va_list aArgs;
+  va_start(aArgs, theFormat);
+  const bool aOk = fdfVWrite(theLog, theFormat, aArgs);
+  va_end(aArgs);
+  return aOk;
+}
+
+bool fdfTraceMessage(const char *theFormat, ...) {
+  if (!theTracing)
+    return true;
+  va_list aArgs;
+  va_start(aArgs, theFormat);
+  const bool aOk = fdfVWrite(theTrace, theFormat, aArgs);
+  va_end(aArgs);
+  return aOk;
+}
+
+bool fdfIsTracing() { return theTracing; }
+
+bool fdfOpenTrace(bool theAppend) {
+  std::string aTracing;
+  if (!fdfGetEnvVar(aTracing, "TELLURIX_TRACING") || aTracing.compare(0, 6, "ACTIVE") != 0)
+    return false;
+  const std::string aPath = fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + "Process.trace";
+  if (theTrace != nullptr)
+    std::fclose(theTrace);
+  theTrace = std::fopen(aPath.c_str(), theAppend ? "a" : "w");
+  if (theTrace == nullptr)
+    return false;
+  theTracing = true;
+  std::fputs("OpenTrace 1  2\n", theTrace);
+  std::fflush(theTrace);
+  fdfRedirectStdStreams(aPath);
+  return std::ferror(theTrace) == 0;
+}
+
+void fdfCloseTrace() {
+  if (theTrace == nullptr)
+    return;
+  std::fclose(theTrace);
+  theTrace = nullptr;
+  theTracing = false;
+  fdfRestoreStdStreams();
+  std::string aDir;
+  if (!fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR"))
+    return;
+  if (fdfExistFile((aDir + "Process.trace_save").c_str())) {
+    fdfCopyFile((aDir + "Process.trace").c_str(), (aDir + "Process" + fdfGetTimeStamp() + ".trace").c_str(), true);
+    fdfSleep(1);
+  }
+}
+
+bool fdfOpenTellurixLog() {
+  std::string aDir;
+  if (!fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR"))
+    return false;
+  const std::string aPath = aDir + "Process.log";
+  fdfTraceMessage("\nfdfOpenTellurixLog(%s);\n\n", aPath.c_str());
+  const int aFd = open(aPath.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
+  if (aFd < 0)
+    return false;
+  if (theLog != nullptr)
+    std::fclose(theLog);
+  theLog = fdopen(aFd, "a");
+  return theLog != nullptr;
+}
+
+void fdfCloseTellurixLog() {
+  if (theLog != nullptr)
+    std::fclose(theLog);
+  theLog = nullptr;
+}
+
+bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
+  theTracing = false;
+  fdfSetReportAndExit(true);
+  fdfReserveStdDescriptors();
+  fdfSetBanner(theBanner);
+  fdfInstallAllocationFailureHandler();
+  std::srand(static_cast<unsigned>(std::time(nullptr)));
+  fdfSetProcessName("-");
+  fdfErrorCatalogue().clear();
+  fdfWarningCatalogue().clear();
+  static bool theExitHandlerRegistered = false;
+  if (!theExitHandlerRegistered)
+    theExitHandlerRegistered = std::atexit(fdfExitHandler) == 0;
+  theEnvironment = std::make_unique<CEnvironmentTable>();
+  theEnvironment->reserve(50);
+  theDeferredDeletions.clear();
+  theDeferredDeletions.reserve(110);
+  theWorkingFilePath.clear();
+
+  std::string aWorkingDir;
+  if (const char *aEnv = std::getenv("TELLURIX_WORKING_DIR"))
+    aWorkingDir = fdfWithSeparator(aEnv);
+  fdfReadConfiguration(aWorkingDir);
+
+  if (const char *aBatch = std::getenv("TELLURIX_BATCH_DIR")) {
+    std::fprintf(stderr, "TELLURIX_BATCH_DIR Found =%s\n", aBatch);
+    fdfSetEnvVar(fdfWithSeparator(aBatch).c_str(), "TELLURIX_BATCH_DIR");
+  } else {
+    fdfSetEnvVar(fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR").c_str(), "TELLURIX_BATCH_DIR");
+  }
+  const char *aWorkingFile = std::getenv("TELLURIX_WORKING_FILE");
+  theWorkingFilePath = fdfGetRequiredEnvVar("TELLURIX_BATCH_DIR") + (aWorkingFile != nullptr ? aWorkingFile : "Process.working");
+  fdfSetDummyValue(fdfGetRequiredEnvVar("TELLURIX_DUMMY_VALUE").c_str());
+  if (const char *aGcp = std::getenv("TELLURIX_GCP_DATABASE_DIR"))
+    fdfSetEnvVar(fdfWithSeparator(aGcp).c_str(), "TELLURIX_GCP_DATABASE_DIR");
+
+  if (!theFullSet)
+    return true;
+  const std::string aDesDir = fdfGetRequiredEnvVar("TELLURIX_CEOS_DES_FILES_DIR");
+  for (auto aEntry : {std::make_pair(&fdfErrorCatalogue(), "tlrx_errors_catalog.des"),
+                      std::make_pair(&fdfWarningCatalogue(), "tlrx_warnings_catalog.des")}) {
+    const std::string aPath = aDesDir + aEntry.second;
+    if (!aEntry.first->load(aPath.c_str()))
+      TLRX_RAISE(261121, aPath.c_str());
+  }
+  fdfResetWarningCount();
+  fdfOpenTrace(false);
+  // Without its log the host would not see how the run ended.
+  if (!fdfOpenTellurixLog())
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, (fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + "Process.log").c_str());
+  return true;
+}
+
+void fdfStartProcess(const char *const *theArgv, int theArgc, const char *theName, const char *theParamText) {
+  fdfSetProcessName(theName);
+  fdfWriteStartBanner(theLog, theArgv, theArgc, theParamText);
+  if (theTracing)
+    fdfWriteStartBanner(theTrace, theArgv, theArgc, theParamText);
+}
+
+void fdfEndBanner() {
+  fdfStarsLine(true, true, "\n%s\nEND : %s  -  %s%s\n\n", theStars.c_str(), theBanner.c_str(), fdfGetAscTime().c_str(),
+               theStars.c_str());
+}
+
+namespace {
+
+void fdfTraceStreamState(int theAttempt, const std::string &thePath, FILE *theFile) {
+  std::string aState = " RDSTATE = ";
+  if (theFile != nullptr && std::feof(theFile))
+    aState += "End of file reached";
+  if (theFile == nullptr || std::ferror(theFile))
+    aState += "| A possibly recoverable formatting or conversion error";
+  fdfTraceMessage("%d File %s attempt open : %s\n", theAttempt, thePath.c_str(), aState.c_str());
+}
+
+// Creates a missing working file with the new percentage and text.
+void fdfCreateWorkingFile(const std::string &thePath, int theNew, const char *theText) {
+  fdfTraceMessage("getAndSetPerc - Not found the file : %s\n", thePath.c_str());
+  for (int aAttempt = 0; aAttempt < 10; ++aAttempt) {
+    FILE *aFile = std::fopen(thePath.c_str(), "w");
+    if (aFile != nullptr) {
+      std::fprintf(aFile, "%i\n%s\n", theNew, theText != nullptr ? theText : "");
+      std::fclose(aFile);
+      return;
+    }
+    fdfTraceMessage("%d getAndSetPerc - Not found the file : %s  attempt create : \n", aAttempt, thePath.c_str());
+    fdfSleep(aAttempt);
+  }
+  fdfTraceMessage(" File ERROR %s not found\n", thePath.c_str());
+  TLRX_RAISE(CTLRX_ERR_INTERRUPTED, thePath.c_str());
+}
+
+FILE *fdfOpenWorkingFile(const std::string &thePath) {
+  for (int aAttempt = 0; aAttempt < 5; ++aAttempt) {
+    FILE *aFile = std::fopen(thePath.c_str(), "r+");
+    if (aFile != nullptr)
+      return aFile;
+    fdfSleep(aAttempt);
+    fdfTraceStreamState(aAttempt, thePath, nullptr);
+  }
+  return nullptr;
+}
+
+bool fdfWaitForWorkingFile(const std::string &thePath) {
+  for (int aCheck = 0; aCheck < 10; ++aCheck) {
+    if (fdfExistFile(thePath.c_str()))
+      return true;
+    fdfTraceMessage("%d] getAndSetPerc - Not found the file : %s\n", aCheck, thePath.c_str());
+    fdfSleep(aCheck);
+  }
+  return false;
+}
+
+} // namespace
+
+void getAndSetPerc(int thePrevious, int theNew, const char *theText) {
+  if (theNew == thePrevious || theNew >= 100)
+    return;
+  const std::string &aPath = theWorkingFilePath;
+  fdfRemoveFile((aPath + "_batch_ok").c_str());
+  if (!fdfWaitForWorkingFile(aPath)) {
+    fdfCreateWorkingFile(aPath, theNew, theText);
+    return;
+  }
+  FILE *aFile = fdfOpenWorkingFile(aPath);
+  if (aFile == nullptr)
+    return;
+  char aLine1[CTLRX_MAX_LEN_WORKING_LINE + 1] = "";
+  char aLine2[CTLRX_MAX_LEN_WORKING_LINE + 1] = "";
+  if (std::fgets(aLine1, sizeof aLine1, aFile) != nullptr && std::fgets(aLine2, sizeof aLine2, aFile) != nullptr)
+    aLine2[std::strcspn(aLine2, "\r\n")] = '\0';
+  int aHostValue = 0;
+  if (std::sscanf(aLine1, "%i", &aHostValue) == 1 && aHostValue > 100) {
+    std::fclose(aFile);
+    fdfTraceMessage("\n EXECUTION INTERRUPTED BY OPERATOR\n");
+    TLRX_RAISE(CTLRX_ERR_INTERRUPTED, nullptr);
+  }
+  std::rewind(aFile);
+  const int aLen = std::fprintf(aFile, "%i\n%s\n", theNew, theText != nullptr ? theText : aLine2);
+  std::fflush(aFile);
+  // A shorter status must not leave the tail of the previous one behind.
+  if (aLen > 0 && ftruncate(fileno(aFile), aLen) != 0)
+    fdfTraceMessage("getAndSetPerc - cannot truncate %s\n", aPath.c_str());
+  std::fclose(aFile);
+}
+
+void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
+  std::string aDir;
+  fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR");
+  if (theFinalText) {
+    if (theCode != 0)
+      fdfLogMessage("\n\n-%s   %s\n\n%s\n\nERROR :\n  %s\n\n", fdfGetProcessName(), theBanner.c_str(),
+                    fdfGetAscTime().c_str(), " ");
+    else if (theSuccessText)
+      fdfLogMessage("\n\nSUCCESSFUL\n\n%s\n\n", fdfGetAscTime().c_str());
+    fdfEndBanner();
+    fdfCloseTellurixLog();
+    fdfCloseTrace();
+  }
+  const std::string aTrace = aDir + "Process.trace";
+  if (theCode != 0 && !aDir.empty() && fdfExistFile(aTrace.c_str()))
+    fdfCopyFile(aTrace.c_str(), (aDir + "Process_" + fdfGetTimeStamp() + "_trace.txt").c_str(), true);
+  if (theCode == 0 && fdfExistFile(theWorkingFilePath.c_str())) {
+    if (fdfGetWarningCount() > 0) {
+      fdfWriteErrorFile(CTLRX_WARNING_STATUS, "", static_cast<const char *>(nullptr));
+    } else {
+      fdfRemoveFile(theWorkingFilePath.c_str());
+      for (int aAttempt = 0; aAttempt < 30 && fdfExistFile(theWorkingFilePath.c_str()); ++aAttempt) {
+        fdfSleep(static_cast<int>(aAttempt * 0.1));
+        fdfRemoveFile(theWorkingFilePath.c_str());
+      }
+      if (fdfExistFile(theWorkingFilePath.c_str()))
+        TLRX_RAISE(CTLRX_ERR_WORKING_FILE_REMOVE, theWorkingFilePath.c_str());
+    }
+  }
+  const std::string aLog = aDir + "Process.log";
+  if (!aDir.empty() && fdfExistFile(aLog.c_str()) && fdfGetFileSize(aLog.c_str()) > CTLRX_MAX_LOG_SIZE) {
+    fdfCopyFile(aLog.c_str(), (aDir + "Process_" + fdfGetTimeStamp() + "_log.txt").c_str(), true);
+    fdfRemoveFile(aLog.c_str());
+  }
+  if (fdfGetWarningCount() > 0)
+    fdfExitProcess(CTLRX_WARNING_STATUS);
+  if (theCode != 0)
+    fdfExitProcess(theCode);
+}
+
+void fdfAddDeferredDeletion(const char *theFileName) { theDeferredDeletions.emplace_back(theFileName); }

@@ -1,0 +1,269 @@
+// Small services shared by the runtime and the commands.
+#include "tlrx_generic_utility.h"
+
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_platform.h"
+
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <memory>
+#include <new>
+#include <sys/stat.h>
+#include <unistd.h>
+
+namespace {
+
+// Companions of a raster N, removed with it in this order.
+const char *const theCompanionSuffixes[] = {
+    "_hdr", ".hdr", ".sml", "_orb.sml", ".xls", ".shx", ".shp", ".shp.sml", ".kml", ".shp_hdr", ".shp.hdr",
+    ".dbf", ".xml", ".txt", ".old.hdr", ".old.sml", "_old.hdr", "_old.sml", ".TellurixParameterExtracted",
+    ".TellurixParameterExtracted.sml"};
+const char *const theStemSuffixes[] = {"_raw", "_slc", "_gr"};
+const char *const theStemCompanions[] = {".TellurixParameterExtracted.sml", ".hdr"};
+const char *const theHeaderCompanions[] = {"_hdr.old.hdr", "_hdr.old.sml", "_tmp_hdr.hdr",
+                                           "_tmp_hdr.sml", "_hdr_tmp.hdr", "_hdr_tmp.sml"};
+
+struct SDeletionEntry {
+  std::string mName;
+  bool mWithCompanions;
+};
+std::vector<SDeletionEntry> theDeletionList;
+
+bool fdfEndsWith(const std::string &theText, const char *theSuffix) {
+  const size_t aLen = std::strlen(theSuffix);
+  return theText.size() >= aLen && theText.compare(theText.size() - aLen, aLen, theSuffix) == 0;
+}
+
+void fdfRemoveIfExists(const std::string &theName) {
+  if (fdfExistFile(theName.c_str()))
+    fdfRemoveFile(theName.c_str());
+}
+
+void fdfDeleteCompanions(const std::string &theName) {
+  for (const char *aSuffix : theCompanionSuffixes)
+    fdfRemoveIfExists(theName + aSuffix);
+  for (const char *aStemSuffix : theStemSuffixes) {
+    if (!fdfEndsWith(theName, aStemSuffix))
+      continue;
+    const std::string aStem = theName.substr(0, theName.size() - std::strlen(aStemSuffix));
+    for (const char *aSuffix : theStemCompanions)
+      fdfRemoveIfExists(aStem + aSuffix);
+  }
+  for (const char *aSuffix : theHeaderCompanions)
+    fdfRemoveIfExists(theName + aSuffix);
+}
+
+std::string fdfHdrToSml(const std::string &theName) {
+  return fdfEndsWith(theName, "_hdr") ? theName.substr(0, theName.size() - 4) + ".sml" : theName;
+}
+
+bool fdfCopyContents(const std::string &theSource, const std::string &theDest) {
+  const int aIn = open(theSource.c_str(), O_RDONLY | O_CLOEXEC);
+  if (aIn < 0)
+    return false;
+  const int aOut = open(theDest.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+  if (aOut < 0) {
+    const int aError = errno;
+    close(aIn);
+    errno = aError;
+    return false;
+  }
+  char aBuffer[1 << 16];
+  bool aOk = true;
+  for (ssize_t aRead; (aRead = read(aIn, aBuffer, sizeof aBuffer)) != 0;) {
+    if (aRead < 0 || write(aOut, aBuffer, static_cast<size_t>(aRead)) != aRead) {
+      aOk = false;
+      break;
+    }
+  }
+  const int aError = errno;
+  close(aIn);
+  if (close(aOut) != 0)
+    aOk = false;
+  errno = aError;
+  return aOk;
+}
+
+void fdfNewHandler() { fdfAllocationFailure(0); }
+
+} // namespace
+
+bool fdfExistFile(const char *theName) {
+  if (theName == nullptr || theName[0] == '\0' || std::strstr(theName, "NotOK") != nullptr)
+    return false;
+  struct stat aStat;
+  return stat(theName, &aStat) == 0;
+}
+
+long long fdfGetFileSize(const char *theName) {
+  struct stat aStat;
+  if (theName == nullptr || stat(theName, &aStat) != 0)
+    return -1;
+  return static_cast<long long>(aStat.st_size);
+}
+
+bool fdfRemoveFile(const char *theName) {
+  if (theName == nullptr || theName[0] == '\0')
+    return false;
+  chmod(theName, S_IRUSR | S_IWUSR);
+  return unlink(theName) == 0;
+}
+
+bool fdfDeleteRaster(const char *theName, bool theWithCompanions, bool theDeleteFile) {
+  bool aRemoved = false;
+  if (theDeleteFile)
+    aRemoved = fdfRemoveFile(theName);
+  if (theWithCompanions)
+    fdfDeleteCompanions(theName);
+  return aRemoved;
+}
+
+void fdfCopyFile(const char *theSource, const char *theDest, bool theKeepGoing) {
+  std::string aSource(theSource);
+  std::string aDest(theDest);
+  if (!fdfExistFile(theSource) && !theKeepGoing) {
+    aSource = fdfHdrToSml(aSource);
+    aDest = fdfHdrToSml(aDest);
+    fdfTraceMessage("Src : %s\nDest : %s\n", aSource.c_str(), aDest.c_str());
+  }
+  if (fdfExistFile(aDest.c_str()))
+    fdfRemoveFile(aDest.c_str());
+  if (fdfCopyContents(aSource, aDest))
+    return;
+  const int aError = errno;
+  fdfTraceMessage("Source file name : %s\nDest file name : %s\n", aSource.c_str(), aDest.c_str());
+  if (theKeepGoing)
+    return;
+  TLRX_RAISE_F(CTLRX_ERR_FILE_COPY, "ERROR CODE %d [%s];    %s", aError, std::strerror(aError), aSource.c_str());
+}
+
+unsigned long long fdfGetMemoryStatus(bool theTrace) {
+  const STLRXMemoryStatus aStatus = fdfReadMemoryStatus();
+  if (theTrace && fdfIsTracing())
+    fdfTraceMessage("\n Memory Status :\n Memory Load     = %llu\n Total Phys      = %llu\n Avail Phys      = %llu\n"
+                    " Total Page File = %llu\n Avail Page File = %llu\n Total Virtual   = %llu\n"
+                    " Avail Virtual   = %llu\n",
+                    aStatus.mLoadPercent, aStatus.mTotalPhys, aStatus.mAvailPhys, aStatus.mTotalPageFile,
+                    aStatus.mAvailPageFile, aStatus.mTotalVirtual, aStatus.mAvailVirtual);
+  return aStatus.mTotalPhys;
+}
+
+void fdfInstallAllocationFailureHandler() { std::set_new_handler(fdfNewHandler); }
+
+void fdfAllocationFailure(unsigned long long theSize) {
+  // Reporting needs a little memory of its own: stop asking for more first.
+  std::set_new_handler(nullptr);
+  fdfTraceMessage(" Memory Not Found size KB = %llu\n Memory Not Found size = %llu\n", theSize / 1000, theSize);
+  fdfGetMemoryStatus(true);
+  TLRX_RAISE_F(CTLRX_ERR_ALLOCATION, "%ld,%ld", static_cast<long>(theSize / 1000), static_cast<long>(theSize));
+}
+
+int NTLRX_UTILITY_SpawnDeleteFile(const char *theName) {
+  fdfTraceMessage("\nNTLRX_UTILITY_SpawnDeleteFile(%s) ", theName);
+  std::string aExeDir;
+  fdfGetEnvVar(aExeDir, "TELLURIX_EXE_DIR");
+  const std::string aExe = aExeDir + "main_delete_file";
+  return fdfSpawnDetached(aExe.c_str(), "main_delete_file", theName);
+}
+
+void fdfAddToDeletionList(const char *theName, bool theWithCompanions) {
+  theDeletionList.push_back({theName, theWithCompanions});
+}
+
+void fdfRunDeletionList(bool theExecute) {
+  fdfTraceMessage("NUMBER of file to delete : %d\n", static_cast<int>(theDeletionList.size()));
+  for (size_t i = 0; i < theDeletionList.size(); ++i) {
+    const SDeletionEntry &aEntry = theDeletionList[i];
+    const char *aFlag = aEntry.mWithCompanions ? "true" : "false";
+    if (theExecute) {
+      fdfTraceMessage("%d] deleteFile(%s, %s)\n", static_cast<int>(i), aEntry.mName.c_str(), aFlag);
+      fdfDeleteRaster(aEntry.mName.c_str(), aEntry.mWithCompanions, true);
+    } else {
+      fdfTraceMessage("%d] NO deleteFile(%s, %s)\n", static_cast<int>(i), aEntry.mName.c_str(), aFlag);
+    }
+  }
+  theDeletionList.clear();
+}
+
+namespace {
+
+std::string fdfTrim(const std::string &theLine) {
+  const size_t aStart = theLine.find_first_not_of(' ');
+  if (aStart == std::string::npos)
+    return std::string();
+  return theLine.substr(aStart, theLine.find_last_not_of(' ') - aStart + 1);
+}
+
+std::string fdfFindListFile(const char *theFileName) {
+  if (fdfExistFile(theFileName))
+    return theFileName;
+  const std::string aName(theFileName != nullptr ? theFileName : "");
+  const size_t aSlash = aName.find_last_of("/\\");
+  const std::string aInWorkingDir =
+      fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + (aSlash == std::string::npos ? aName : aName.substr(aSlash + 1));
+  if (fdfExistFile(aInWorkingDir.c_str()))
+    return aInWorkingDir;
+  TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aName.c_str());
+}
+
+} // namespace
+
+std::vector<std::string> fdfReadLineList(const char *theFileName, bool theTrim) {
+  const std::string aPath = fdfFindListFile(theFileName);
+  std::unique_ptr<FILE, int (*)(FILE *)> aFile(std::fopen(aPath.c_str(), "r"), std::fclose);
+  if (!aFile)
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aPath.c_str());
+  std::vector<std::string> aLines;
+  std::string aLine;
+  int aChar = 0;
+  while (aChar != EOF) {
+    aLine.clear();
+    bool aAny = false;
+    // Characters past the 10000th of a line are dropped, not read as a new line.
+    while ((aChar = std::fgetc(aFile.get())) != EOF && aChar != '\n') {
+      aAny = true;
+      if (aChar != '\r' && aLine.size() < CTLRX_MAX_LEN_LIST_LINE)
+        aLine += static_cast<char>(aChar);
+    }
+    if (aChar == EOF && !aAny)
+      break;
+    if (!aLine.empty() && aLine[0] == '#')
+      break;
+    aLines.push_back(theTrim ? fdfTrim(aLine) : aLine);
+  }
+  return aLines;
+}
+
+std::vector<std::string> fdfReadArgumentFile(const char *theArgument) {
+  std::string aPath(theArgument != nullptr ? theArgument : "");
+  const size_t aTrailer = aPath.find("###Tellurix###");
+  if (aTrailer != std::string::npos)
+    aPath.erase(aTrailer);
+  std::vector<std::string> aLines = fdfReadLineList(aPath.c_str(), true);
+  if (aLines.size() < 2)
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aPath.c_str());
+  aLines.erase(aLines.begin());
+  return aLines;
+}
+
+std::string fdfIntToText(long theValue) {
+  char aText[32];
+  if (theValue <= 32000)
+    std::snprintf(aText, sizeof aText, "%ld", theValue);
+  else
+    std::snprintf(aText, sizeof aText, "%ld%04ld", theValue / 10000, theValue % 10000);
+  return aText;
+}
+
+bool fdfIsNull(double theValue, double theNull) {
+  constexpr double aTolerance = 1.1754943508222875e-38;
+  if (std::isnan(theNull))
+    return std::isnan(theValue);
+  return theNull - aTolerance <= theValue && theValue <= theNull + aTolerance;
+}
+
+bool fdfIsSwitchOn(const std::string &theText) { return theText == "OK"; }

@@ -1,0 +1,212 @@
+// Linux stand-ins for the operating-system services of the program.
+#include "tlrx_platform.h"
+
+#include "tlrx_errors.h"
+
+#include <cerrno>
+#include <chrono>
+#include <climits>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <fstream>
+#include <iostream>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <thread>
+#include <unistd.h>
+
+extern char **environ;
+
+namespace {
+
+const auto theStartTime = std::chrono::steady_clock::now();
+
+void fdfRealSleep(double theSeconds) {
+  if (theSeconds > 0)
+    std::this_thread::sleep_for(std::chrono::duration<double>(theSeconds));
+}
+
+TLRXSleepFunction theSleepFunction = fdfRealSleep;
+
+// Saved copies of descriptors 0 to 2 while they are redirected; -1 when not.
+int theSavedStd[3] = {-1, -1, -1};
+// The C++ log stream gets a file buffer of its own while redirected.
+std::filebuf theClogFile;
+std::streambuf *theSavedClog = nullptr;
+
+} // namespace
+
+long long fdfProcessClock() {
+  return std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - theStartTime)
+      .count();
+}
+
+void fdfSleep(double theSeconds) { theSleepFunction(theSeconds); }
+
+TLRXSleepFunction fdfSetSleepFunction(TLRXSleepFunction theFunction) {
+  TLRXSleepFunction aOld = theSleepFunction;
+  theSleepFunction = theFunction != nullptr ? theFunction : fdfRealSleep;
+  return aOld;
+}
+
+int fdfExitStatus(int32_t theCode) {
+  if (theCode == 0)
+    return 0;
+  const int32_t aPEC = theCode > 0 ? fdfGetPEC(theCode) : 0;
+  return static_cast<int>(aPEC + 1 > 125 ? 125 : aPEC + 1);
+}
+
+void fdfExitProcess(int32_t theCode) {
+  std::fflush(nullptr);
+  std::exit(fdfExitStatus(theCode));
+}
+
+int fdfSpawnDetached(const char *theExe, const char *theArg0, const char *theArg1) {
+  // Double fork: the middle child starts a new session, spawns the worker
+  // and exits at once, so the worker is adopted by init and never a zombie.
+  pid_t aMiddle = fork();
+  if (aMiddle < 0)
+    return errno;
+  if (aMiddle == 0) {
+    setsid();
+    char *aArgv[] = {const_cast<char *>(theArg0), const_cast<char *>(theArg1), nullptr};
+    pid_t aWorker;
+    const int aError = posix_spawn(&aWorker, theExe, nullptr, nullptr, aArgv, environ);
+    _exit(aError == 0 ? 0 : (aError & 0x7f));
+  }
+  int aStatus = 0;
+  while (waitpid(aMiddle, &aStatus, 0) < 0 && errno == EINTR) {
+  }
+  if (WIFEXITED(aStatus))
+    return WEXITSTATUS(aStatus);
+  return ECHILD;
+}
+
+std::string fdfExecutableDir() {
+  char aPath[PATH_MAX];
+  const ssize_t aLen = readlink("/proc/self/exe", aPath, sizeof aPath - 1);
+  if (aLen <= 0)
+    return "./";
+  aPath[aLen] = '\0';
+  std::string aText(aPath);
+  return aText.substr(0, aText.rfind('/') + 1);
+}
+
+namespace {
+
+unsigned long long fdfMemInfoValue(const std::string &theText, const char *theKey) {
+  const size_t aPos = theText.find(theKey);
+  if (aPos == std::string::npos)
+    return 0;
+  return std::strtoull(theText.c_str() + aPos + std::strlen(theKey), nullptr, 10) * 1024ULL;
+}
+
+unsigned long long fdfCgroupLimit() {
+  std::ifstream aIn("/sys/fs/cgroup/memory.max");
+  std::string aValue;
+  if (!(aIn >> aValue)) {
+    std::ifstream aV1("/sys/fs/cgroup/memory/memory.limit_in_bytes");
+    if (!(aV1 >> aValue))
+      return 0;
+  }
+  if (aValue == "max")
+    return 0;
+  return std::strtoull(aValue.c_str(), nullptr, 10);
+}
+
+} // namespace
+
+STLRXMemoryStatus fdfReadMemoryStatus() {
+  STLRXMemoryStatus aStatus;
+  std::ifstream aIn("/proc/meminfo");
+  std::string aText((std::istreambuf_iterator<char>(aIn)), std::istreambuf_iterator<char>());
+  aStatus.mTotalPhys = fdfMemInfoValue(aText, "MemTotal:");
+  aStatus.mAvailPhys = fdfMemInfoValue(aText, "MemAvailable:");
+  aStatus.mTotalPageFile = fdfMemInfoValue(aText, "SwapTotal:");
+  aStatus.mAvailPageFile = fdfMemInfoValue(aText, "SwapFree:");
+  const unsigned long long aLimit = fdfCgroupLimit();
+  if (aLimit > 0 && aLimit < aStatus.mTotalPhys) {
+    aStatus.mTotalPhys = aLimit;
+    if (aStatus.mAvailPhys > aLimit)
+      aStatus.mAvailPhys = aLimit;
+  }
+  aStatus.mTotalVirtual = aStatus.mTotalPhys + aStatus.mTotalPageFile;
+  aStatus.mAvailVirtual = aStatus.mAvailPhys + aStatus.mAvailPageFile;
+  if (aStatus.mTotalPhys > 0)
+    aStatus.mLoadPercent = 100 - aStatus.mAvailPhys * 100 / aStatus.mTotalPhys;
+  return aStatus;
+}
+
+void fdfReserveStdDescriptors() {
+  for (int aFd = 0; aFd <= 2; ++aFd) {
+    if (fcntl(aFd, F_GETFD) == -1 && errno == EBADF) {
+      const int aNull = open("/dev/null", aFd == 0 ? O_RDONLY : O_WRONLY);
+      if (aNull >= 0 && aNull != aFd) {
+        dup2(aNull, aFd);
+        close(aNull);
+      }
+    }
+  }
+}
+
+bool fdfRedirectStdStreams(const std::string &thePrefix) {
+  // stderr, stdout and the C++ log stream (which writes to stderr) each get
+  // their own companion file.
+  static const char *const theSuffixes[3] = {"_cerr.txt", "_cout.txt", "_clog.txt"};
+  static const int theFds[2] = {2, 1};
+  std::fflush(nullptr);
+  bool aOk = true;
+  for (int i = 0; i < 2; ++i) {
+    const int aFile = open((thePrefix + theSuffixes[i]).c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+    if (aFile < 0) {
+      aOk = false;
+      continue;
+    }
+    const int aFd = theFds[i];
+    if (theSavedStd[aFd] < 0)
+      theSavedStd[aFd] = fcntl(aFd, F_DUPFD_CLOEXEC, 3);
+    dup2(aFile, aFd);
+    close(aFile);
+  }
+  std::clog.flush();
+  if (theClogFile.is_open())
+    theClogFile.close();
+  if (theClogFile.open(thePrefix + theSuffixes[2], std::ios::out | std::ios::trunc) != nullptr) {
+    if (theSavedClog == nullptr)
+      theSavedClog = std::clog.rdbuf();
+    std::clog.rdbuf(&theClogFile);
+  } else {
+    aOk = false;
+  }
+  setvbuf(stdout, nullptr, _IOLBF, 0);
+  return aOk;
+}
+
+void fdfRestoreStdStreams() {
+  std::clog.flush();
+  if (theSavedClog != nullptr) {
+    std::clog.rdbuf(theSavedClog);
+    theSavedClog = nullptr;
+  }
+  if (theClogFile.is_open())
+    theClogFile.close();
+  std::fflush(nullptr);
+  for (int aFd = 1; aFd <= 2; ++aFd) {
+    if (theSavedStd[aFd] >= 0) {
+      dup2(theSavedStd[aFd], aFd);
+      close(theSavedStd[aFd]);
+      theSavedStd[aFd] = -1;
+    }
+  }
+}
+
+void fdfSplitPath(const std::string &thePath, std::string &theDir, std::string &theName, std::string &theExt) {
+  const size_t aSlash = thePath.find_last_of("/\\");
+  theDir = aSlash == std::string::npos ? std::string() : thePath.substr(0, aSlash + 1);
+  const std::string aRest = aSlash == std::string::npos ? thePath : thePath.substr(aSlash + 1);
+  const size_t aDot = aRest.rfind('.');
+  theName = aDot == std::string::npos ? aRest : aRest.substr(0, aDot);
+  theExt = aDot == std::string::npos ? std::string() : aRest.substr(aDot);
+}

@@ -1,0 +1,75 @@
+// Program entry: start-up, command dispatch and the closing of the run.
+#include "main_features_extraction.h"
+
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+
+#include <cstring>
+#include <exception>
+#include <string>
+
+namespace {
+
+// Drivers not built yet stand as nullptr and answer like an unknown command.
+const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
+    {"main_texture#", nullptr},
+    {"main_ratio#", nullptr},
+    {"main_correlation#", nullptr},
+    {"main_coherence#", nullptr},
+    {"main_temporal_feature_extraction#", nullptr},
+    {"main_principal_component_analysis#", nullptr},
+    {"main_min_and_max#", nullptr},
+};
+
+const char *const theTrailerMarker = "###Tellurix###";
+
+// The command line as the host gave it, kept for the whole run.
+std::string theCommandLine;
+
+} // namespace
+
+const STLRXCommand *fdfCommandTable() { return theCommands; }
+
+const char *fdfProductBanner() {
+  static const std::string theBanner =
+      std::string("Tellurix Feature Extraction - SAR Edition for Tellurix Workbench  4.3.000") + __DATE__;
+  return theBanner.c_str();
+}
+
+int fdfMatchCommand(const char *theCommandLine, const char **theArguments) {
+  for (int i = 0; i < CTLRX_COMMAND_COUNT; ++i) {
+    const size_t aLen = std::strlen(theCommands[i].mPrefix);
+    if (std::strncmp(theCommandLine, theCommands[i].mPrefix, aLen) == 0) {
+      *theArguments = theCommandLine + aLen;
+      return i;
+    }
+  }
+  return -1;
+}
+
+int main_features_extraction(const char *theLine) {
+  theCommandLine = theLine != nullptr ? theLine : "";
+  try {
+    fdfInitEnvironment(true, fdfProductBanner());
+    const size_t aTrailer = theCommandLine.find(theTrailerMarker);
+    if (aTrailer != std::string::npos)
+      theCommandLine.erase(aTrailer);
+    fdfTraceMessage("\nlpCmdLine =%s\n", theCommandLine.c_str());
+    const char *aArguments = nullptr;
+    const int aCommand = fdfMatchCommand(theCommandLine.c_str(), &aArguments);
+    fdfTraceMessage("aCommand =%d\n", aCommand);
+    int32_t aStatus = CTLRX_ERR_UNKNOWN_COMMAND;
+    if (aCommand >= 0 && theCommands[aCommand].mDriver != nullptr)
+      aStatus = theCommands[aCommand].mDriver(aArguments);
+    if (aStatus == 0) {
+      fdfEndProcess(0, true, true);
+      return 0;
+    }
+    fdfRaiseError(aStatus, nullptr, __FILE__, 100);
+  } catch (const CErrorExceptionManager &theError) {
+    // Only where report-and-exit is off: hand the code back to the caller.
+    return theError.mCode;
+  } catch (...) {
+    fdfRaiseError(CTLRX_ERR_UNEXPECTED, fdfGetProcessName(), __FILE__, 108);
+  }
+}
