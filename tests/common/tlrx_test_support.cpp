@@ -89,8 +89,13 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
   for (const auto &aEntry : theEnv)
     aEnv[aEntry.first] = aEntry.second;
   std::string aCommand = "cd " + tlrxQuote(theWorkDir) + " && env";
+  // env takes its -u options before the assignments.
   for (const auto &aEntry : aEnv)
-    aCommand += aEntry.second.empty() ? " -u " + aEntry.first : " " + aEntry.first + "=" + tlrxQuote(aEntry.second);
+    if (aEntry.second.empty())
+      aCommand += " -u " + aEntry.first;
+  for (const auto &aEntry : aEnv)
+    if (!aEntry.second.empty())
+      aCommand += " " + aEntry.first + "=" + tlrxQuote(aEntry.second);
   aCommand += " " + tlrxQuote(theProgram.find('/') == std::string::npos ? tlrxBinPath(theProgram) : theProgram);
   for (const std::string &aArg : theArgs)
     aCommand += " " + tlrxQuote(aArg);

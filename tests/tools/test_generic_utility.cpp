@@ -1,0 +1,195 @@
+// File helpers, companions, copies, list and argument files, text forms.
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_platform.h"
+#include "tlrx_test_support.h"
+#include "tlrx_time_man_utility.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <limits>
+#include <regex>
+#include <unistd.h>
+
+namespace {
+
+class UtilityTest : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
+};
+
+template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
+  try {
+    theCall();
+  } catch (const CErrorExceptionManager &aError) {
+    if (theMessage != nullptr)
+      *theMessage = aError.mMessage;
+    return aError.mCode;
+  }
+  return 0;
+}
+
+} // namespace
+
+TEST_F(UtilityTest, ExistFileRejectsEmptyAndNotOKNames) {
+  tlrxWriteFile(mDir.file("NotOK_file"), "x");
+  tlrxWriteFile(mDir.file("real"), "x");
+  EXPECT_FALSE(fdfExistFile(nullptr));
+  EXPECT_FALSE(fdfExistFile(""));
+  EXPECT_FALSE(fdfExistFile(mDir.file("NotOK_file").c_str()));
+  EXPECT_TRUE(fdfExistFile(mDir.file("real").c_str()));
+  EXPECT_EQ(fdfGetFileSize(mDir.file("real").c_str()), 1);
+}
+
+TEST_F(UtilityTest, DeleteRasterRemovesExistingCompanionsAndSkipsMissingOnes) {
+  const std::string aRaster = mDir.file("scene_slc");
+  for (const char *aSuffix : {"", "_hdr", ".sml", ".shp.sml", ".hdr", "_hdr_tmp.sml"})
+    tlrxWriteFile(aRaster + aSuffix, "x");
+  tlrxWriteFile(mDir.file("scene.TellurixParameterExtracted.sml"), "x");
+  tlrxWriteFile(mDir.file("scene.hdr"), "x");
+  tlrxWriteFile(mDir.file("other.sml"), "x");
+  EXPECT_TRUE(fdfDeleteRaster(aRaster.c_str(), true, true));
+  for (const char *aSuffix : {"", "_hdr", ".sml", ".shp.sml", ".hdr", "_hdr_tmp.sml"})
+    EXPECT_FALSE(tlrxFileExists(aRaster + aSuffix)) << aSuffix;
+  EXPECT_FALSE(tlrxFileExists(mDir.file("scene.TellurixParameterExtracted.sml")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("scene.hdr")));
+  EXPECT_TRUE(tlrxFileExists(mDir.file("other.sml")));
+}
+
+TEST_F(UtilityTest, DeleteRasterCanKeepTheFileItself) {
+  tlrxWriteFile(mDir.file("img"), "x");
+  tlrxWriteFile(mDir.file("img.sml"), "x");
+  EXPECT_FALSE(fdfDeleteRaster(mDir.file("img").c_str(), true, false));
+  EXPECT_TRUE(tlrxFileExists(mDir.file("img")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("img.sml")));
+}
+
+TEST_F(UtilityTest, CopyFallsBackFromHdrToSml) {
+  tlrxWriteFile(mDir.file("in.sml"), "<xml/>");
+  tlrxWriteFile(mDir.file("out.sml"), "old");
+  fdfCopyFile(mDir.file("in_hdr").c_str(), mDir.file("out_hdr").c_str(), false);
+  EXPECT_EQ(tlrxReadFile(mDir.file("out.sml")), "<xml/>");
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out_hdr")));
+}
+
+TEST_F(UtilityTest, FailedCopyRaises261123WithTheSystemText) {
+  std::string aMessage;
+  EXPECT_EQ(codeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), false); }, &aMessage),
+            261123);
+  EXPECT_EQ(aMessage, "ERROR CODE 2 [No such file or directory];    " + mDir.file("none"));
+  EXPECT_EQ(codeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), true); }), 0);
+}
+
+TEST_F(UtilityTest, LineListStopsAtCommentTrimsAndFindsTheWorkingFolder) {
+  tlrxWriteFile(mDir.file("list.txt"), "  first  \r\nsecond\n#third\nfourth\n");
+  std::vector<std::string> aLines = fdfReadLineList(mDir.file("list.txt").c_str(), true);
+  EXPECT_EQ(aLines, std::vector<std::string>({"first", "second"}));
+  aLines = fdfReadLineList("/no/such/folder/list.txt", false);
+  EXPECT_EQ(aLines, std::vector<std::string>({"  first  ", "second"}));
+  aLines = fdfReadLineList("C:\\data\\list.txt", true);
+  EXPECT_EQ(aLines.size(), 2u);
+  std::string aMessage;
+  EXPECT_EQ(codeOf([] { fdfReadLineList("/no/such/missing.txt", true); }, &aMessage), 261122);
+  EXPECT_EQ(aMessage, "/no/such/missing.txt");
+}
+
+TEST_F(UtilityTest, LineListKeepsBlankLinesAndCutsOverlongOnes) {
+  tlrxWriteFile(mDir.file("list.txt"), "a\n   \n" + std::string(25000, 'y') + "\nlast");
+  const std::vector<std::string> aLines = fdfReadLineList(mDir.file("list.txt").c_str(), true);
+  ASSERT_EQ(aLines.size(), 4u);
+  EXPECT_EQ(aLines[1], "");
+  EXPECT_EQ(aLines[2].size(), 10000u);
+  EXPECT_EQ(aLines[3], "last");
+}
+
+TEST_F(UtilityTest, ArgumentFileDropsTheFirstLineAndCutsTheTrailer) {
+  tlrxWriteFile(mDir.file("args.txt"), "title\n/a/one.raw\n/a/two.raw\n");
+  const std::string aArgument = mDir.file("args.txt") + "###Tellurix###ignored";
+  EXPECT_EQ(fdfReadArgumentFile(aArgument.c_str()), std::vector<std::string>({"/a/one.raw", "/a/two.raw"}));
+  tlrxWriteFile(mDir.file("one.txt"), "only a title\n");
+  std::string aMessage;
+  EXPECT_EQ(codeOf([&] { fdfReadArgumentFile(mDir.file("one.txt").c_str()); }, &aMessage), 261122);
+  EXPECT_EQ(aMessage, mDir.file("one.txt"));
+}
+
+TEST(UtilityText, IntegerToTextGivesTheSameDigits) {
+  EXPECT_EQ(fdfIntToText(0), "0");
+  EXPECT_EQ(fdfIntToText(32000), "32000");
+  EXPECT_EQ(fdfIntToText(32001), "32001");
+  EXPECT_EQ(fdfIntToText(1000007), "1000007");
+  EXPECT_EQ(fdfIntToText(-5), "-5");
+}
+
+TEST(UtilityText, TimeStampForms) {
+  EXPECT_TRUE(std::regex_match(fdfGetTimeStamp(), std::regex("20[0-9]{12}")));
+  EXPECT_TRUE(std::regex_match(fdfGetTimeStamp(true), std::regex("20[0-9]{12}\\.[0-9]{6}")));
+  EXPECT_TRUE(std::regex_match(fdfGetCalendarTime(),
+                               std::regex("[0-9]{2}-[A-Z][a-z]{2}-20[0-9]{2} [0-9]{2}:[0-9]{2}:[0-9]{2}\\.[0-9]{6}")));
+  EXPECT_EQ(fdfGetAscTime().size(), 25u);
+  EXPECT_EQ(fdfGetAscTime().back(), '\n');
+}
+
+TEST(UtilityText, NullRuleUsesTheSmallestNormalFloatAsTolerance) {
+  const double aNaN = std::numeric_limits<double>::quiet_NaN();
+  EXPECT_TRUE(fdfIsNull(aNaN, aNaN));
+  EXPECT_FALSE(fdfIsNull(0.0, aNaN));
+  EXPECT_TRUE(fdfIsNull(0.0, 0.0));
+  EXPECT_TRUE(fdfIsNull(1e-38, 0.0));
+  EXPECT_FALSE(fdfIsNull(1.2e-38, 0.0));
+  EXPECT_TRUE(fdfIsNull(-9999.0, -9999.0));
+  EXPECT_FALSE(fdfIsNull(-9998.9999, -9999.0));
+  EXPECT_FALSE(fdfIsNull(aNaN, -9999.0));
+  EXPECT_TRUE(fdfIsSwitchOn("OK"));
+  EXPECT_FALSE(fdfIsSwitchOn("ok"));
+  EXPECT_FALSE(fdfIsSwitchOn("OK "));
+}
+
+TEST(Platform, SplitPathAcceptsBothSeparators) {
+  std::string aDir, aName, aExt;
+  fdfSplitPath("C:\\data/sub\\image.raw", aDir, aName, aExt);
+  EXPECT_EQ(aDir, "C:\\data/sub\\");
+  EXPECT_EQ(aName, "image");
+  EXPECT_EQ(aExt, ".raw");
+  fdfSplitPath("plain", aDir, aName, aExt);
+  EXPECT_EQ(aDir, "");
+  EXPECT_EQ(aName, "plain");
+  EXPECT_EQ(aExt, "");
+}
+
+TEST(Platform, MemoryStatusAndClock) {
+  const STLRXMemoryStatus aStatus = fdfReadMemoryStatus();
+  EXPECT_GT(aStatus.mTotalPhys, 0u);
+  EXPECT_LE(aStatus.mAvailPhys, aStatus.mTotalPhys);
+  const long long aStart = fdfProcessClock();
+  usleep(20000);
+  EXPECT_GE(fdfProcessClock() - aStart, 15); // wall clock, not CPU time
+}
+
+TEST_F(UtilityTest, SpawnedDeleteHelperRemovesTheFileDetached) {
+  const std::string aFile = mDir.file("to_delete.tmp");
+  tlrxWriteFile(aFile, "x");
+  fdfSetEnvVar((tlrxBuildDir() + "/bin/").c_str(), "TELLURIX_EXE_DIR");
+  EXPECT_EQ(NTLRX_UTILITY_SpawnDeleteFile(aFile.c_str()), 0);
+  for (int i = 0; i < 100 && tlrxFileExists(aFile); ++i)
+    usleep(20000);
+  EXPECT_FALSE(tlrxFileExists(aFile));
+  fdfSetEnvVar("/no/such/dir/", "TELLURIX_EXE_DIR");
+  EXPECT_NE(NTLRX_UTILITY_SpawnDeleteFile(aFile.c_str()), 0);
+}
+
+TEST_F(UtilityTest, DeletionListDeletesOrOnlyTracesAndEmpties) {
+  tlrxWriteFile(mDir.file("a.tmp"), "x");
+  tlrxWriteFile(mDir.file("a.tmp.sml"), "x");
+  fdfAddToDeletionList(mDir.file("a.tmp").c_str(), false);
+  fdfRunDeletionList(false);
+  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp")));
+  fdfRunDeletionList(true); // emptied by the first run
+  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp")));
+  fdfAddToDeletionList(mDir.file("a.tmp").c_str(), false);
+  fdfRunDeletionList(true);
+  EXPECT_FALSE(tlrxFileExists(mDir.file("a.tmp")));
+  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp.sml")));
+}
