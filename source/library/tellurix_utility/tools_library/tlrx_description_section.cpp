@@ -947,8 +947,8 @@ bool CDescriptionSection::declareFromKeyFile(const char *theFile, const char *th
       TLRX_RAISE(CTLRX_ERR_DS_DECLARATION, getName());
     }
     const int32_t aStructIndex = static_cast<int32_t>(aFields.size());
-    CDescriptionField *aStruct = aAppend(
-        std::make_unique<CDescriptionField>(aFieldName.c_str(), CTLRX_DS_MULTIPLE, CTLRX_DS_FIELD_POINTER, -1));
+    CDescriptionField *aStruct =
+        aAppend(std::make_unique<CDescriptionField>(aFieldName.c_str(), CTLRX_DS_MULTIPLE, CTLRX_DS_FIELD_POINTER, -1));
     aStruct->allocateMembers(static_cast<int32_t>(aType.mMemberCount));
     for (int32_t i = 0; i < static_cast<int32_t>(aType.mMemberCount); ++i) {
       std::string aMemberName;
@@ -1090,6 +1090,15 @@ CDescriptionField &CDescription::getField(const char *theKey) const {
   return *aField;
 }
 
+CDescriptionField &CDescription::getFieldWithValue(const char *theKey) const {
+  CDescriptionField &aField = getField(theKey);
+  if (!aField.holdsValue()) {
+    aField.dump();
+    TLRX_RAISE(CTLRX_ERR_DS_FIELD_MISSING, theKey);
+  }
+  return aField;
+}
+
 bool CDescription::copyFrom(const CDescription &theOther, bool theClearFirst) {
   if (&theOther == this) {
     return true;
@@ -1147,9 +1156,8 @@ void CDescription::print(bool theAll) const {
 
 bool CDescription::checkMandatory(const char *theName, bool theRaise) const {
   const std::string aName = theName != nullptr ? theName : "";
-  const std::string aPath = fdfExistDescriptionFile(aName.c_str())
-                                ? aName
-                                : settingOrEmpty("TELLURIX_MANDATORY_DIR") + aName + ".mandatory";
+  const std::string aPath =
+      fdfExistDescriptionFile(aName.c_str()) ? aName : settingOrEmpty("TELLURIX_MANDATORY_DIR") + aName + ".mandatory";
   fdfLogMessage("\n");
   for (const auto &aSection : mSections) {
     if (!aSection->checkMandatory(aPath.c_str(), aSection->getName())) {

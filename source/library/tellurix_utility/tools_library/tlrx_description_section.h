@@ -15,10 +15,10 @@
 
 // ---------------------------------------------------------------- constants
 
-constexpr int32_t CTLRX_DS_MAX_NBR_FIELDS = 5050;      // fields per section, members included
-constexpr int CTLRX_DS_POOL_SLOTS = 110;               // scratch buffers of the file readers
-constexpr size_t CTLRX_DS_POOL_BUFFER_SIZE = 1000000;  // default scratch buffer and key-file line size
-constexpr double CTLRX_DS_MISSING_DOUBLE = -9999.0;    // getDouble(n) beyond the end of a vector
+constexpr int32_t CTLRX_DS_MAX_NBR_FIELDS = 5050;     // fields per section, members included
+constexpr int CTLRX_DS_POOL_SLOTS = 110;              // scratch buffers of the file readers
+constexpr size_t CTLRX_DS_POOL_BUFFER_SIZE = 1000000; // default scratch buffer and key-file line size
+constexpr double CTLRX_DS_MISSING_DOUBLE = -9999.0;   // getDouble(n) beyond the end of a vector
 constexpr const char *CTLRX_DS_DEFAULT_ROOT_TAG = "HEADER_INFO";
 constexpr const char *CTLRX_DS_NOT_INITIALISED = "Not initialised";
 
@@ -153,8 +153,8 @@ public:
   void unset(int32_t theIndex);
   void unset(int32_t theRow, int32_t theCol);
 
-  bool isSet() const;                  // scalars only
-  bool isSet(int32_t theIndex) const;  // false beyond the end
+  bool isSet() const;                 // scalars only
+  bool isSet(int32_t theIndex) const; // false beyond the end
   bool isSet(int32_t theRow, int32_t theCol) const;
 
   // Whether the field is present (the test used everywhere).
@@ -282,6 +282,9 @@ public:
   CDescriptionField *findField(const char *theKey) const;
   // As findField, but a missing key prints the description and raises 848642.
   CDescriptionField &getField(const char *theKey) const;
+  // As getField, and a declared field that holds no value (a setting the
+  // file lacks) also raises 848642 with the key.
+  CDescriptionField &getFieldWithValue(const char *theKey) const;
 
   bool copyFrom(const CDescription &theOther, bool theClearFirst);
   void clearValues();

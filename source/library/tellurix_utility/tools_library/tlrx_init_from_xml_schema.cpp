@@ -31,8 +31,9 @@ struct STypeRule {
 
 // First matching substring wins, in table order.
 const STypeRule CTLRX_SHAPE_RULES[] = {
-    {"xs:anyType", CTLRX_DS_MULTIPLE},     {"xs:", CTLRX_DS_SCALAR},   {"TellurixFlagType", CTLRX_DS_SCALAR},
-    {"TellurixInterpolationType", CTLRX_DS_SCALAR}, {"Vector", CTLRX_DS_VECTOR}, {"Matrix", CTLRX_DS_MATRIX},
+    {"xs:anyType", CTLRX_DS_MULTIPLE},     {"xs:", CTLRX_DS_SCALAR},
+    {"TellurixFlagType", CTLRX_DS_SCALAR}, {"TellurixInterpolationType", CTLRX_DS_SCALAR},
+    {"Vector", CTLRX_DS_VECTOR},           {"Matrix", CTLRX_DS_MATRIX},
 };
 const STypeRule CTLRX_VALUE_TYPE_RULES[] = {
     {"xs:double", CTLRX_DS_DOUBLE},        {"xs:long", CTLRX_DS_INTEGER},
@@ -136,8 +137,7 @@ const CXmlElement *structWrapper(const CXmlElement &theField, bool &theIsVector)
 
 void setTypeFromName(STLRXSchemaField &theField, const char *theTypeName) {
   theField.mShape = fdfSchemaShape(theTypeName);
-  theField.mValueType =
-      theField.mShape == CTLRX_DS_MULTIPLE ? CTLRX_DS_FIELD_POINTER : fdfSchemaValueType(theTypeName);
+  theField.mValueType = theField.mShape == CTLRX_DS_MULTIPLE ? CTLRX_DS_FIELD_POINTER : fdfSchemaValueType(theTypeName);
 }
 
 // One field declaration of a section.
@@ -276,8 +276,8 @@ bool fdfBuildSectionFromSchema(const STLRXSchemaSection &theDeclaration, CDescri
   }
   for (const STLRXSchemaField &aDeclared : theDeclaration.mFields) {
     if (aDeclared.mShape != CTLRX_DS_MULTIPLE) {
-      theSection.appendField(std::make_unique<CDescriptionField>(aDeclared.mName.c_str(), aDeclared.mShape,
-                                                                 aDeclared.mValueType, -1));
+      theSection.appendField(
+          std::make_unique<CDescriptionField>(aDeclared.mName.c_str(), aDeclared.mShape, aDeclared.mValueType, -1));
       continue;
     }
     const int32_t aStructIndex = theSection.appendField(
@@ -286,9 +286,9 @@ bool fdfBuildSectionFromSchema(const STLRXSchemaSection &theDeclaration, CDescri
     const int32_t aMemberCount = static_cast<int32_t>(aDeclared.mMemberNames.size());
     aStruct->allocateMembers(aMemberCount);
     for (int32_t i = 0; i < aMemberCount; ++i) {
-      const int32_t aMemberIndex = theSection.appendField(std::make_unique<CDescriptionField>(
-          aDeclared.mMemberNames[static_cast<size_t>(i)].c_str(), aDeclared.mMemberShape,
-          aDeclared.mMemberValueType, aStructIndex));
+      const int32_t aMemberIndex = theSection.appendField(
+          std::make_unique<CDescriptionField>(aDeclared.mMemberNames[static_cast<size_t>(i)].c_str(),
+                                              aDeclared.mMemberShape, aDeclared.mMemberValueType, aStructIndex));
       aStruct->setMember(i, theSection.getField(aMemberIndex));
     }
   }
