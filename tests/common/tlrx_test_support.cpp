@@ -117,3 +117,54 @@ STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWo
                      const std::map<std::string, std::string> &theEnv) {
   return tlrxRun("main_features_extraction", {theCommandLine}, theWorkDir, theEnv);
 }
+
+#include "tlrx_description_xml.h"
+#include "tlrx_raster_file.h"
+#include "tlrx_standard_header.h"
+
+void tlrxWriteTestRaster(const std::string &theName, const STLRXTestRaster &theRaster) {
+  CDescription aHeader;
+  fdfDeclareStandardHeader(aHeader);
+  aHeader.getField("RasterInfo.NrOfLinesPerImage").setInteger(theRaster.mLines);
+  aHeader.getField("RasterInfo.NrOfPixelsPerLine").setInteger(theRaster.mPixels);
+  aHeader.getField("RasterInfo.CellType").setString(theRaster.mCellType.c_str());
+  aHeader.getField("RasterInfo.DataUnits").setString(theRaster.mDataUnits.c_str());
+  aHeader.getField("RasterInfo.HeaderOffset").setInteger(0);
+  aHeader.getField("RasterInfo.RowPrefix").setInteger(0);
+  aHeader.getField("RasterInfo.RowSuffix").setInteger(0);
+  if (theRaster.mHasNull)
+    aHeader.getField("RasterInfo.NullCellValue").setDouble(theRaster.mNull);
+  if (!theRaster.mAcquisitionTime.empty())
+    fdfStampOtherInfo(aHeader, "ACQUISITION TIME", theRaster.mAcquisitionTime.c_str());
+  CRasterFile aFile;
+  aFile.open_write(theName.c_str(), aHeader);
+  const int32_t aCellType = aFile.getCellType();
+  std::vector<uint8_t> aLine(static_cast<size_t>(fdfCellLineBytes(aCellType, theRaster.mPixels)));
+  for (int l = 0; l < theRaster.mLines; ++l) {
+    for (int p = 0; p < theRaster.mPixels; ++p) {
+      const double aValue = theRaster.mValues.at(static_cast<size_t>(l) * theRaster.mPixels + p);
+      switch (aCellType) {
+      case CTLRX_CELL_FLOAT: reinterpret_cast<float *>(aLine.data())[p] = static_cast<float>(aValue); break;
+      case CTLRX_CELL_DOUBLE: reinterpret_cast<double *>(aLine.data())[p] = aValue; break;
+      case CTLRX_CELL_SHORT: reinterpret_cast<int16_t *>(aLine.data())[p] = static_cast<int16_t>(aValue); break;
+      case CTLRX_CELL_UNSIGNED_SHORT: reinterpret_cast<uint16_t *>(aLine.data())[p] = static_cast<uint16_t>(aValue); break;
+      case CTLRX_CELL_UNSIGNED_BYTE: aLine[p] = static_cast<uint8_t>(aValue); break;
+      default: throw std::runtime_error("tlrxWriteTestRaster: unsupported cell type " + theRaster.mCellType);
+      }
+    }
+    aFile.putLine(l, aLine.data());
+  }
+  aFile.close();
+  fdfWriteStandardHeader(theName.c_str(), aHeader, true);
+}
+
+std::vector<double> tlrxReadTestRaster(const std::string &theName) {
+  CRasterFile aFile;
+  aFile.open_read(theName.c_str());
+  const int32_t aPixels = aFile.getNrOfPixelsPerLine();
+  std::vector<double> aValues(static_cast<size_t>(aFile.getNrOfLinesPerImage()) * aPixels);
+  for (int32_t l = 0; l < aFile.getNrOfLinesPerImage(); ++l)
+    aFile.getLine(&aValues[static_cast<size_t>(l) * aPixels], l);
+  aFile.close();
+  return aValues;
+}

@@ -51,3 +51,19 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
 // Shortcut for the main program with one command line.
 STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,
                      const std::map<std::string, std::string> &theEnv = {});
+
+// A small raster with its standard header, written through the program's own
+// raster file and header writer (the runtime must be started).
+struct STLRXTestRaster {
+  int mLines = 4;
+  int mPixels = 5;
+  std::vector<double> mValues; // lines x pixels, line after line
+  std::string mCellType = "FLOAT";
+  std::string mDataUnits = "POWER";
+  bool mHasNull = false;
+  double mNull = 0.0;
+  std::string mAcquisitionTime; // "" for none
+};
+void tlrxWriteTestRaster(const std::string &theName, const STLRXTestRaster &theRaster);
+// All cells of a raster as double, through the raster file.
+std::vector<double> tlrxReadTestRaster(const std::string &theName);

@@ -1,6 +1,8 @@
 // Program entry: start-up, command dispatch and the closing of the run.
 #include "main_features_extraction.h"
 
+#include "main_ratio.h"
+#include "main_search_min_max_value.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
@@ -13,12 +15,12 @@ namespace {
 // Drivers not built yet stand as nullptr and answer like an unknown command.
 const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
     {"main_texture#", nullptr},
-    {"main_ratio#", nullptr},
+    {"main_ratio#", main_ratio},
     {"main_correlation#", nullptr},
     {"main_coherence#", nullptr},
     {"main_temporal_feature_extraction#", nullptr},
     {"main_principal_component_analysis#", nullptr},
-    {"main_min_and_max#", nullptr},
+    {"main_min_and_max#", main_search_min_max_value},
 };
 
 const char *const theTrailerMarker = "###Tellurix###";

@@ -1,0 +1,87 @@
+// Ratio driver: reads its tokens and file list, plans ratio (and GeoTIFF)
+// steps for consecutive pairs and runs them through the step runner.
+#include "main_ratio.h"
+
+#include "ratio_images.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_geotiff_step.h"
+#include "tlrx_step_runner.h"
+
+#include <exception>
+
+namespace {
+
+enum ERatioToken { CTLRX_RATIO_LIST, CTLRX_RATIO_ROOT, CTLRX_RATIO_DB, CTLRX_RATIO_UNUSED, CTLRX_RATIO_TIFF,
+                   CTLRX_RATIO_SATURATION, CTLRX_RATIO_TOKENS };
+
+const std::vector<STLRXStep> theRatioSteps = {
+    {"Ratio", ratio_images, fdfStepNothingToClose},
+    {"ratio to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+};
+
+int32_t fdfRunRatio(const char *theArguments) {
+  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
+  std::vector<const char *> aArgv;
+  for (const std::string &aToken : aTokens)
+    aArgv.push_back(aToken.c_str());
+  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Ratio", nullptr);
+  CStepRunner aRunner(theRatioSteps, "RATIO");
+  if (aTokens.size() < CTLRX_RATIO_TOKENS)
+    return 456962;
+  for (int i = 0; i < CTLRX_RATIO_TOKENS; ++i)
+    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_RATIO_TIFF]);
+  const std::vector<std::string> aFiles = fdfReadLineList(aTokens[CTLRX_RATIO_LIST].c_str(), true);
+  fdfTraceMessage("Number of FILES = %d\n", static_cast<int>(aFiles.size()));
+  // Nothing to compute is not a success the host could mistake for results.
+  if (aFiles.size() < 2) {
+    fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aFiles.size()));
+    TLRX_RAISE(456962, aTokens[CTLRX_RATIO_LIST].c_str());
+  }
+  int aPair = -1;
+  return aRunner.run(fdfRatioPlan(aFiles.size(), aTiff), [&](int, int theStep) -> std::vector<std::string> {
+    if (theStep == 0) {
+      ++aPair;
+      return {aFiles[aPair], aFiles[aPair + 1], fdfRatioPairName(aTokens[CTLRX_RATIO_ROOT], aPair, aFiles.size()),
+              aTokens[CTLRX_RATIO_DB]};
+    }
+    const std::string aName = fdfRatioPairName(aTokens[CTLRX_RATIO_ROOT], aPair, aFiles.size());
+    return {aName, aName + ".tif", aTokens[CTLRX_RATIO_SATURATION]};
+  });
+}
+
+} // namespace
+
+std::string fdfRatioPairName(const std::string &theRoot, int thePair, size_t theFiles) {
+  std::string aRoot = theRoot;
+  if (aRoot.size() >= 4 && aRoot.compare(aRoot.size() - 4, 4, "_rto") == 0)
+    aRoot.erase(aRoot.rfind('_'));
+  if (theFiles > 2)
+    return aRoot + "_" + std::to_string(thePair) + "_rto";
+  return aRoot + "_rto";
+}
+
+std::vector<int> fdfRatioPlan(size_t theFiles, bool theTiff) {
+  std::vector<int> aPlan;
+  for (size_t k = 0; k + 1 < theFiles; ++k) {
+    aPlan.push_back(0);
+    if (theTiff)
+      aPlan.push_back(1);
+  }
+  return aPlan;
+}
+
+int32_t main_ratio(const char *theArguments) {
+  try {
+    return fdfRunRatio(theArguments);
+  } catch (const CErrorExceptionManager &) {
+    throw;
+  } catch (const std::exception &aError) {
+    fdfTraceMessage("Exception raised: %s\n", aError.what());
+    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
+  } catch (...) {
+    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
+  }
+}

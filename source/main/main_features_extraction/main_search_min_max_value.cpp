@@ -1,0 +1,250 @@
+// Min and max over a stack: one pass over the lines of every input, in
+// chronological order. A pixel that is no data in any input is no data in
+// every result (value N, date class 0); ties keep the earlier date.
+#include "main_search_min_max_value.h"
+
+#include "tlrx_description_xml.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_features_common.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_file.h"
+
+#include <cstdlib>
+#include <exception>
+#include <memory>
+
+namespace {
+
+constexpr int CTLRX_MINMAX_TOKENS = 9;
+constexpr int CTLRX_MINMAX_LIST = 0;
+constexpr int CTLRX_MINMAX_ROOT = 1;
+constexpr int CTLRX_MINMAX_TIFF = 7;
+constexpr int CTLRX_MINMAX_SATURATION = 8;
+constexpr int CTLRX_PALETTE_SIZE = 256;
+
+// The four results, in the order they are written and converted.
+const char *const theResultSuffixes[4] = {"_min", "_max", "_min_date", "_max_date"};
+
+std::string fdfJoin(const std::vector<std::string> &theTokens) {
+  std::string aText;
+  for (const std::string &aToken : theTokens)
+    aText += (aText.empty() ? "" : " ") + aToken;
+  return aText;
+}
+
+void fdfClearField(CDescription &theHeader, const char *theKey) {
+  if (CDescriptionField *aField = theHeader.findField(theKey))
+    aField->clear();
+}
+
+void fdfMakeValueHeader(CDescription &theHeader) {
+  for (const char *aKey : {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"})
+    fdfClearField(theHeader, aKey);
+  fdfSetHeaderText(theHeader, "RasterInfo.CellType", "FLOAT");
+  fdfSetHeaderText(theHeader, "RasterInfo.DataUnits", "NUMBER");
+}
+
+void fdfMakeDateHeader(CDescription &theHeader, const std::vector<STLRXDate> &theDates) {
+  const int32_t aClasses = static_cast<int32_t>(theDates.size()) + 1;
+  fdfSetHeaderText(theHeader, "RasterInfo.DataUnits", "CLASSIFICATION");
+  CDescriptionField &aData = theHeader.getField("RasterInfo.ClassificationData");
+  aData.setNumberOfElements(aClasses);
+  std::vector<std::string> aNames = {"No classified"};
+  for (int32_t i = 0; i < aClasses; ++i)
+    aData.setInteger(i, i);
+  for (const STLRXDate &aDate : theDates)
+    aNames.push_back(fdfDateText(aDate));
+  fdfSetHeaderList(theHeader, "RasterInfo.ClassificationName", aNames);
+  CDescriptionField &aRed = theHeader.getField("RasterInfo.TiffLUTRed");
+  CDescriptionField &aGreen = theHeader.getField("RasterInfo.TiffLUTGreen");
+  CDescriptionField &aBlue = theHeader.getField("RasterInfo.TiffLUTBlue");
+  for (CDescriptionField *aLut : {&aRed, &aGreen, &aBlue}) {
+    aLut->setNumberOfElements(CTLRX_PALETTE_SIZE);
+    for (int32_t i = 0; i < CTLRX_PALETTE_SIZE; ++i)
+      aLut->setInteger(i, 0);
+  }
+  for (int32_t i = 1; i < aClasses && i < CTLRX_PALETTE_SIZE; ++i) {
+    int aR, aG, aB;
+    fdfDateClassColour(i, aR, aG, aB);
+    aRed.setInteger(i, aR);
+    aGreen.setInteger(i, aG);
+    aBlue.setInteger(i, aB);
+  }
+}
+
+void fdfWriteMinMaxHeader(const std::string &theRaster, CDescription &theHeader) {
+  fdfRemoveFile(fdfHeaderFileName(theRaster).c_str());
+  fdfRemoveFile(fdfXmlHeaderFileName(fdfHeaderFileName(theRaster)).c_str());
+  fdfWriteResultHeader(theRaster, theHeader, 261124);
+}
+
+STLRXDate fdfReadInputDate(const std::string &theName) {
+  CDescription aHeader;
+  fdfLoadInputHeader(theName, aHeader);
+  std::string aText;
+  if (!fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aText)) {
+    fdfLogMessage("Not found the field %s in %s\n\n", CTLRX_ACQUISITION_TIME_KEY, theName.c_str());
+    TLRX_RAISE(CTLRX_ERR_DS_FIELD_MISSING, CTLRX_ACQUISITION_TIME_KEY);
+  }
+  STLRXDate aDate;
+  // A date that cannot be read would put the image at a wrong place in time.
+  if (!fdfParseAcquisitionDate(aText, aDate)) {
+    fdfLogMessage("Invalid value [%s] of the field %s in %s\n\n", aText.c_str(), CTLRX_ACQUISITION_TIME_KEY,
+                  theName.c_str());
+    TLRX_RAISE(CTLRX_ERR_DS_FIELD_MISSING, CTLRX_ACQUISITION_TIME_KEY);
+  }
+  fdfTraceMessage("%s DATE = %s\n", theName.c_str(), aText.c_str());
+  return aDate;
+}
+
+// Per-pixel state of the pass.
+struct SMinMax {
+  float *mMin, *mMax, *mMinDate, *mMaxDate;
+};
+
+void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
+                   int32_t thePixels, float theNull, const SMinMax &theOut) {
+  const size_t aInputs = theRows.size();
+  for (int32_t x = 0; x < thePixels; ++x) {
+    double aMin = 0, aMax = 0;
+    int aMinDate = 0, aMaxDate = 0;
+    bool aNoData = false;
+    for (size_t i = 0; i < aInputs && !aNoData; ++i) {
+      const double aValue = theRows[i][x];
+      if (fdfIsNull(aValue, theNulls[i])) {
+        aNoData = true;
+      } else if (i == 0) {
+        aMin = aMax = aValue;
+        aMinDate = aMaxDate = 1;
+      } else {
+        if (aValue < aMin) {
+          aMin = aValue;
+          aMinDate = static_cast<int>(i) + 1;
+        }
+        if (aValue > aMax) {
+          aMax = aValue;
+          aMaxDate = static_cast<int>(i) + 1;
+        }
+      }
+    }
+    theOut.mMin[x] = aNoData ? theNull : static_cast<float>(aMin);
+    theOut.mMax[x] = aNoData ? theNull : static_cast<float>(aMax);
+    theOut.mMinDate[x] = aNoData ? 0.0f : static_cast<float>(aMinDate);
+    theOut.mMaxDate[x] = aNoData ? 0.0f : static_cast<float>(aMaxDate);
+  }
+}
+
+int32_t fdfRunMinMax(const char *theArguments) {
+  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
+  std::vector<const char *> aArgv;
+  for (const std::string &aToken : aTokens)
+    aArgv.push_back(aToken.c_str());
+  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Min and Max", nullptr);
+  if (aTokens.size() < CTLRX_MINMAX_TOKENS)
+    TLRX_RAISE(456962, fdfJoin(aTokens).c_str());
+  const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_MINMAX_TIFF]);
+  std::vector<std::string> aNames = fdfReadLineList(aTokens[CTLRX_MINMAX_LIST].c_str(), true);
+  if (aNames.size() < 2) {
+    fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aNames.size()));
+    TLRX_RAISE(456962, aTokens[CTLRX_MINMAX_LIST].c_str());
+  }
+  const int32_t aInputs = static_cast<int32_t>(aNames.size());
+  const int32_t aBuffer = 4000 / (aInputs + 4);
+
+  CDescription aTemplate;
+  fdfLoadInputHeader(aNames[0], aTemplate);
+  const std::vector<STLRXDate> aDates = fdfOrderChronologically(aNames);
+
+  const std::string &aRoot = aTokens[CTLRX_MINMAX_ROOT];
+  std::vector<std::string> aResults;
+  for (const char *aSuffix : theResultSuffixes)
+    aResults.push_back(aRoot + aSuffix);
+  fdfMakeValueHeader(aTemplate);
+  fdfWriteMinMaxHeader(aResults[0], aTemplate);
+  fdfWriteMinMaxHeader(aResults[1], aTemplate);
+  fdfMakeDateHeader(aTemplate, aDates);
+  fdfWriteMinMaxHeader(aResults[2], aTemplate);
+  fdfWriteMinMaxHeader(aResults[3], aTemplate);
+
+  std::vector<std::unique_ptr<CRasterFile>> aIn;
+  std::vector<double> aNulls;
+  for (int32_t i = 0; i < aInputs; ++i) {
+    aIn.push_back(std::make_unique<CRasterFile>());
+    aIn[i]->open_read(aNames[i].c_str());
+    aIn[i]->setBuffer(aBuffer);
+    aNulls.push_back(aIn[i]->getDummyVal());
+    if (aIn[i]->getNrOfLinesPerImage() != aIn[0]->getNrOfLinesPerImage())
+      TLRX_RAISE(652803, aNames[i].c_str());
+    if (aIn[i]->getNrOfPixelsPerLine() != aIn[0]->getNrOfPixelsPerLine())
+      TLRX_RAISE(652802, aNames[i].c_str());
+  }
+  const int32_t aLines = aIn[0]->getNrOfLinesPerImage();
+  const int32_t aPixels = aIn[0]->getNrOfPixelsPerLine();
+  CRasterFile aOut[4];
+  for (int k = 0; k < 4; ++k) {
+    aOut[k].open_write(aResults[k].c_str());
+    aOut[k].setBuffer(aBuffer);
+  }
+  const float aNull = static_cast<float>(aOut[0].getDummyVal());
+
+  std::vector<std::vector<float>> aRows(aInputs, std::vector<float>(aPixels));
+  std::vector<float> aResultRows(4 * static_cast<size_t>(aPixels));
+  const SMinMax aLine = {&aResultRows[0], &aResultRows[aPixels], &aResultRows[2 * static_cast<size_t>(aPixels)],
+                         &aResultRows[3 * static_cast<size_t>(aPixels)]};
+  CLineProgress aProgress(50.0);
+  for (int32_t l = 0; l < aLines; ++l) {
+    aProgress.update(l, aLines);
+    for (int32_t i = 0; i < aInputs; ++i)
+      aIn[i]->getLine(aRows[i].data(), l);
+    fdfMinMaxLine(aRows, aNulls, aPixels, aNull, aLine);
+    for (int k = 0; k < 4; ++k)
+      aOut[k].putLine(l, &aResultRows[k * static_cast<size_t>(aPixels)]);
+  }
+  for (auto &aRaster : aOut)
+    aRaster.close();
+  for (auto &aRaster : aIn)
+    aRaster->close();
+
+  if (aTiff)
+    for (const std::string &aResult : aResults) {
+      fdfSetProcessName("Generate tiff ...");
+      getAndSetPerc(-1, 0, nullptr);
+      fdfMakeQuickLook(aResult, std::atof(aTokens[CTLRX_MINMAX_SATURATION].c_str()));
+    }
+  return 0;
+}
+
+} // namespace
+
+std::vector<STLRXDate> fdfOrderChronologically(std::vector<std::string> &theNames) {
+  std::vector<STLRXDate> aDates;
+  for (const std::string &aName : theNames)
+    aDates.push_back(fdfReadInputDate(aName));
+  for (size_t i = 0; i + 1 < aDates.size(); ++i)
+    for (size_t j = i + 1; j < aDates.size(); ++j)
+      if (fdfDateBefore(aDates[j], aDates[i])) {
+        std::swap(aDates[i], aDates[j]);
+        std::swap(theNames[i], theNames[j]);
+      }
+  for (size_t i = 0; i < aDates.size(); ++i)
+    fdfTraceMessage("DATE = %s   NAME = %s\n", fdfDateTraceText(aDates[i]).c_str(), theNames[i].c_str());
+  return aDates;
+}
+
+void fdfDateClassColour(int theClass, int &theRed, int &theGreen, int &theBlue) {
+  theRed = (5 * theClass) % 150 + 100;
+  theGreen = (15 * theClass) % 250;
+  theBlue = (5 * theClass) % 100 + 150;
+}
+
+int32_t main_search_min_max_value(const char *theArguments) {
+  try {
+    return fdfRunMinMax(theArguments);
+  } catch (const CErrorExceptionManager &) {
+    throw;
+  } catch (...) {
+    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
+  }
+}

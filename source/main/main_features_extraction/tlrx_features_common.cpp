@@ -1,0 +1,83 @@
+#include "tlrx_features_common.h"
+
+#include "tlrx_description_xml.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_standard_header.h"
+
+#include <cstring>
+
+void fdfLoadInputHeader(const std::string &theRaster, CDescription &theHeader) {
+  const std::string aHeaderName = fdfHeaderFileName(theRaster);
+  if (!fdfExistFile(fdfXmlHeaderFileName(aHeaderName).c_str()) && !fdfExistFile(aHeaderName.c_str())) {
+    fdfTraceMessage("Error: missing parameter file %s\n", aHeaderName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aHeaderName.c_str());
+  }
+  fdfReadStandardHeader(theRaster.c_str(), theHeader);
+}
+
+bool fdfFindOtherInfo(const CDescription &theHeader, const char *theKey, std::string &theValue) {
+  const CDescriptionField *aTable = theHeader.findField("RasterInfo.OtherInfo");
+  if (aTable == nullptr || aTable->getColNbr() < 2)
+    return false;
+  const size_t aKeyLen = std::strlen(theKey);
+  for (int32_t aRow = 0; aRow < aTable->getRowNbr(); ++aRow) {
+    if (!aTable->isSet(aRow, 0))
+      continue;
+    if (std::strncmp(aTable->getString(aRow, 0), theKey, aKeyLen) == 0) {
+      theValue = aTable->isSet(aRow, 1) ? aTable->getString(aRow, 1) : "";
+      return true;
+    }
+  }
+  return false;
+}
+
+double fdfHeaderNullValue(const CDescription &theHeader) {
+  const CDescriptionField *aField = theHeader.findField("RasterInfo.NullCellValue");
+  return aField != nullptr && aField->holdsValue() ? aField->getDouble() : 0.0;
+}
+
+int32_t fdfHeaderInteger(const CDescription &theHeader, const char *theKey) {
+  return theHeader.getField(theKey).getInteger();
+}
+
+void fdfSetHeaderText(CDescription &theHeader, const char *theKey, const char *theValue) {
+  if (CDescriptionField *aField = theHeader.findField(theKey))
+    aField->setString(theValue);
+}
+
+void fdfSetHeaderNumber(CDescription &theHeader, const char *theKey, double theValue) {
+  CDescriptionField *aField = theHeader.findField(theKey);
+  if (aField == nullptr)
+    return;
+  if (aField->getValueType() == CTLRX_DS_INTEGER)
+    aField->setInteger(static_cast<int32_t>(theValue));
+  else
+    aField->setDouble(theValue);
+}
+
+void fdfSetHeaderList(CDescription &theHeader, const char *theKey, const std::vector<std::string> &theNames) {
+  CDescriptionField *aField = theHeader.findField(theKey);
+  if (aField == nullptr)
+    return;
+  aField->setNumberOfElements(static_cast<int32_t>(theNames.size()));
+  for (size_t i = 0; i < theNames.size(); ++i)
+    aField->setString(static_cast<int32_t>(i), theNames[i].c_str());
+}
+
+void fdfWriteResultHeader(const std::string &theRaster, CDescription &theHeader, int32_t theCode) {
+  if (fdfWriteStandardHeader(theRaster.c_str(), theHeader, false))
+    return;
+  const std::string aHeaderName = fdfHeaderFileName(theRaster);
+  fdfTraceMessage("Error while writing parameter file %s\n", aHeaderName.c_str());
+  TLRX_RAISE(theCode, aHeaderName.c_str());
+}
+
+void CLineProgress::update(int64_t theLine, int64_t theLines) {
+  const int aPercent = static_cast<int>(static_cast<double>(theLine) / static_cast<double>(theLines) * mScale) + mOffset;
+  if (aPercent != mLast && aPercent < 100) {
+    getAndSetPerc(mLast, aPercent, nullptr);
+    mLast = aPercent;
+  }
+}

@@ -1,0 +1,49 @@
+// Helpers shared by the command drivers and step programs: input headers,
+// acquisition times, result headers and the progress of a line loop.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "tlrx_description_section.h"
+
+// Key of the acquisition date in "RasterInfo.OtherInfo".
+constexpr const char *CTLRX_ACQUISITION_TIME_KEY = "ACQUISITION TIME";
+
+// Reads the standard header of raster theRaster (its name + "_hdr", the
+// ".sml" form first). A missing header traces "Error: missing parameter
+// file " and raises 261122 with the header name.
+void fdfLoadInputHeader(const std::string &theRaster, CDescription &theHeader);
+
+// Value of the first "RasterInfo.OtherInfo" row whose key begins with
+// theKey; false when there is none.
+bool fdfFindOtherInfo(const CDescription &theHeader, const char *theKey, std::string &theValue);
+
+// "NullCellValue" of a header, 0 when absent or unset.
+double fdfHeaderNullValue(const CDescription &theHeader);
+int32_t fdfHeaderInteger(const CDescription &theHeader, const char *theKey);
+
+// Sets a scalar field when the header declares it (string, integer or
+// double as the field is typed).
+void fdfSetHeaderText(CDescription &theHeader, const char *theKey, const char *theValue);
+void fdfSetHeaderNumber(CDescription &theHeader, const char *theKey, double theValue);
+// Stores theNames in the string vector theKey.
+void fdfSetHeaderList(CDescription &theHeader, const char *theKey, const std::vector<std::string> &theNames);
+
+// Writes a result header beside raster theRaster; on failure traces "Error
+// while writing parameter file " and raises theCode with the header name.
+void fdfWriteResultHeader(const std::string &theRaster, CDescription &theHeader, int32_t theCode);
+
+// Sends the progress of line theLine of theLines (scaled to theScale) when
+// its integer percentage changes; the host's interruption ends the run.
+class CLineProgress {
+public:
+  explicit CLineProgress(double theScale, int theOffset = 0) : mScale(theScale), mOffset(theOffset) {}
+  void update(int64_t theLine, int64_t theLines);
+
+private:
+  double mScale;
+  int mOffset;
+  int mLast = -1;
+};
