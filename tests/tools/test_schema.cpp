@@ -1,0 +1,410 @@
+// Header schemas: type-name rules, the schema loader, descriptions declared
+// from schemas, and the installed header and parameter schemas.
+#include "tlrx_description_section.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_init_from_xml_schema.h"
+#include "tlrx_standard_header.h"
+#include "tlrx_test_support.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+namespace {
+
+class SchemaTest : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
+
+  // A schema file whose root HEADER_INFO holds theSections (xs:element text).
+  std::string writeSchema(const std::string &theSections, const std::string &theName = "test.xsd") {
+    const std::string aPath = mDir.file(theName);
+    tlrxWriteFile(aPath, "<?xml version=\"1.0\"?>\n"
+                         "<xs:schema xmlns:xs=\"http://www.w3.org/2001/XMLSchema\">\n"
+                         " <xs:element name=\"NOT_THE_ROOT\" type=\"xs:string\"/>\n"
+                         " <xs:element name=\"HEADER_INFO\">\n"
+                         "  <xs:complexType>\n"
+                         "   <xs:sequence>\n" +
+                             theSections +
+                             "   </xs:sequence>\n"
+                             "  </xs:complexType>\n"
+                             " </xs:element>\n"
+                             "</xs:schema>\n");
+    return aPath;
+  }
+
+  std::string sampleSchema() {
+    return writeSchema(R"(
+    <xs:element name="S1">
+     <xs:complexType><xs:sequence>
+      <xs:element name="a" type="xs:double"/>
+      <xs:element name="b" type="VectorDouble"/>
+      <xs:element name="c" type="TellurixFlagType"/>
+      <xs:element name="d"><xs:simpleType><xs:restriction base="xs:long"/></xs:simpleType></xs:element>
+      <xs:element name="e"><xs:complexType><xs:complexContent>
+        <xs:extension base="MatrixString"/></xs:complexContent></xs:complexType></xs:element>
+      <xs:element name="f"><xs:complexType><xs:sequence>
+        <xs:element name="VectorOfStructs_f"><xs:complexType><xs:sequence>
+          <xs:element name="VectorOfStructsValues_f" maxOccurs="unbounded"><xs:complexType><xs:sequence>
+            <xs:element name="m1" type="xs:double"/>
+            <xs:element name="m2" type="xs:double"/>
+          </xs:sequence></xs:complexType></xs:element>
+        </xs:sequence></xs:complexType></xs:element>
+      </xs:sequence></xs:complexType></xs:element>
+      <xs:element name="g"><xs:complexType><xs:sequence>
+        <xs:element name="Struct_g"><xs:complexType><xs:sequence>
+          <xs:element name="p" type="xs:string"/>
+          <xs:element name="q" type="xs:string"/>
+        </xs:sequence></xs:complexType></xs:element>
+      </xs:sequence></xs:complexType></xs:element>
+      <xs:element name="h" type="WeirdType"/>
+      <xs:element name="i" type="xs:anyType"/>
+     </xs:sequence></xs:complexType>
+    </xs:element>
+    <xs:element name="S2">
+     <xs:complexType><xs:all>
+      <xs:element name="x" type="xs:string"/>
+     </xs:all></xs:complexType>
+    </xs:element>
+    <xs:element name="Empty"><xs:complexType/></xs:element>
+)");
+  }
+};
+
+template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
+  try {
+    theCall();
+  } catch (const CErrorExceptionManager &aError) {
+    if (theMessage != nullptr) {
+      *theMessage = aError.mMessage;
+    }
+    return aError.mCode;
+  }
+  return 0;
+}
+
+struct SKeyType {
+  std::string mKey;
+  int32_t mShape;
+  int32_t mType;
+};
+
+void expectKeys(const CDescription &theDescription, const std::vector<SKeyType> &theKeys) {
+  for (const SKeyType &aKey : theKeys) {
+    const CDescriptionField *aField = theDescription.findField(aKey.mKey.c_str());
+    ASSERT_NE(aField, nullptr) << aKey.mKey;
+    EXPECT_EQ(aField->getShape(), aKey.mShape) << aKey.mKey;
+    EXPECT_EQ(aField->getValueType(), aKey.mType) << aKey.mKey;
+  }
+}
+
+constexpr int32_t S = CTLRX_DS_SCALAR;
+constexpr int32_t V = CTLRX_DS_VECTOR;
+constexpr int32_t TI = CTLRX_DS_INTEGER;
+constexpr int32_t TD = CTLRX_DS_DOUBLE;
+constexpr int32_t TS = CTLRX_DS_STRING;
+
+} // namespace
+
+TEST(SchemaTypeNames, FirstMatchingRuleDecidesShapeAndValueType) {
+  struct SRow {
+    const char *mName;
+    int32_t mShape;
+    int32_t mType;
+  };
+  const SRow aRows[] = {
+      {"xs:double", 0, 1},
+      {"xs:long", 0, 0},
+      {"xs:string", 0, 2},
+      {"VectorDouble", 1, 1},
+      {"tlrx:VectorInteger", 1, 0},
+      {"MatrixString", 2, 2},
+      {"TellurixFlagType", 0, 2},
+      {"TellurixInterpolationType", 0, 2},
+      {"xs:anyType", 3, -1},
+      {"xs:int", 0, -1},         // scalar, but no value type rule matches
+      {"xs:VectorDouble", 0, 1}, // "xs:" is tested before "Vector"
+      {"VectorFlagType", 1, -1},
+      {"Something", -1, -1},
+      {"", -1, -1},
+  };
+  for (const SRow &aRow : aRows) {
+    EXPECT_EQ(fdfSchemaShape(aRow.mName), aRow.mShape) << aRow.mName;
+    EXPECT_EQ(fdfSchemaValueType(aRow.mName), aRow.mType) << aRow.mName;
+  }
+  EXPECT_EQ(fdfSchemaShape(nullptr), -1);
+  EXPECT_EQ(fdfSchemaValueType(nullptr), -1);
+}
+
+TEST_F(SchemaTest, LoaderReadsSectionsTypesRestrictionsAndStructs) {
+  CXmlSchema aSchema;
+  ASSERT_TRUE(aSchema.load(nullptr, sampleSchema().c_str()));
+  EXPECT_EQ(aSchema.getRootName(), "HEADER_INFO");
+  ASSERT_EQ(aSchema.getSections().size(), 3u);
+  EXPECT_EQ(aSchema.getSections()[0].mName, "S1");
+  EXPECT_EQ(aSchema.getSections()[1].mName, "S2");
+  EXPECT_EQ(aSchema.getSections()[2].mName, "Empty");
+  EXPECT_TRUE(aSchema.getSections()[2].mFields.empty());
+
+  const STLRXSchemaSection *aS1 = aSchema.findSection("S1");
+  ASSERT_NE(aS1, nullptr);
+  ASSERT_EQ(aS1->mFields.size(), 9u);
+  struct SRow {
+    const char *mName;
+    int32_t mShape;
+    int32_t mType;
+  };
+  const SRow aRows[] = {{"a", 0, 1}, {"b", 1, 1}, {"c", 0, 2},   {"d", 0, 0}, {"e", 2, 2},
+                        {"f", 3, 3}, {"g", 3, 3}, {"h", -1, -1}, {"i", 3, 3}};
+  for (size_t i = 0; i < 9; ++i) {
+    EXPECT_EQ(aS1->mFields[i].mName, aRows[i].mName);
+    EXPECT_EQ(aS1->mFields[i].mShape, aRows[i].mShape) << aRows[i].mName;
+    EXPECT_EQ(aS1->mFields[i].mValueType, aRows[i].mType) << aRows[i].mName;
+  }
+  const STLRXSchemaField &aF = aS1->mFields[5];
+  EXPECT_EQ(aF.mMemberNames, (std::vector<std::string>{"m1", "m2"}));
+  EXPECT_EQ(aF.mMemberShape, CTLRX_DS_VECTOR); // members of a vector of structs are vectors
+  EXPECT_EQ(aF.mMemberValueType, CTLRX_DS_DOUBLE);
+  const STLRXSchemaField &aG = aS1->mFields[6];
+  EXPECT_EQ(aG.mMemberNames, (std::vector<std::string>{"p", "q"}));
+  EXPECT_EQ(aG.mMemberShape, CTLRX_DS_SCALAR);
+  EXPECT_EQ(aG.mMemberValueType, CTLRX_DS_STRING);
+  EXPECT_TRUE(aS1->mFields[8].mMemberNames.empty());
+  EXPECT_EQ(aS1->builtFieldCount(), 13);
+  EXPECT_EQ(aSchema.findSection("NOT_THE_ROOT"), nullptr);
+  aSchema.release();
+  EXPECT_TRUE(aSchema.getSections().empty());
+}
+
+TEST_F(SchemaTest, DeclaredSectionsFollowTheListAndPlaceMembersAfterTheirStruct) {
+  CDescription aDescription;
+  aDescription.setRootTag("SOMETHING_ELSE");
+  ASSERT_TRUE(aDescription.declareFromSchema(sampleSchema().c_str(), {"S2", "S1"}));
+  EXPECT_STREQ(aDescription.getRootTag(), "HEADER_INFO");
+  ASSERT_EQ(aDescription.getSectionCount(), 2);
+  EXPECT_STREQ(aDescription.getSection(0)->getName(), "S2");
+  const CDescriptionSection &aS1 = *aDescription.getSection(1);
+  ASSERT_EQ(aS1.getFieldCount(), 13);
+  const char *aOrder[] = {"a", "b", "c", "d", "e", "f", "m1", "m2", "g", "p", "q", "h", "i"};
+  for (int32_t i = 0; i < 13; ++i) {
+    EXPECT_STREQ(aS1.getField(i)->getName(), aOrder[i]);
+  }
+  CDescriptionField &aF = *aS1.getField(5);
+  EXPECT_EQ(aF.getMemberCount(), 2);
+  EXPECT_EQ(aS1.getField(6)->getParentIndex(), 5);
+  EXPECT_EQ(aS1.getField(7)->getParentIndex(), 5);
+  EXPECT_EQ(aF.getMember(1), aS1.getField(7));
+  aF.setNumberOfElements(4);
+  EXPECT_EQ(aS1.getField(7)->getColNbr(), 4);
+  EXPECT_TRUE(aF.holdsValue());
+  EXPECT_EQ(aS1.getField(9)->getParentIndex(), 8);
+  EXPECT_EQ(aS1.getField(10)->getShape(), CTLRX_DS_SCALAR);
+  EXPECT_EQ(aS1.getField(12)->getMemberCount(), 0);
+  EXPECT_EQ(aS1.getField(0)->getParentIndex(), -1);
+}
+
+TEST_F(SchemaTest, FieldOfAnUnknownTypeRefusesEveryAccess) {
+  CDescription aDescription;
+  ASSERT_TRUE(aDescription.declareFromSchema(sampleSchema().c_str(), {"S1"}));
+  CDescriptionField &aH = aDescription.getField("S1.h");
+  EXPECT_EQ(aH.getShape(), -1);
+  EXPECT_EQ(aH.getValueType(), -1);
+  EXPECT_FALSE(aH.holdsValue());
+  EXPECT_EQ(codeOf([&] { aH.getString(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(codeOf([&] { aH.getDouble(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(codeOf([&] { aH.getInteger(0); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(codeOf([&] { aH.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(codeOf([&] { aH.setNumberOfElements(2); }), CTLRX_ERR_DS_TYPE);
+  // Scalar-typed but without a value type: a scalar cell refuses typed values.
+  CDescription aOther;
+  const std::string aPath = writeSchema(R"(<xs:element name="T"><xs:complexType><xs:sequence>
+      <xs:element name="n" type="xs:int"/></xs:sequence></xs:complexType></xs:element>)",
+                                        "int.xsd");
+  ASSERT_TRUE(aOther.declareFromSchema(aPath.c_str(), {"T"}));
+  EXPECT_EQ(codeOf([&] { aOther.getField("T.n").setInteger(3); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(codeOf([&] { aOther.getField("T.n").setString("3"); }), CTLRX_ERR_DS_TYPE);
+}
+
+TEST_F(SchemaTest, UndeclaredOrEmptySectionFailsTheDeclaration) {
+  const std::string aPath = sampleSchema();
+  CDescription aDescription;
+  EXPECT_FALSE(aDescription.declareFromSchema(aPath.c_str(), {"S2", "Nope", "S1"}));
+  ASSERT_EQ(aDescription.getSectionCount(), 1); // the sections before it are built
+  EXPECT_STREQ(aDescription.getSection(0)->getName(), "S2");
+  EXPECT_FALSE(aDescription.declareFromSchema(aPath.c_str(), {"Empty"}));
+}
+
+TEST_F(SchemaTest, SchemaFilesAreFoundByPathOrInTheSchemaDirectory) {
+  // An existing path is used as it is, whatever its extension.
+  tlrxWriteFile(mDir.file("plain.schema"), tlrxReadFile(sampleSchema()));
+  CXmlSchema aSchema;
+  EXPECT_TRUE(aSchema.load(nullptr, mDir.file("plain.schema").c_str()));
+  // A bare name is looked for in the schema directory with ".xsd".
+  EXPECT_TRUE(aSchema.load(nullptr, "PARAMETERS_INFO_MT_FEAT_EXT_CMD"));
+  EXPECT_NE(aSchema.findSection("MAIN_CMD"), nullptr);
+  EXPECT_FALSE(aSchema.load(nullptr, mDir.file("missing.xsd").c_str()));
+  EXPECT_FALSE(aSchema.load(nullptr, "NO_SUCH_SCHEMA"));
+  // Without a name: the root name with ".xsd", which does not exist here.
+  EXPECT_FALSE(aSchema.load(nullptr, nullptr));
+  // A root name that no declaration carries.
+  EXPECT_FALSE(aSchema.load("NOWHERE_ROOT", "PARAMETERS_INFO_MT_FEAT_EXT_CMD"));
+  CDescription aDescription;
+  EXPECT_FALSE(aDescription.declareFromSchema(mDir.file("missing.xsd").c_str(), {"MAIN_CMD"}));
+}
+
+TEST_F(SchemaTest, UnparsableSchemaRaisesWithItsPath) {
+  for (const char *aText : {"<xs:schema><xs:element name=\"HEADER_INFO\">", "not xml at all", ""}) {
+    const std::string aPath = mDir.file("broken.xsd");
+    tlrxWriteFile(aPath, aText);
+    CXmlSchema aSchema;
+    std::string aMessage;
+    EXPECT_EQ(codeOf([&] { aSchema.load(nullptr, aPath.c_str()); }, &aMessage), CTLRX_ERR_XML_PARSE) << aText;
+    EXPECT_EQ(aMessage, aPath);
+  }
+  EXPECT_EQ(fdfScratchBuffersInUse(), 0);
+}
+
+TEST_F(SchemaTest, DeeplyNestedSchemaIsWalkedWithoutRecursion) {
+  const int aDepth = 100000;
+  std::string aNested;
+  aNested.reserve(static_cast<size_t>(aDepth) * 24);
+  for (int i = 0; i < aDepth; ++i) {
+    aNested += "<xs:choice>\n";
+  }
+  aNested += "<xs:element name=\"deep\" type=\"xs:double\"/>\n";
+  for (int i = 0; i < aDepth; ++i) {
+    aNested += "</xs:choice>\n";
+  }
+  const std::string aPath =
+      writeSchema("<xs:element name=\"D\"><xs:complexType>\n" + aNested + "</xs:complexType></xs:element>\n");
+  CDescription aDescription;
+  ASSERT_TRUE(aDescription.declareFromSchema(aPath.c_str(), {"D"}));
+  EXPECT_NE(aDescription.findField("D.deep"), nullptr);
+}
+
+// The header schema is generated from the key files: both declarations of
+// the standard header must agree field by field.
+TEST_F(SchemaTest, HeaderSchemaDeclaresWhatTheKeyFilesDeclare) {
+  CDescription aFromKeys;
+  fdfDeclareStandardHeader(aFromKeys);
+  CDescription aFromSchema;
+  ASSERT_TRUE(aFromSchema.declareFromSchema("TellurixHeaderSchema_version_1.0", fdfStandardHeaderSections()));
+  ASSERT_EQ(aFromSchema.getSectionCount(), aFromKeys.getSectionCount());
+  for (int32_t s = 0; s < aFromKeys.getSectionCount(); ++s) {
+    const CDescriptionSection &aK = *aFromKeys.getSection(s);
+    const CDescriptionSection &aX = *aFromSchema.getSection(s);
+    ASSERT_STREQ(aK.getName(), aX.getName());
+    ASSERT_EQ(aK.getFieldCount(), aX.getFieldCount()) << aK.getName();
+    for (int32_t f = 0; f < aK.getFieldCount(); ++f) {
+      const CDescriptionField &aFK = *aK.getField(f);
+      const CDescriptionField &aFX = *aX.getField(f);
+      SCOPED_TRACE(std::string(aK.getName()) + "." + aFK.getName());
+      EXPECT_STREQ(aFK.getName(), aFX.getName());
+      EXPECT_EQ(aFK.getShape(), aFX.getShape());
+      EXPECT_EQ(aFK.getValueType(), aFX.getValueType());
+      EXPECT_EQ(aFK.getParentIndex(), aFX.getParentIndex());
+      EXPECT_EQ(aFK.getMemberCount(), aFX.getMemberCount());
+    }
+  }
+}
+
+TEST_F(SchemaTest, TemporalParameterSchemaDeclaresEveryKey) {
+  CDescription aParameters;
+  ASSERT_TRUE(aParameters.declareFromSchema("PARAMETERS_INFO_MT_FEAT_EXT_CMD", {"MAIN_CMD"}));
+  std::vector<SKeyType> aKeys = {{"MAIN_CMD.input_file_list", V, TS},
+                                 {"MAIN_CMD.out_root_file_name", S, TS},
+                                 {"MAIN_CMD.interp_type", S, TS},
+                                 {"MAIN_CMD.max_increment_thr_db", S, TD},
+                                 {"MAIN_CMD.max_decrement_thr_time", S, TD},
+                                 {"MAIN_CMD.saturation_default", S, TD},
+                                 {"MAIN_CMD.TellurixEnvironment", S, TS}};
+  for (const char *aSwitch : {"normalize", "out_db", "mean", "std", "median", "gradient", "max", "min",
+                              "span_max_less_min", "max_less_min_sup", "max_less_min_inf", "span_max_on_min",
+                              "max_on_min_sup", "max_on_min_inf", "date_max", "date_min_before_max", "make_tiff"}) {
+    aKeys.push_back({std::string("MAIN_CMD.") + aSwitch, S, TS});
+  }
+  expectKeys(aParameters, aKeys);
+  EXPECT_EQ(aParameters.getSection(0)->getFieldCount(), 24);
+}
+
+TEST_F(SchemaTest, CoherenceParameterSchemaDeclaresEveryKeyOfItsFourSections) {
+  CDescription aParameters;
+  ASSERT_TRUE(aParameters.declareFromSchema("PARAMETERS_INFO_MAIN_FE_COHERENCE_CMD",
+                                            {"COREGISTRATION_CMD", "MAIN_CMD", "INTERF_CMD", "FLAT_CMD"}));
+  expectKeys(aParameters, {
+                              {"INTERF_CMD.int_spectral_shift_filter_flag", S, TS},
+                              {"INTERF_CMD.int_doppler_filter_flag", S, TS},
+                              {"INTERF_CMD.int_blocksize", S, TI},
+                              {"INTERF_CMD.int_block_overlap", S, TI},
+                              {"FLAT_CMD.in_dem_file_name", S, TS},
+                              {"FLAT_CMD.in_gcp_file_name", S, TS},
+                              {"FLAT_CMD.synt_phase_interp_box_size", S, TI},
+                              {"FLAT_CMD.synt_phase_mean_box_size", S, TI},
+                              {"FLAT_CMD.synt_phase_orbit_interp_val", S, TI},
+                              {"FLAT_CMD.synt_resamp_grid_size", S, TD},
+                              {"FLAT_CMD.synt_automatic_slave_orbital_correction_flag", S, TS},
+                              {"FLAT_CMD.synt_optimal_resolution_flag", S, TS},
+                              {"MAIN_CMD.in_master_file_name", S, TS},
+                              {"MAIN_CMD.in_slave_file_name", S, TS},
+                              {"MAIN_CMD.out_root_file_name", S, TS},
+                              {"MAIN_CMD.input_param_file_name", S, TS},
+                              {"MAIN_CMD.compute_param_flag", S, TS},
+                              {"MAIN_CMD.baseline", S, TS},
+                              {"MAIN_CMD.coherence_corr_box_size", S, TS},
+                              {"MAIN_CMD.az_looks", S, TS},
+                              {"MAIN_CMD.rg_looks", S, TS},
+                              {"MAIN_CMD.adat_filter_flag", S, TS},
+                              {"MAIN_CMD.fa_low_snr", S, TS},
+                              {"MAIN_CMD.fa_width", S, TS},
+                              {"MAIN_CMD.shut_flag", S, TS},
+                              {"MAIN_CMD.make_tiff", S, TS},
+                              {"MAIN_CMD.saturation_default", S, TS},
+                              {"MAIN_CMD.TellurixEnvironment", S, TS},
+                              {"COREGISTRATION_CMD.cc_start_shift_range", S, TD},
+                              {"COREGISTRATION_CMD.cc_start_shift_azimuth", S, TD},
+                              {"COREGISTRATION_CMD.cc_init_from_orbits_flag", S, TS},
+                              {"COREGISTRATION_CMD.cc_init_from_amplitude_flag", S, TS},
+                              {"COREGISTRATION_CMD.cc_init_from_coherence_flag", S, TS},
+                              {"COREGISTRATION_CMD.cc_number_coeff_range", S, TI},
+                              {"COREGISTRATION_CMD.cc_number_coeff_azimuth", S, TI},
+                              {"COREGISTRATION_CMD.cc_number_res_coeff_range", S, TI},
+                              {"COREGISTRATION_CMD.cc_number_res_coeff_azimuth", S, TI},
+                              {"COREGISTRATION_CMD.cc_border_dinstance_range", S, TI},
+                              {"COREGISTRATION_CMD.cc_border_dinstance_azimuth", S, TI},
+                              {"COREGISTRATION_CMD.cc_range_shift_dinst_multiple", S, TD},
+                              {"COREGISTRATION_CMD.cc_azimuth_shift_dinst_multiple", S, TD},
+                              {"COREGISTRATION_CMD.cc_maximize_the_variance_flag", S, TS},
+                              {"COREGISTRATION_CMD.cc_variance_threshold", S, TD},
+                              {"COREGISTRATION_CMD.cc_orbit_interpolation", S, TI},
+                              {"COREGISTRATION_CMD.input_shape_file_name", S, TS},
+                              {"COREGISTRATION_CMD.cc_activate_test_on_orbit_flag", S, TS},
+                              {"COREGISTRATION_CMD.cc_range_win_size_test", S, TI},
+                              {"COREGISTRATION_CMD.cc_azimuth_win_size_test", S, TI},
+                              {"COREGISTRATION_CMD.cc_max_shift_test", S, TD},
+                              {"COREGISTRATION_CMD.cc_validity_threshold_test", S, TD},
+                              {"COREGISTRATION_CMD.cc_init_range_win_size", S, TI},
+                              {"COREGISTRATION_CMD.cc_init_azimuth_win_size", S, TI},
+                              {"COREGISTRATION_CMD.cc_init_range_position", S, TI},
+                              {"COREGISTRATION_CMD.cc_init_azimuth_position", S, TI},
+                              {"COREGISTRATION_CMD.cc_range_win_number_cc", S, TI},
+                              {"COREGISTRATION_CMD.cc_azimuth_win_number_cc", S, TI},
+                              {"COREGISTRATION_CMD.cc_range_win_size_cc", S, TI},
+                              {"COREGISTRATION_CMD.cc_azimuth_win_size_cc", S, TI},
+                              {"COREGISTRATION_CMD.cc_oversampling_cc", S, TI},
+                              {"COREGISTRATION_CMD.cc_validity_threshold_cc", S, TD},
+                              {"COREGISTRATION_CMD.cc_oversampling_fine", S, TI},
+                              {"COREGISTRATION_CMD.cc_range_win_number_fine", S, TI},
+                              {"COREGISTRATION_CMD.cc_azimuth_win_number_fine", S, TI},
+                              {"COREGISTRATION_CMD.cc_range_win_size_fine", S, TI},
+                              {"COREGISTRATION_CMD.cc_azimuth_win_size_fine", S, TI},
+                              {"COREGISTRATION_CMD.cc_SNR_threshold", S, TD},
+                              {"COREGISTRATION_CMD.cc_oversampling_coherence", S, TI},
+                              {"COREGISTRATION_CMD.cc_coh_reject_threshold", S, TD},
+                          });
+  // The environment is found by its bare name, in the first section declaring it.
+  EXPECT_EQ(aParameters.findField("TellurixEnvironment"), aParameters.findField("MAIN_CMD.TellurixEnvironment"));
+  EXPECT_EQ(aParameters.getSection(0)->getFieldCount(), 40);
+}
