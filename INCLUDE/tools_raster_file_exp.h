@@ -39,7 +39,7 @@ template <typename S>
 struct SInRange {
   S mLow;
   S mHigh;
-  bool operator()(S theValue) const { return theValue >= mLow && theValue <= mHigh; }
+  bool operator()(S theValue) const { return (theValue >= mLow) & (theValue <= mHigh); }
 };
 
 template <typename S>
@@ -84,7 +84,7 @@ SInRange<S> nullInterval(double theNull) {
 }
 
 template <typename T, typename S, typename P, bool kScale>
-void convertRealLoop(T *theDest, const uint8_t *theCells, int32_t theCount, P theIsNull, T theNull,
+void convertRealLoop(T *__restrict theDest, const uint8_t *__restrict theCells, int32_t theCount, P theIsNull, T theNull,
                      double theScale) {
   for (int32_t i = 0; i < theCount; ++i) {
     const S aValue = loadCell<S>(theCells, i);
@@ -194,3 +194,8 @@ void CRasterFile::getLine(T *theDest, int32_t theRow, int32_t theColStart, int32
   if (mPixelsReversed)
     std::reverse(theDest, theDest + aCount);
 }
+
+// Both instantiations are compiled once, with the raster file, where the
+// conversion loops get the vectoriser's full cost model.
+extern template void CRasterFile::getLine<float>(float *, int32_t, int32_t, int32_t, bool);
+extern template void CRasterFile::getLine<double>(double *, int32_t, int32_t, int32_t, bool);

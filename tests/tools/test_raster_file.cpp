@@ -459,10 +459,10 @@ TEST_F(RasterFileTest, ValidMaskMarksNoDataCells) {
 // ------------------------------------------------------------ line caches
 
 TEST_F(RasterFileTest, ReadCacheServesItsLinesInBothDirections) {
-  // 4096-byte lines: the stream reads them straight into the cache, so what
-  // the cache holds is all the object has.
+  // Lines of 256 KiB, as large as the stream buffer: the stream reads them
+  // straight into the cache, so what the cache holds is all the object has.
   const int aRows = 10;
-  const int aCols = 1024;
+  const int aCols = 65536;
   const STypeInfo &aType = theTypes[7];
   const TGrid aGrid = makeGrid(aType, aRows, aCols, -1.0);
   CRasterFileParam aParam = param("cache.raw", CTLRX_CELL_FLOAT, aRows, aCols);

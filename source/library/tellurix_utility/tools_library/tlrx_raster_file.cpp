@@ -22,6 +22,9 @@ namespace {
 
 constexpr int64_t CTLRX_RF_SHORT_SEEK_LIMIT = 2000000000; // below it the original short seek sufficed
 constexpr size_t CTLRX_RF_PADDING_CHUNK = 1 << 20;        // bytes of zeros written per call when padding
+// Stream buffer: line-sized transfers then cost one system call per many
+// lines; transfers of a whole buffer or more bypass it.
+constexpr size_t CTLRX_RF_STREAM_BUFFER = 1 << 18;
 
 bool machineIsMSBF() {
   const uint16_t aProbe = 1;
@@ -410,6 +413,9 @@ void CRasterFile::openStream(const char *theFileName, int32_t theMode) {
     TLRX_RAISE(theMode == CTLRX_RF_OPEN_READ ? CTLRX_ERR_RF_OPEN : CTLRX_ERR_RF_WRITE, theFileName);
   }
   mFile.reset(aFile);
+  if (!mStreamBuffer)
+    mStreamBuffer.reset(new char[CTLRX_RF_STREAM_BUFFER]);
+  std::setvbuf(aFile, mStreamBuffer.get(), _IOFBF, CTLRX_RF_STREAM_BUFFER);
 }
 
 void CRasterFile::adoptLayout(const CRasterFileParam &theParam, int32_t theMode) {

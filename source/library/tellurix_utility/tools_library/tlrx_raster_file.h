@@ -219,6 +219,7 @@ private:
   int32_t mCacheLast = -1;
   int32_t mCacheColStart = -1;                // columns the read cache holds
   int32_t mCacheColEnd = -1;
+  std::unique_ptr<char[]> mStreamBuffer;      // outlives mFile, which is declared after it
   std::unique_ptr<FILE, SFileCloser> mFile;
   int32_t mRasterStatus = CTLRX_RF_CLOSE;
   int32_t mNrOfPixelsPerLine = 0;
