@@ -91,8 +91,11 @@ void appendLatin1(const char *theUtf8, size_t theLength, std::string &theOut) {
   for (size_t i = 0; i < theLength;) {
     const unsigned char aByte = aText[i];
     if (aByte < 0x80) {
-      theOut.push_back(static_cast<char>(aByte));
-      ++i;
+      size_t aEnd = i + 1; // ASCII runs are copied in one go
+      while (aEnd < theLength && aText[aEnd] < 0x80)
+        ++aEnd;
+      theOut.append(theUtf8 + i, aEnd - i);
+      i = aEnd;
     } else if ((aByte == 0xC2 || aByte == 0xC3) && i + 1 < theLength) {
       theOut.push_back(static_cast<char>(((aByte & 0x03) << 6) | (aText[i + 1] & 0x3F)));
       i += 2;
@@ -305,8 +308,11 @@ void fdfPreprocessXmlLine(const char *theLine, size_t theLength, std::string &th
         ++i;
       }
     } else if (aByte < 0x80) {
-      theOut.push_back(static_cast<char>(aByte));
-      ++i;
+      size_t aEnd = i + 1; // plain ASCII runs are copied in one go
+      while (aEnd < theLength && aText[aEnd] < 0x80 && aText[aEnd] != '&')
+        ++aEnd;
+      theOut.append(theLine + i, aEnd - i);
+      i = aEnd;
     } else if (const size_t aSequence = utf8SequenceLength(aText + i, theLength - i); aSequence > 0) {
       for (size_t j = 0; j < aSequence; ++j)
         appendHighByte(aText[i + j], theOut);
@@ -323,6 +329,10 @@ void fdfPreprocessXmlLine(const char *theLine, size_t theLength, std::string &th
 }
 
 void fdfRestoreXmlText(const char *theText, size_t theLength, std::string &theOut) {
+  if (std::memchr(theText, '#', theLength) == nullptr) {
+    theOut.append(theText, theLength);
+    return;
+  }
   for (size_t i = 0; i < theLength;) {
     if (theText[i] == '#') {
       if (theLength - i > CTLRX_BIG_MARKER_LEN &&
