@@ -378,7 +378,8 @@ TEST_F(EnviHeader, SlantRangeSpacingIsWrittenAsGroundRange) {
   EXPECT_NE(aLine.find(", 4, units=Meters}"), std::string::npos);
 
   aHeader.getField("InitialGeometry.Projection") = "GROUND_RANGE";
-  EXPECT_EQ(lineStarting(enviText(aHeader), "pixel size"), "pixel size = {7.90000000000000035527136788005, 4, units=Meters}");
+  EXPECT_EQ(lineStarting(enviText(aHeader), "pixel size"),
+            "pixel size = {7.90000000000000035527136788005, 4, units=Meters}");
   // No spacings: no pixel size line, the rest is written.
   aHeader.getField("Processing.PixelSpacingAz").unset();
   const std::string aText = enviText(aHeader);

@@ -323,7 +323,10 @@ SClasses readClasses(const CDescription &theHeader) {
   SClasses aClasses;
   aClasses.mNames = vectorWithValue(theHeader, "RasterInfo.ClassificationName", CTLRX_DS_STRING);
   const CDescriptionField *aData = vectorWithValue(theHeader, "RasterInfo.ClassificationData", CTLRX_DS_INTEGER);
-  aClasses.mCount = aClasses.mNames != nullptr ? aClasses.mNames->getColNbr() : aData != nullptr ? aData->getColNbr() : 0;
+  if (aClasses.mNames != nullptr)
+    aClasses.mCount = aClasses.mNames->getColNbr();
+  else if (aData != nullptr)
+    aClasses.mCount = aData->getColNbr();
   const char *const aLutKeys[3] = {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"};
   for (int i = 0; i < 3; ++i) {
     aClasses.mLut[i] = vectorWithValue(theHeader, aLutKeys[i], CTLRX_DS_INTEGER);
@@ -420,7 +423,8 @@ std::string composeHeader(const CDescription &theHeader, const SRasterLayout &th
   aText.keyLine(theVocabulary.key("ULYMAP_NAME"), "1");
 
   double aNull = 0.0;
-  if (theHeader.findSection("RasterInfo") != nullptr && fdfEnviFieldNumber(theHeader, "RasterInfo.NullCellValue", aNull))
+  if (theHeader.findSection("RasterInfo") != nullptr &&
+      fdfEnviFieldNumber(theHeader, "RasterInfo.NullCellValue", aNull))
     aText.keyLine("Data Ignore Value", fdfEnviDouble(aNull));
 
   if (aDataUnits == "INTERFEROGRAMME" || aDataUnits == "FLATTENED INTERFEROGRAMME")
