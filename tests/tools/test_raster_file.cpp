@@ -633,7 +633,10 @@ TEST_F(RasterFileTest, ClosingPadsLinesNeverWrittenWithAWarning) {
   const int16_t aCells[3] = {0x0101, 0x0202, 0x0303};
   for (int r = 0; r < 60; ++r)
     aFile.writeRecords(r, 1, aCells);
+  startTrace();
   aFile.close();
+  const std::string aTrace = traceText();
+  EXPECT_NE(aTrace.find("\nWARNING NULL line writed : 40 in file : " + aParam.mFileName), std::string::npos);
   EXPECT_EQ(fdfGetWarningCount(), aWarnings + 1);
   const std::string aData = tlrxReadFile(aParam.mFileName);
   ASSERT_EQ(aData.size(), 100u * 8u);
@@ -949,6 +952,12 @@ TEST_F(RasterFileTest, UnknownCellTypesAndNegativeLayoutsAreRefused) {
     CRasterFile aFile;
     expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read(aBad); }, "negative field " + std::to_string(aField));
   }
+  // Records longer than 2^31 - 1 bytes cannot be addressed by the layout.
+  CRasterFileParam aLong = aParam;
+  aLong.mRowPrefix = 2147483000;
+  aLong.mRowSuffix = 1000;
+  CRasterFile aLongFile;
+  expectCode(CTLRX_ERR_RF_USAGE, [&] { aLongFile.open_write(aLong); }, "record too long");
   // A header naming a cell type outside the vocabulary.
   CDescription aHeader;
   fdfDeclareStandardHeader(aHeader);
@@ -971,6 +980,7 @@ TEST_F(RasterFileTest, FilesShorterThanTheirHeaderAreNeverReadAsZeros) {
                                                {100, 0, 64},         // header offset beyond the end
                                                {0, 1000, 64},        // prefix beyond the end
                                                {2000000000, 0, 64},  // offset far beyond the end
+                                               {0, 2000000000, 64},  // refused before a 2 GB record buffer
                                                {0, 0, 0}}) {         // empty file
     CRasterFileParam aBad = aParam;
     aBad.mHeaderOffset = aCase.mHeader;
@@ -1055,7 +1065,16 @@ TEST_F(RasterFileTest, ModesRefuseWhatTheyDoNotAllow) {
   CRasterFileParam aOut = param("modes_out.raw", CTLRX_CELL_FLOAT, 2, 3);
   CRasterFile aWriter;
   aWriter.open_write(aOut);
+  startTrace();
   expectCode(CTLRX_ERR_RF_READ, [&] { aWriter.readRecords(0, 1, 0, 2, aCells); }, "read in write mode");
+  expectCode(CTLRX_ERR_RF_WRITE, [&] { aReader.writeRecords(0, 1, aCells); }, "write in read mode");
+  const std::string aTrace = traceText();
+  EXPECT_NE(aTrace.find("Error: attempting to read from the raster file " + aOut.mFileName +
+                        " while it was open in write mode\n"),
+            std::string::npos);
+  EXPECT_NE(aTrace.find("Error: attempting to write to the raster file " + aParam.mFileName +
+                        " while it was open in read mode\n"),
+            std::string::npos);
   expectCode(CTLRX_ERR_RF_READ, [&] { aWriter.getLine(aCells, 0); }, "getLine in write mode");
   expectCode(CTLRX_ERR_RF_WRITE, [&] { aWriter.writeRecords(0, 0, aCells); }, "no lines");
   expectCode(CTLRX_ERR_RF_WRITE, [&] { aWriter.writeRecords(0, 1, aCells, 2, 1); }, "columns crossed");

@@ -340,9 +340,9 @@ void CRasterFile::openWith(const CRasterFileParam &theParam, int32_t theMode) {
     }
     validateLayout(theParam, theMode);
     openStream(theParam.mFileName.c_str(), theMode);
-    adoptLayout(theParam, theMode);
     if (theMode == CTLRX_RF_OPEN_READ)
-      checkFileCoversImage();
+      checkFileCoversImage(theParam);
+    adoptLayout(theParam, theMode);
     if (fseeko(mFile.get(), static_cast<off_t>(mHeaderLen), SEEK_SET) != 0) {
       fdfTraceMessage("Error: cannot position the file %s on its first record  errno = %d\n", mFileName.c_str(),
                       errno);
@@ -447,20 +447,23 @@ void CRasterFile::adoptLayout(const CRasterFileParam &theParam, int32_t theMode)
 }
 
 // A data file shorter than its header declares is refused at once instead of
-// delivering a short image later.
-void CRasterFile::checkFileCoversImage() const {
+// delivering a short image later, and before any buffer is sized by the
+// header's numbers.
+void CRasterFile::checkFileCoversImage(const CRasterFileParam &theParam) const {
   struct stat aStat;
-  const int64_t aNeeded = recordOffset(mNrOfLinesPerImage);
-  if (fstat(fileno(mFile.get()), &aStat) == 0 && !S_ISREG(aStat.st_mode))
+  if (fstat(fileno(mFile.get()), &aStat) != 0 || !S_ISREG(aStat.st_mode))
     return;
-  const int64_t aSize = fstat(fileno(mFile.get()), &aStat) == 0 ? static_cast<int64_t>(aStat.st_size) : -1;
+  const int64_t aRecordLen = static_cast<int64_t>(theParam.mRowPrefix) +
+                             fdfCellLineBytes(theParam.mCellType, theParam.mNrOfPixelsPerLine) + theParam.mRowSuffix;
+  const int64_t aNeeded = theParam.mHeaderOffset + aRecordLen * theParam.mNrOfLinesPerImage;
+  const int64_t aSize = static_cast<int64_t>(aStat.st_size);
   if (aSize >= aNeeded)
     return;
-  fdfTraceMessage("Error: the file %s holds %lld bytes, its header declares %lld (mHeaderLen = %d, mRecordLen = %d, "
+  fdfTraceMessage("Error: the file %s holds %lld bytes, its header declares %lld (mHeaderLen = %d, mRecordLen = %lld, "
                   "NrOfLinesPerImage = %d)\n",
-                  mFileName.c_str(), static_cast<long long>(aSize), static_cast<long long>(aNeeded), mHeaderLen,
-                  mRecordLen, mNrOfLinesPerImage);
-  TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+                  theParam.mFileName.c_str(), static_cast<long long>(aSize), static_cast<long long>(aNeeded),
+                  theParam.mHeaderOffset, static_cast<long long>(aRecordLen), theParam.mNrOfLinesPerImage);
+  TLRX_RAISE(CTLRX_ERR_RF_READ, theParam.mFileName.c_str());
 }
 
 void CRasterFile::resetState() {

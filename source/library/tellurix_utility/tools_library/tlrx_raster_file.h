@@ -175,7 +175,7 @@ private:
   void refuseWhenOpen(const char *theFileName) const;
   void validateLayout(const CRasterFileParam &theParam, int32_t theMode) const;
   void openStream(const char *theFileName, int32_t theMode);
-  void checkFileCoversImage() const;
+  void checkFileCoversImage(const CRasterFileParam &theParam) const;
   void adoptLayout(const CRasterFileParam &theParam, int32_t theMode);
   void resetState();
 
