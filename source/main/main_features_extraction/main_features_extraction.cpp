@@ -1,6 +1,7 @@
 // Program entry: start-up, command dispatch and the closing of the run.
 #include "main_features_extraction.h"
 
+#include "main_mean_std_range.h"
 #include "main_ratio.h"
 #include "main_search_min_max_value.h"
 #include "tlrx_enviroment.h"
@@ -18,7 +19,7 @@ const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
     {"main_ratio#", main_ratio},
     {"main_correlation#", nullptr},
     {"main_coherence#", nullptr},
-    {"main_temporal_feature_extraction#", nullptr},
+    {"main_temporal_feature_extraction#", main_mean_std_range},
     {"main_principal_component_analysis#", nullptr},
     {"main_min_and_max#", main_search_min_max_value},
 };

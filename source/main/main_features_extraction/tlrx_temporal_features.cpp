@@ -1,0 +1,296 @@
+// The feature worker. Set-up: grid header, temporal order, input sources,
+// output headers; then one pass over the output lines, each pixel's series
+// reduced by CTemporalSeries; then the outputs are closed and converted.
+// The grid header and the list file are temporary; outputs count as pending
+// (removed on failure) until all of them are complete.
+#include "tlrx_temporal_features.h"
+
+#include "main_search_min_max_value.h"
+#include "tlrx_description_section.h"
+#include "tlrx_description_xml.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_features_common.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_geocoded_stack.h"
+#include "tlrx_geotiff_step.h"
+#include "tlrx_pending_files.h"
+#include "tlrx_raster_file.h"
+#include "tlrx_standard_header.h"
+#include "tlrx_temporal_grid.h"
+
+#include <cmath>
+#include <cstdio>
+#include <memory>
+
+namespace {
+
+const STemporalOutput theOutputs[CTLRX_TF_COUNT] = {
+    {"mean", "_mea", false},
+    {"std", "_std", false},
+    {"median", "_med", false},
+    {"gradient", "_grad", false},
+    {"max", "_max", false},
+    {"min", "_min", false},
+    {"span_max_less_min", "_spanD", false},
+    {"max_less_min_sup", "_maxI", false},
+    {"max_less_min_inf", "_maxD", false},
+    {"span_max_on_min", "_spanR", false},
+    {"max_on_min_sup", "_maxR", false},
+    {"max_on_min_inf", "_minR", false},
+    {"date_max", "_dateMax", true},
+    {"date_min_before_max", "_dateMinBeforeMax", true},
+};
+
+constexpr const char *CTLRX_TF_PROCESS = "Multi Temporal Features Extraction";
+constexpr const char *CTLRX_TF_TIFF_PROCESS = "Tiff generation ... ";
+constexpr int32_t CTLRX_TF_DATE_NULL = CTLRX_TF_NO_DATE;
+
+// The inputs' values along one output line: n rows of P values.
+class CInputRows {
+public:
+  virtual ~CInputRows() = default;
+  virtual void read(int32_t theLine, double *theRows) = 0;
+  const std::vector<double> &nulls() const { return mNulls; }
+
+protected:
+  std::vector<double> mNulls;
+};
+
+// Co-registered inputs: the top-left P pixels of line l of each input.
+class CDirectRows : public CInputRows {
+public:
+  CDirectRows(const std::vector<std::string> &theNames, int32_t thePixels) : mPixels(thePixels) {
+    fdfTraceMessage(" Time ordered Image List:\n");
+    for (const std::string &aName : theNames) {
+      fdfTraceMessage("%s\n", aName.c_str());
+      CDescription aHeader;
+      fdfReadTemporalInputHeader(aName, aHeader);
+      mFiles.push_back(std::make_unique<CRasterFile>());
+      mFiles.back()->open_read(aName.c_str(), aHeader);
+      mNulls.push_back(mFiles.back()->getDummyVal());
+    }
+  }
+  void read(int32_t theLine, double *theRows) override {
+    for (size_t i = 0; i < mFiles.size(); ++i)
+      mFiles[i]->getLine(theRows + i * static_cast<size_t>(mPixels), theLine, 0, mPixels - 1);
+  }
+
+private:
+  int32_t mPixels;
+  std::vector<std::unique_ptr<CRasterFile>> mFiles;
+};
+
+// Geocoded inputs, resampled onto the grid by the stack.
+class CGeocodedRows : public CInputRows {
+public:
+  CGeocodedRows(const std::vector<std::string> &theNames, const std::string &theRoot,
+                const std::string &theInterpolation, CPendingFiles &thePending) {
+    const std::string aList = theRoot + ".txt";
+    writeList(aList, theNames, thePending);
+    const bool aReady = mStack.initialise(aList.c_str(), theRoot.c_str(), theInterpolation.c_str(), 1, 0);
+    fdfRemoveFile(aList.c_str());
+    thePending.forgetFile(aList);
+    if (!aReady) {
+      const std::string aHeader = fdfHeaderFileName(theRoot);
+      fdfTraceMessage("Error: missing parameter file %s\n", aHeader.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aHeader.c_str());
+    }
+    mNulls = mStack.getNullValues();
+  }
+  void read(int32_t theLine, double *theRows) override {
+    const size_t aPixels = static_cast<size_t>(mStack.getGrid().mPixels);
+    for (int32_t i = 0; i < mStack.getInputCount(); ++i)
+      mStack.getLine(i, theLine, theRows + i * aPixels);
+  }
+
+private:
+  static void writeList(const std::string &theList, const std::vector<std::string> &theNames,
+                        CPendingFiles &thePending) {
+    FILE *aFile = std::fopen(theList.c_str(), "w");
+    bool aWritten = aFile != nullptr;
+    if (aFile != nullptr) {
+      thePending.addFile(theList);
+      for (const std::string &aName : theNames)
+        aWritten = aWritten && std::fprintf(aFile, "%s\n", aName.c_str()) > 0;
+      aWritten = aWritten && std::fprintf(aFile, "#\n") > 0;
+      aWritten = std::fclose(aFile) == 0 && aWritten;
+    }
+    if (!aWritten) {
+      fdfTraceMessage("Error while writing parameter file %s\n", theList.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_WRITE, theList.c_str());
+    }
+  }
+
+  CGeocodedImageStack mStack;
+};
+
+// One open output with its line buffer.
+struct SOpenOutput {
+  int mFeature = 0;
+  std::string mName;
+  CRasterFile mFile;
+  std::vector<float> mValues;
+  std::vector<int32_t> mDates;
+};
+
+[[noreturn]] void fdfRaiseMissing(const std::string &theName) {
+  fdfTraceMessage("Error: missing parameter file %s\n", theName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_OPEN, theName.c_str());
+}
+
+// The raster file reports its own open failures; this command reports an
+// output it cannot create as a missing file, before anything is written.
+void fdfCheckCreatable(const std::string &theName) {
+  FILE *aFile = std::fopen(theName.c_str(), "wb");
+  if (aFile == nullptr)
+    fdfRaiseMissing(theName);
+  std::fclose(aFile);
+}
+
+void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, const std::string &theReference,
+                   CPendingFiles &thePending) {
+  CDescription aHeader;
+  fdfDeclareStandardHeader(aHeader);
+  aHeader = theGridHeader;
+  if (theOutputs[theOutput.mFeature].mDate) {
+    fdfSetHeaderText(aHeader, "RasterInfo.CellType", "INT");
+    fdfSetHeaderNumber(aHeader, "RasterInfo.NullCellValue", CTLRX_TF_DATE_NULL);
+    fdfStampOtherInfo(aHeader, CTLRX_TF_REFERENCE_KEY, theReference.c_str());
+  }
+  fdfCheckCreatable(theOutput.mName);
+  thePending.addRaster(theOutput.mName);
+  theOutput.mFile.open_write(theOutput.mName.c_str(), aHeader);
+  if (!fdfWriteStandardHeader(theOutput.mName.c_str(), aHeader, false))
+    fdfRaiseMissing(fdfHeaderFileName(theOutput.mName));
+}
+
+float fdfToFloat(double theValue) { return tlrx_raster_detail::narrowFloating<float>(theValue); }
+
+// Days of the inputs, ordered in time with their names, and the trace of
+// their distances from the reference.
+std::vector<long> fdfOrderInTime(std::vector<std::string> &theNames) {
+  const std::vector<STLRXDate> aDates = fdfOrderChronologically(theNames);
+  std::vector<long> aDays;
+  for (const STLRXDate &aDate : aDates)
+    aDays.push_back(aDate.mDay);
+  fdfTraceMessage("Temporal Distanfe from the reference date : ");
+  for (size_t i = 0; i < aDays.size(); ++i)
+    fdfTraceMessage(" ID = %d , Temp Dist = %ld\n", static_cast<int>(i), aDays[i] - aDays[0]);
+  return aDays;
+}
+
+std::string fdfReferenceDateText(const std::string &theEarliest) {
+  CDescription aHeader;
+  fdfReadTemporalInputHeader(theEarliest, aHeader);
+  std::string aText;
+  fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aText);
+  return aText;
+}
+
+void fdfStoreFeatures(std::vector<std::unique_ptr<SOpenOutput>> &theOpen, int32_t thePixel, const double *theValues,
+                      const int32_t *theDates) {
+  for (auto &aOutput : theOpen) {
+    if (theOutputs[aOutput->mFeature].mDate)
+      aOutput->mDates[thePixel] = theDates[aOutput->mFeature - CTLRX_TF_DATE_MAX];
+    else
+      aOutput->mValues[thePixel] = fdfToFloat(theValues[aOutput->mFeature]);
+  }
+}
+
+} // namespace
+
+const STemporalOutput &fdfTemporalOutput(int theFeature) { return theOutputs[theFeature]; }
+
+double fdfMaxRatioThreshold(double theMaxIncrementThrDb) { return std::pow(10.0, theMaxIncrementThrDb / 10.0); }
+
+double fdfMaxRatioTimeThreshold(double theMaxIncrementThrDb, double theMaxDecrementThrTime) {
+  return fdfMaxRatioThreshold(theMaxIncrementThrDb) / theMaxDecrementThrTime;
+}
+
+int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
+  fdfTraceMessage("\n\nMulti Temporal Features Extraction\n");
+  fdfSetProcessName(CTLRX_TF_PROCESS);
+  getAndSetPerc(-1, 0, nullptr);
+  if (theRequest.mInputs.empty())
+    TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, theRequest.mRoot.c_str());
+  const std::string &aRoot = theRequest.mRoot;
+  CPendingFiles aPending;
+
+  const STemporalGridInfo aGridInfo = fdfBuildTemporalGrid(theRequest.mInputs, aRoot);
+  aPending.addHeaders(aRoot);
+
+  STemporalSettings aSettings;
+  aSettings.mNormalize = theRequest.mNormalize;
+  aSettings.mDecibels = theRequest.mDecibels;
+  aSettings.mRatioTimeThreshold =
+      fdfMaxRatioTimeThreshold(theRequest.mMaxIncrementThrDb, theRequest.mMaxDecrementThrTime);
+  fdfTraceMessage("\n\t MaxIncrementThrDb = %f\t MaxRatioThr = %g\n\t MaxIncrementThrTime = %f\n\t MaxRatioTimeThr = %g\n",
+                  theRequest.mMaxIncrementThrDb, fdfMaxRatioThreshold(theRequest.mMaxIncrementThrDb),
+                  theRequest.mMaxDecrementThrTime, aSettings.mRatioTimeThreshold);
+
+  std::vector<std::string> aNames = theRequest.mInputs;
+  const std::vector<long> aDays = fdfOrderInTime(aNames);
+  const std::string aReference = fdfReferenceDateText(aNames[0]);
+
+  CDescription aGridHeader;
+  fdfReadStandardHeader(aRoot.c_str(), aGridHeader);
+  const int32_t aLines = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfLinesPerImage");
+  const int32_t aPixels = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfPixelsPerLine");
+  aSettings.mNull = fdfHeaderNullValue(aGridHeader);
+
+  std::unique_ptr<CInputRows> aSource;
+  if (aGridInfo.mGeocoded)
+    aSource = std::make_unique<CGeocodedRows>(aNames, aRoot, theRequest.mInterpolation, aPending);
+  else
+    aSource = std::make_unique<CDirectRows>(aNames, aPixels);
+  fdfRemoveHeaderFiles(aRoot);
+  aPending.forgetAll();
+
+  std::vector<std::unique_ptr<SOpenOutput>> aOutputs;
+  for (int f = 0; f < CTLRX_TF_COUNT; ++f) {
+    aSettings.mWanted[f] = theRequest.mOutputs[f];
+    if (!theRequest.mOutputs[f])
+      continue;
+    auto aOutput = std::make_unique<SOpenOutput>();
+    aOutput->mFeature = f;
+    aOutput->mName = aRoot + theOutputs[f].mSuffix;
+    if (theOutputs[f].mDate)
+      aOutput->mDates.assign(aPixels, CTLRX_TF_DATE_NULL);
+    else
+      aOutput->mValues.assign(aPixels, 0.0f);
+    fdfOpenOutput(*aOutput, aGridHeader, aReference, aPending);
+    aOutputs.push_back(std::move(aOutput));
+  }
+
+  const size_t aInputs = aNames.size();
+  std::vector<double> aRows(aInputs * static_cast<size_t>(aPixels));
+  CTemporalSeries aSeries(aSettings, aDays, aSource->nulls());
+  double aValues[CTLRX_TF_VALUE_COUNT];
+  int32_t aDates[2];
+  CLineProgress aProgress(100.0);
+  for (int32_t l = 0; l < aLines; ++l) {
+    aProgress.update(l, aLines);
+    aSource->read(l, aRows.data());
+    for (int32_t x = 0; x < aPixels; ++x) {
+      aSeries.select(&aRows[x], static_cast<size_t>(aPixels));
+      aSeries.features(aValues, aDates);
+      fdfStoreFeatures(aOutputs, x, aValues, aDates);
+    }
+    for (auto &aOutput : aOutputs)
+      aOutput->mFile.putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
+                                                        : static_cast<const void *>(aOutput->mDates.data()));
+  }
+  aSource.reset();
+
+  for (auto &aOutput : aOutputs)
+    aOutput->mFile.close();
+  aPending.forgetAll();
+  if (theRequest.mMakeTiff)
+    for (auto &aOutput : aOutputs) {
+      fdfSetProcessName(CTLRX_TF_TIFF_PROCESS);
+      getAndSetPerc(-1, 0, nullptr);
+      fdfMakeQuickLook(aOutput->mName, theRequest.mSaturation);
+    }
+  return 0;
+}

@@ -1,0 +1,273 @@
+// The temporal feature extraction command run as a host runs it: every
+// feature against a direct computation on a seeded series with no data,
+// the output headers, the geocoded grid, and the failures with their codes.
+#include "tlrx_description_xml.h"
+#include "tlrx_temporal_test_support.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <random>
+
+namespace {
+
+constexpr double theNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double theTolerance = 1.1754943508222875e-38;
+
+const char *const theSuffixes[14] = {"_mea",  "_std",  "_med",  "_grad", "_max",  "_min",     "_spanD",
+                                     "_maxI", "_maxD", "_spanR", "_maxR", "_minR", "_dateMax", "_dateMinBeforeMax"};
+const char *const theSwitches[14] = {"mean",          "std",           "median",           "gradient",
+                                     "max",           "min",           "span_max_less_min", "max_less_min_sup",
+                                     "max_less_min_inf", "span_max_on_min", "max_on_min_sup", "max_on_min_inf",
+                                     "date_max",      "date_min_before_max"};
+
+// The features of one pixel computed the slow, obvious way: the kept
+// samples, then sorted lists, then the modifiers.
+struct SReference {
+  double mValue[12];
+  double mDate[2];
+};
+
+bool isNoData(double theValue, double theNull) {
+  if (std::isnan(theNull))
+    return std::isnan(theValue);
+  return std::isnan(theValue) || (theNull - theTolerance <= theValue && theValue <= theNull + theTolerance);
+}
+
+SReference reference(const std::vector<double> &theSeries, const std::vector<double> &theNulls,
+                     const std::vector<long> &theDays, double theN, double theRatioTime, bool theNormalize,
+                     bool theDb) {
+  SReference aRef;
+  std::fill(aRef.mValue, aRef.mValue + 12, theN);
+  aRef.mDate[0] = aRef.mDate[1] = -9999;
+  std::vector<double> v;
+  std::vector<long> d;
+  for (size_t i = 0; i < theSeries.size(); ++i) {
+    if (isNoData(theSeries[i], theNulls[i]))
+      continue;
+    const double a = std::fabs(theSeries[i]);
+    if (!v.empty() && !((a / v.back()) / double(theDays[i] - (theDays[0] + d.back())) < theRatioTime))
+      continue;
+    v.push_back(a);
+    d.push_back(theDays[i] - theDays[0]);
+  }
+  const size_t k = v.size();
+  if (k == 0)
+    return aRef;
+  double aSum = 0, aCount = 0;
+  for (double a : v)
+    if (!isNoData(a, theN)) {
+      aSum += a;
+      ++aCount;
+    }
+  const double M = aCount > 0 ? aSum / aCount : theN;
+  double aSquares = 0;
+  for (double a : v)
+    if (!isNoData(a, theN))
+      aSquares += (a - M) * (a - M);
+  std::vector<double> V = v, Dv, A, Rv;
+  for (size_t j = 1; j < k; ++j) {
+    Dv.push_back(v[j] - v[j - 1]);
+    A.push_back(std::fabs(v[j] - v[j - 1]));
+    Rv.push_back(v[j] / v[j - 1]);
+  }
+  for (auto *aList : {&V, &Dv, &A, &Rv})
+    std::sort(aList->begin(), aList->end());
+  double *r = aRef.mValue;
+  bool aSet[12] = {};
+  auto put = [&](int f, double x) {
+    r[f] = x;
+    aSet[f] = true;
+  };
+  put(0, M);
+  put(2, k > 2 ? V[(k - 1) / 2] : k == 2 ? (V[0] + V[1]) / 2 : V[0]);
+  put(4, V[k - 1]);
+  put(5, V[0]);
+  put(6, V[k - 1] - V[0]);
+  put(9, V[k - 1] / V[0]);
+  if (k > 1) {
+    put(7, Dv[k - 2]);
+    put(8, Dv[0]);
+    put(10, Rv[k - 2]);
+    put(11, Rv[0]);
+    put(3, A[k - 2]);
+    if (aCount > 0)
+      put(1, std::sqrt(aSquares / aCount));
+  }
+  for (int f : {1, 3, 4, 5, 6, 7, 8, 9, 10, 11})
+    if (theNormalize && aSet[f]) {
+      if (aCount > 0) {
+        r[f] /= M;
+      } else {
+        r[f] = theN;
+        aSet[f] = false;
+      }
+    }
+  for (int f = 1; f < 12; ++f)
+    if (theDb && aSet[f])
+      r[f] = 10 * std::log10(r[f]);
+  size_t aMax = 0;
+  for (size_t j = 1; j < k; ++j)
+    if (v[j] > v[aMax])
+      aMax = j;
+  aRef.mDate[0] = double(d[aMax]);
+  if (aMax > 0)
+    aRef.mDate[1] = double(d[std::min_element(v.begin(), v.begin() + aMax) - v.begin()]);
+  return aRef;
+}
+
+class TemporalFeaturesTest : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override {
+    tlrxStartLibraryEnvironment(mDir.path());
+    tlrxWriteFile(working(), "0\nhost\n");
+  }
+  std::string working() const { return mDir.file("Process.working"); }
+  std::string error() const { return tlrxReadFile(working() + "_error"); }
+  std::string log() const { return tlrxReadFile(mDir.file("Process.log")); }
+
+  void image(const std::string &theName, int theLines, int thePixels, const std::vector<double> &theValues,
+             const std::string &theTime, bool theHasNull = true, double theNull = -1) {
+    STLRXTestRaster aRaster;
+    aRaster.mLines = theLines;
+    aRaster.mPixels = thePixels;
+    aRaster.mValues = theValues;
+    aRaster.mHasNull = theHasNull;
+    aRaster.mNull = theNull;
+    aRaster.mAcquisitionTime = theTime;
+    tlrxWriteTestRaster(mDir.file(theName), aRaster);
+  }
+
+  STLRXTemporalParameters parameters(const std::vector<std::string> &theInputs, bool theAll = true) {
+    STLRXTemporalParameters aParameters;
+    for (const std::string &aInput : theInputs)
+      aParameters.mInputs.push_back(mDir.file(aInput));
+    aParameters.mRoot = mDir.file("out");
+    if (theAll)
+      for (const char *aSwitch : theSwitches)
+        aParameters.mSettings.push_back({aSwitch, "OK"});
+    return aParameters;
+  }
+
+  STLRXRun run(const STLRXTemporalParameters &theParameters, const std::string &theFile = "param.xml") {
+    tlrxWriteFile(mDir.file(theFile), tlrxTemporalParameterText(theParameters));
+    tlrxWriteFile(working(), "0\nhost\n");
+    return tlrxRunMain("main_temporal_feature_extraction#" + mDir.file(theFile), mDir.path());
+  }
+
+  std::vector<double> result(const char *theSuffix) {
+    return tlrxReadTestRaster(mDir.file(std::string("out") + theSuffix));
+  }
+
+  // No result, temporary grid header or list file left beside the root.
+  void expectNothingWritten() {
+    for (const char *aSuffix : theSuffixes)
+      for (const char *aCompanion : {"", "_hdr", ".sml", ".hdr"})
+        EXPECT_FALSE(tlrxFileExists(mDir.file(std::string("out") + aSuffix + aCompanion))) << aSuffix << aCompanion;
+    for (const char *aCompanion : {"_hdr", ".sml", ".hdr", ".txt"})
+      EXPECT_FALSE(tlrxFileExists(mDir.file(std::string("out") + aCompanion))) << aCompanion;
+  }
+};
+
+void expectNear(double theActual, double theExpected, const std::string &theWhat) {
+  const float aExpected = static_cast<float>(theExpected);
+  if (std::isnan(aExpected)) {
+    EXPECT_TRUE(std::isnan(theActual)) << theWhat;
+  } else if (std::isinf(aExpected)) {
+    EXPECT_EQ(theActual, aExpected) << theWhat;
+  } else {
+    EXPECT_NEAR(theActual, aExpected, 2e-6 * std::max(1.0, std::fabs(theExpected))) << theWhat;
+  }
+}
+
+} // namespace
+
+TEST_F(TemporalFeaturesTest, SeriesFromTheExamplesGivesEveryFeature) {
+  // Pixel 0: 10 20 15 30 on days 0 12 24 36; pixel 1: no data everywhere;
+  // pixel 2: one sample (7, the others no data).
+  const std::vector<std::vector<double>> aValues = {{10, -1, -1}, {20, -1, 7}, {15, -1, -1}, {30, -1, -1}};
+  std::vector<std::string> aNames;
+  for (int i = 0; i < 4; ++i) {
+    aNames.push_back("d" + std::to_string(i));
+    image(aNames.back(), 1, 3, aValues[i], tlrxAcquisitionText(12 * i));
+  }
+  // Listed out of order; the first listed fixes the null value N = -1.
+  const STLRXRun aRun = run(parameters({"d2", "d0", "d3", "d1"}));
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  const double n = -1;
+  const std::vector<std::vector<double>> aExpected = {
+      {18.75, n, 7},   {std::sqrt(54.6875), n, n}, {15, n, 7}, {15, n, n}, {30, n, 7}, {10, n, 7}, {20, n, 0},
+      {15, n, n},      {-5, n, n},                {3, n, 1},  {2, n, n},  {0.75, n, n}, {36, -9999, 12},
+      {0, -9999, -9999}};
+  for (int f = 0; f < 14; ++f) {
+    const std::vector<double> aResult = result(theSuffixes[f]);
+    ASSERT_EQ(aResult.size(), 3u);
+    for (int x = 0; x < 3; ++x)
+      expectNear(aResult[x], aExpected[f][x], std::string(theSuffixes[f]) + " pixel " + std::to_string(x));
+  }
+}
+
+TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSeries) {
+  // Six images of 7 x 9 pixels with speckle, zeros, negative values and no
+  // data under three different null values; two acquisitions on one day.
+  const int aLines = 7, aPixels = 9, aImages = 6;
+  const std::vector<int> aDayOf = {30, 0, 12, 12, 47, 60};
+  const std::vector<double> aNullOf = {-1, 0, theNaN, -1, -9999, 0};
+  std::mt19937 aRandom(20240611);
+  std::gamma_distribution<double> aSpeckle(1.0, 1.0);
+  std::uniform_int_distribution<int> aDraw(0, 19);
+  std::vector<std::vector<double>> aStack(aImages, std::vector<double>(aLines * aPixels));
+  for (int i = 0; i < aImages; ++i) {
+    for (double &v : aStack[i]) {
+      const int aKind = aDraw(aRandom);
+      v = aKind == 0 ? aNullOf[i] : aKind == 1 ? 0.0 : aKind == 2 ? -aSpeckle(aRandom) : 100 * aSpeckle(aRandom);
+      v = static_cast<float>(v);
+    }
+    image("s" + std::to_string(i), aLines, aPixels, aStack[i], tlrxAcquisitionText(aDayOf[i]),
+          !(i == 1 || i == 5), aNullOf[i]);
+  }
+  // Temporal order: s1 (day 0), s2, s3 (day 12, listed order), s0, s4, s5.
+  const std::vector<int> aOrder = {1, 2, 3, 0, 4, 5};
+  const std::vector<std::string> aListed = {"s0", "s1", "s2", "s3", "s4", "s5"};
+  struct SCase {
+    bool mNormalize, mDb;
+    const char *mIncrementDb, *mDecrementDays;
+    double mRatioTime;
+  } aCases[] = {{false, false, nullptr, nullptr, 1e100},
+                {true, false, "3", "2", std::pow(10.0, 0.3) / 2},
+                {true, true, "10", "0.5", 20},
+                {false, true, "-4", "-1", 1e100}};
+  for (const SCase &aCase : aCases) {
+    STLRXTemporalParameters aParameters = parameters(aListed);
+    aParameters.mSettings.push_back({"normalize", aCase.mNormalize ? "OK" : "NO"});
+    aParameters.mSettings.push_back({"out_db", aCase.mDb ? "OK" : "ok"});
+    if (aCase.mIncrementDb != nullptr)
+      aParameters.mSettings.push_back({"max_increment_thr_db", aCase.mIncrementDb});
+    if (aCase.mDecrementDays != nullptr)
+      aParameters.mSettings.push_back({"max_decrement_thr_time", aCase.mDecrementDays});
+    const STLRXRun aRun = run(aParameters);
+    ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+    std::vector<std::vector<double>> aResults;
+    for (const char *aSuffix : theSuffixes)
+      aResults.push_back(result(aSuffix));
+    std::vector<double> aNulls;
+    std::vector<long> aDays;
+    for (int i : aOrder) {
+      aNulls.push_back(i == 1 || i == 5 ? 0.0 : aNullOf[i]);
+      aDays.push_back(aDayOf[i]);
+    }
+    for (int p = 0; p < aLines * aPixels; ++p) {
+      std::vector<double> aSeries;
+      for (int i : aOrder)
+        aSeries.push_back(aStack[i][p]);
+      const SReference aRef = reference(aSeries, aNulls, aDays, -1, aCase.mRatioTime, aCase.mNormalize, aCase.mDb);
+      for (int f = 0; f < 12; ++f)
+        expectNear(aResults[f][p], aRef.mValue[f], std::string(theSuffixes[f]) + " pixel " + std::to_string(p));
+      for (int f = 0; f < 2; ++f)
+        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
+    }
+  }
+}
