@@ -785,6 +785,20 @@ TEST_F(GeoTiffTest, BadInputRaisesItsCodeAndLeavesNoTiff) {
   EXPECT_TRUE(tiffFiles().empty());
 }
 
+// In the program an error ends the process where it is raised: the exit
+// handler removes the finished but uncommitted temporary TIFF.
+TEST_F(GeoTiffTest, ProcessEndingOnAnErrorLeavesNoTemporaryTiff) {
+  tlrxWriteFloatRaster(file("ok"), 9, 9, rampValues(9, 9), "AMPLITUDE");
+  ASSERT_EQ(mkdir(file("e.tif.sml").c_str(), 0755), 0);
+  EXPECT_EXIT(
+      {
+        fdfSetReportAndExit(true);
+        convert("ok", "e.tif");
+      },
+      ::testing::ExitedWithCode(fdfExitStatus(CTLRX_ERR_TIFF_HEADER_WRITE)), "");
+  EXPECT_TRUE(tiffFiles().empty());
+}
+
 TEST_F(GeoTiffTest, ProgressReachesTheWritingPassAndInterruptionStops) {
   const std::vector<float> aValues = rampValues(40, 8);
   tlrxWriteFloatRaster(file("p"), 40, 8, aValues, "AMPLITUDE");
