@@ -9,8 +9,13 @@ top=$(cd "$(dirname "$0")/.." && pwd)
 seconds=${1:-60}
 build=${TLRX_FUZZ_BUILD_DIR:-$top/build_fuzz}
 
-CC=clang CXX=clang++ cmake -S "$top" -B "$build" -DTLRX_FUZZ=ON -DCMAKE_BUILD_TYPE=RelWithDebInfo >/dev/null
-cmake --build "$build" --target tlrx_fuzzers -j2 >/dev/null
+mkdir -p "$build"
+if ! { CC=clang CXX=clang++ cmake -S "$top" -B "$build" -DTLRX_FUZZ=ON -DCMAKE_BUILD_TYPE=RelWithDebInfo &&
+       cmake --build "$build" --target tlrx_fuzzers -j2; } >"$build/fuzz_build.log" 2>&1; then
+  echo "FAILED: building the fuzz targets"
+  tail -n 40 "$build/fuzz_build.log"
+  exit 1
+fi
 
 export ASAN_OPTIONS=${ASAN_OPTIONS:-detect_leaks=1:abort_on_error=1}
 export UBSAN_OPTIONS=${UBSAN_OPTIONS:-halt_on_error=1:print_stacktrace=1}
