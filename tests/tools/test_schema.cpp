@@ -1,6 +1,7 @@
 // Header schemas: type-name rules, the schema loader, descriptions declared
 // from schemas, and the installed header and parameter schemas.
 #include "tlrx_description_section.h"
+#include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_init_from_xml_schema.h"
@@ -9,6 +10,8 @@
 
 #include <gtest/gtest.h>
 
+#include <cmath>
+#include <cstdlib>
 #include <string>
 #include <vector>
 
@@ -407,4 +410,48 @@ TEST_F(SchemaTest, CoherenceParameterSchemaDeclaresEveryKeyOfItsFourSections) {
   // The environment is found by its bare name, in the first section declaring it.
   EXPECT_EQ(aParameters.findField("TellurixEnvironment"), aParameters.findField("MAIN_CMD.TellurixEnvironment"));
   EXPECT_EQ(aParameters.getSection(0)->getFieldCount(), 40);
+}
+
+// A header written with every field holding a value is valid against the
+// installed header schema, as checked by xmllint.
+TEST_F(SchemaTest, WrittenHeaderValidatesAgainstTheHeaderSchema) {
+  if (std::system("xmllint --version > /dev/null 2>&1") != 0) {
+    GTEST_SKIP() << "xmllint is not installed";
+  }
+  CDescription aHeader;
+  fdfDeclareStandardHeader(aHeader);
+  for (int32_t s = 0; s < aHeader.getSectionCount(); ++s) {
+    CDescriptionSection &aSection = *aHeader.getSection(s);
+    for (int32_t f = 0; f < aSection.getFieldCount(); ++f) {
+      CDescriptionField &aField = *aSection.getField(f);
+      if (aField.getShape() == CTLRX_DS_MULTIPLE) {
+        aField.setNumberOfElements(2);
+        continue;
+      }
+      if (aField.getShape() != CTLRX_DS_SCALAR && aField.getParentIndex() < 0) {
+        aField.allocate(aField.getShape() == CTLRX_DS_MATRIX ? 2 : 1, 2);
+      }
+      for (int32_t r = 0; r < aField.getRowNbr(); ++r) {
+        for (int32_t c = 0; c < aField.getColNbr(); ++c) {
+          if (aField.getValueType() == CTLRX_DS_INTEGER) {
+            aField.setInteger(r, c, 7 + c);
+          } else if (aField.getValueType() == CTLRX_DS_DOUBLE) {
+            aField.setDouble(r, c, c == 0 ? std::nan("") : 1.0 / 3.0);
+          } else if (c == 0) { // the second string cell stays unset
+            aField.setString(r, c, "a <b> & \"c\"");
+          }
+        }
+      }
+    }
+  }
+  // Only the XML form is checked here: no ENVI header for these values.
+  const TLRXEnviHeaderWriter aEnvi = fdfSetEnviHeaderWriter(nullptr);
+  const std::string aRaster = mDir.file("full");
+  const bool aWritten = fdfWriteStandardHeader(aRaster.c_str(), aHeader, true);
+  fdfSetEnviHeaderWriter(aEnvi);
+  ASSERT_TRUE(aWritten);
+  const std::string aSchema = tlrxDataDir() + "/xml_schemas/TellurixHeaderSchema_version_1.0.xsd";
+  const std::string aCommand =
+      "xmllint --noout --schema '" + aSchema + "' '" + aRaster + ".sml' > '" + mDir.file("xmllint.txt") + "' 2>&1";
+  EXPECT_EQ(std::system(aCommand.c_str()), 0) << tlrxReadFile(mDir.file("xmllint.txt"));
 }
