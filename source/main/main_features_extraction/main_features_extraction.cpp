@@ -1,9 +1,11 @@
 // Program entry: start-up, command dispatch and the closing of the run.
 #include "main_features_extraction.h"
 
+#include "main_correlation.h"
 #include "main_mean_std_range.h"
 #include "main_ratio.h"
 #include "main_search_min_max_value.h"
+#include "main_texture.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
@@ -15,9 +17,9 @@ namespace {
 
 // Drivers not built yet stand as nullptr and answer like an unknown command.
 const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
-    {"main_texture#", nullptr},
+    {"main_texture#", main_texture},
     {"main_ratio#", main_ratio},
-    {"main_correlation#", nullptr},
+    {"main_correlation#", main_correlation},
     {"main_coherence#", nullptr},
     {"main_temporal_feature_extraction#", main_mean_std_range},
     {"main_principal_component_analysis#", nullptr},

@@ -1,0 +1,72 @@
+// Correlation driver: reads its tokens, plans normalisation, correlation (and
+// GeoTIFF) steps and runs them through the step runner. The closing switch
+// decides whether the correlation step's closing operation removes the
+// normalisation image once the coherence image is written.
+#include "main_correlation.h"
+
+#include "normalize_images.h"
+#include "quick_and_dirty.h"
+#include "tlrx_driver_guard.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_geotiff_step.h"
+#include "tlrx_step_runner.h"
+
+#include <string>
+#include <vector>
+
+namespace {
+
+enum ECorrelationToken { CTLRX_CORR_INPUT1, CTLRX_CORR_INPUT2, CTLRX_CORR_ROOT, CTLRX_CORR_DUMMY,
+                         CTLRX_CORR_NORM_ROWS, CTLRX_CORR_NORM_COLS, CTLRX_CORR_ROWS, CTLRX_CORR_COLS,
+                         CTLRX_CORR_CLOSE, CTLRX_CORR_TIFF, CTLRX_CORR_SATURATION, CTLRX_CORR_TOKENS };
+
+enum ECorrelationStep { CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP, CTLRX_CORR_TIFF_STEP };
+
+const char *const theNormSuffix = "_norm";
+
+// The step table; without the closing switch no step closes anything.
+std::vector<STLRXStep> fdfCorrelationSteps(bool theClose) {
+  return {
+      {"normalize_images", normalize_images, fdfStepNothingToClose},
+      {"quick_and_dirty", quick_and_dirty, theClose ? quick_and_dirty_close : fdfStepNothingToClose},
+      {"Out File to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+  };
+}
+
+std::vector<std::string> fdfCorrelationArguments(const std::vector<std::string> &theTokens, int theStep) {
+  const std::string &aRoot = theTokens[CTLRX_CORR_ROOT];
+  switch (theStep) {
+  case CTLRX_CORR_NORMALIZE_STEP:
+    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + theNormSuffix,
+            theTokens[CTLRX_CORR_DUMMY],  theTokens[CTLRX_CORR_NORM_ROWS], theTokens[CTLRX_CORR_NORM_COLS]};
+  case CTLRX_CORR_CORRELATION_STEP:
+    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + theNormSuffix, aRoot,
+            theTokens[CTLRX_CORR_DUMMY],  theTokens[CTLRX_CORR_ROWS],   theTokens[CTLRX_CORR_COLS]};
+  default:
+    return {aRoot, aRoot + ".tif", theTokens[CTLRX_CORR_SATURATION], "1", "1"};
+  }
+}
+
+int32_t fdfRunCorrelation(const char *theArguments) {
+  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
+  std::vector<const char *> aArgv;
+  for (const std::string &aToken : aTokens)
+    aArgv.push_back(aToken.c_str());
+  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Correlation", nullptr);
+  if (aTokens.size() < CTLRX_CORR_TOKENS)
+    return 456962;
+  for (int i = 0; i < CTLRX_CORR_TOKENS; ++i)
+    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  CStepRunner aRunner(fdfCorrelationSteps(fdfIsSwitchOn(aTokens[CTLRX_CORR_CLOSE])), "INT");
+  std::vector<int> aPlan = {CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP};
+  if (fdfIsSwitchOn(aTokens[CTLRX_CORR_TIFF]))
+    aPlan.push_back(CTLRX_CORR_TIFF_STEP);
+  return aRunner.run(aPlan, [&](int, int theStep) { return fdfCorrelationArguments(aTokens, theStep); });
+}
+
+} // namespace
+
+int32_t main_correlation(const char *theArguments) {
+  return fdfRunGuardedDriver(fdfRunCorrelation, theArguments);
+}

@@ -1,0 +1,53 @@
+// Texture driver: reads its tokens, plans the texture step (and the GeoTIFF
+// step) and runs them through the step runner.
+#include "main_texture.h"
+
+#include "texture.h"
+#include "tlrx_driver_guard.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_geotiff_step.h"
+#include "tlrx_step_runner.h"
+
+#include <string>
+#include <vector>
+
+namespace {
+
+enum ETextureToken { CTLRX_TEXTURE_INPUT, CTLRX_TEXTURE_OUTPUT, CTLRX_TEXTURE_DUMMY, CTLRX_TEXTURE_ROWS,
+                     CTLRX_TEXTURE_COLS, CTLRX_TEXTURE_UNUSED, CTLRX_TEXTURE_TIFF, CTLRX_TEXTURE_SATURATION,
+                     CTLRX_TEXTURE_TOKENS };
+
+enum ETextureStep { CTLRX_TEXTURE_STEP, CTLRX_TEXTURE_TIFF_STEP };
+
+const std::vector<STLRXStep> theTextureSteps = {
+    {"texture", texture, fdfStepNothingToClose},
+    {"texture to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+};
+
+int32_t fdfRunTexture(const char *theArguments) {
+  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
+  std::vector<const char *> aArgv;
+  for (const std::string &aToken : aTokens)
+    aArgv.push_back(aToken.c_str());
+  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Texture", nullptr);
+  CStepRunner aRunner(theTextureSteps, "TEXTURE");
+  if (aTokens.size() < CTLRX_TEXTURE_TOKENS)
+    return 456962;
+  for (int i = 0; i < CTLRX_TEXTURE_TOKENS; ++i)
+    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  std::vector<int> aPlan = {CTLRX_TEXTURE_STEP};
+  if (fdfIsSwitchOn(aTokens[CTLRX_TEXTURE_TIFF]))
+    aPlan.push_back(CTLRX_TEXTURE_TIFF_STEP);
+  return aRunner.run(aPlan, [&](int, int theStep) -> std::vector<std::string> {
+    const std::string &aOutput = aTokens[CTLRX_TEXTURE_OUTPUT];
+    if (theStep == CTLRX_TEXTURE_STEP)
+      return {aTokens[CTLRX_TEXTURE_INPUT], aOutput, aTokens[CTLRX_TEXTURE_DUMMY], aTokens[CTLRX_TEXTURE_ROWS],
+              aTokens[CTLRX_TEXTURE_COLS]};
+    return {aOutput, aOutput + ".tif", aTokens[CTLRX_TEXTURE_SATURATION], "1", "1"};
+  });
+}
+
+} // namespace
+
+int32_t main_texture(const char *theArguments) { return fdfRunGuardedDriver(fdfRunTexture, theArguments); }

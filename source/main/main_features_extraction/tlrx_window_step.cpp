@@ -1,0 +1,102 @@
+#include "tlrx_window_step.h"
+
+#include "tlrx_description_xml.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_features_common.h"
+#include "tlrx_standard_header.h"
+
+#include <cstring>
+
+bool fdfIsPowerHeader(const CDescription &theHeader) {
+  const CDescriptionField *aField = theHeader.findField("RasterInfo.DataUnits");
+  return aField != nullptr && aField->holdsValue() && aField->getValueType() == CTLRX_DS_STRING &&
+         std::strcmp(aField->getString(), "POWER") == 0;
+}
+
+CWindowInput::CWindowInput(const char *theName) : mName(theName) {
+  fdfLoadInputHeader(mName, mHeader);
+  mLines = fdfHeaderInteger(mHeader, "RasterInfo.NrOfLinesPerImage");
+  mPixels = fdfHeaderInteger(mHeader, "RasterInfo.NrOfPixelsPerLine");
+  mPower = fdfIsPowerHeader(mHeader);
+}
+
+void CWindowInput::open() {
+  // The raster file checks the layout and the file size before anything is
+  // sized by the header's counts.
+  mRaster.open_read(mName.c_str(), mHeader);
+  mValues.assign(static_cast<size_t>(mRaster.getNrOfPixelsPerLine()), 0.0);
+  mMask.assign(mValues.size(), 0);
+}
+
+void CWindowInput::readLine(int32_t theLine) { mRaster.getValidMask(mValues.data(), mMask.data(), theLine); }
+
+void fdfCheckSameSize(const CWindowInput &theFirst, const CWindowInput &theOther) {
+  if (theOther.lines() != theFirst.lines()) {
+    fdfTraceMessage("Error: The number of lines does not match (%d , %d)\n", theFirst.lines(), theOther.lines());
+    TLRX_RAISE(CTLRX_ERR_SIZE_MISMATCH, nullptr);
+  }
+  if (theOther.pixels() != theFirst.pixels()) {
+    fdfTraceMessage("Error: The number of pixels per line does not match (%d , %d)\n", theFirst.pixels(),
+                    theOther.pixels());
+    TLRX_RAISE(CTLRX_ERR_SIZE_MISMATCH, nullptr);
+  }
+}
+
+namespace {
+
+// Resets a copied layout field only where the input set it.
+void fdfResetIfSet(CDescription &theHeader, const char *theKey, double theValue) {
+  const CDescriptionField *aField = theHeader.findField(theKey);
+  if (aField != nullptr && aField->holdsValue())
+    fdfSetHeaderNumber(theHeader, theKey, theValue);
+}
+
+} // namespace
+
+void fdfMakeWindowResultHeader(CDescription &theResult, const CDescription &theInput, double theNull,
+                               const char *theUnits) {
+  fdfDeclareStandardHeader(theResult);
+  theResult = theInput;
+  fdfSetHeaderNumber(theResult, "RasterInfo.HeaderOffset", 0);
+  fdfSetHeaderNumber(theResult, "RasterInfo.RowPrefix", 0);
+  fdfSetHeaderNumber(theResult, "RasterInfo.RowSuffix", 0);
+  fdfSetHeaderText(theResult, "RasterInfo.CellType", "FLOAT");
+  if (theUnits != nullptr)
+    fdfSetHeaderText(theResult, "RasterInfo.DataUnits", theUnits);
+  fdfSetHeaderNumber(theResult, "RasterInfo.NullCellValue", theNull);
+  fdfResetIfSet(theResult, "RasterInfo.FooterLen", 0);
+  fdfResetIfSet(theResult, "RasterInfo.RealScaleFactor", 1.0);
+  fdfResetIfSet(theResult, "RasterInfo.ImaginaryScaleFactor", 1.0);
+}
+
+void fdfStampPairInputs(CDescription &theResult, const CWindowInput &theFirst, const CWindowInput &theSecond) {
+  fdfSetHeaderList(theResult, "RasterInfo.FilesList", {theFirst.name(), theSecond.name()});
+  std::string aTime;
+  if (fdfFindOtherInfo(theFirst.header(), CTLRX_ACQUISITION_TIME_KEY, aTime)) {
+    fdfStampOtherInfo(theResult, "ACQUISITION TIME", aTime.c_str());
+    fdfStampOtherInfo(theResult, "MASTER ACQUISITION TIME", aTime.c_str());
+  }
+  if (fdfFindOtherInfo(theSecond.header(), CTLRX_ACQUISITION_TIME_KEY, aTime))
+    fdfStampOtherInfo(theResult, "SLAVE ACQUISITION TIME", aTime.c_str());
+}
+
+void fdfTraceSignificantCount(double theNull, int64_t theCount) {
+  fdfTraceMessage("Number of significant value (no equal to %g one) = %lld\n", theNull,
+                  static_cast<long long>(theCount));
+}
+
+void fdfTracePairStepUsage(int theArgc, char **theArgv, bool theWithNorm) {
+  fdfTraceMessage("Parameters Number = %d\n", theArgc);
+  for (int i = 0; i < theArgc; ++i)
+    fdfTraceMessage(" argv[%d] = %s\n", i, theArgv[i]);
+  fdfTraceMessage("Usage: %s <input> <output> <int_par> [ref_image]\n"
+                  "  input\t1\t\t  input image 1 file name\n"
+                  "  input\t2\t\t  input image 2 file name\n"
+                  "%s"
+                  "  output  \t\t  output image file name, float\n"
+                  "  dummy           dummy value \n"
+                  "  row             rows number in texture window \n"
+                  "  col             cols number in texture window \n",
+                  theArgc > 0 ? theArgv[0] : "", theWithNorm ? "  input\tnorm      input normalized file name\n" : "");
+}

@@ -1,0 +1,100 @@
+// Running the window step programs in-process (throw mode) on small rasters
+// written into a temporary folder.
+#pragma once
+
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_test_support.h"
+#include "tlrx_window_reference.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <functional>
+#include <string>
+#include <vector>
+
+class WindowStepTest : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override {
+    tlrxStartLibraryEnvironment(mDir.path());
+    tlrxWriteFile(mDir.file("Process.working"), "0\nhost\n");
+  }
+
+  std::string file(const std::string &theName) const { return mDir.file(theName); }
+
+  // Writes theImage with no-data pixels set to theNull (NaN-valued pixels stay
+  // as they are, to test non-finite input).
+  void write(const std::string &theName, const STestImage &theImage, const std::string &theUnits,
+             double theNull = -1.0, const std::string &theTime = "") const {
+    STLRXTestRaster aRaster;
+    aRaster.mLines = theImage.mLines;
+    aRaster.mPixels = theImage.mPixels;
+    aRaster.mDataUnits = theUnits;
+    aRaster.mHasNull = true;
+    aRaster.mNull = theNull;
+    aRaster.mAcquisitionTime = theTime;
+    for (size_t i = 0; i < theImage.mValues.size(); ++i)
+      aRaster.mValues.push_back(theImage.mValid[i] != 0 ? theImage.mValues[i] : theNull);
+    tlrxWriteTestRaster(file(theName), aRaster);
+  }
+
+  // Runs a step program with theArgs as argv[1..]; returns its status.
+  static int run(int (*theStep)(int, char **), const std::vector<std::string> &theArgs) {
+    std::vector<std::string> aStrings = {"step"};
+    aStrings.insert(aStrings.end(), theArgs.begin(), theArgs.end());
+    std::vector<char *> aArgv;
+    for (std::string &aString : aStrings)
+      aArgv.push_back(&aString[0]);
+    aArgv.push_back(nullptr);
+    return theStep(static_cast<int>(aStrings.size()), aArgv.data());
+  }
+
+  // The code (and message) a step raises; 0 when it returns normally.
+  static int32_t raisedCode(const std::function<void()> &theBody, std::string *theMessage = nullptr) {
+    try {
+      theBody();
+    } catch (const CErrorExceptionManager &aError) {
+      if (theMessage != nullptr)
+        *theMessage = aError.mMessage;
+      return aError.mCode;
+    }
+    return 0;
+  }
+};
+
+// A constant image of theLines x thePixels.
+inline STestImage constantImage(int theLines, int thePixels, double theValue) {
+  STestImage aImage;
+  aImage.mLines = theLines;
+  aImage.mPixels = thePixels;
+  aImage.mValues.assign(static_cast<size_t>(theLines) * thePixels, theValue);
+  aImage.mValid.assign(aImage.mValues.size(), 1);
+  return aImage;
+}
+
+// Compares a result with a reference: no-data positions exactly, values to a
+// relative float tolerance.
+inline void expectMatches(const std::vector<double> &theGot, const std::vector<double> &theWant, double theNull,
+                          const std::string &theWhat) {
+  ASSERT_EQ(theGot.size(), theWant.size()) << theWhat;
+  for (size_t i = 0; i < theGot.size(); ++i) {
+    if (theWant[i] == theNull)
+      EXPECT_EQ(theGot[i], theNull) << theWhat << " pixel " << i;
+    else
+      EXPECT_NEAR(theGot[i], theWant[i], 2e-6 * std::max(1.0, std::fabs(theWant[i]))) << theWhat << " pixel " << i;
+  }
+}
+
+// Mean of the pixels of lines and pixels theMargin away from every edge.
+inline double interiorMean(const std::vector<double> &theValues, int theLines, int thePixels, int theMargin) {
+  double aSum = 0;
+  long aCount = 0;
+  for (int l = theMargin; l < theLines - theMargin; ++l)
+    for (int j = theMargin; j < thePixels - theMargin; ++j) {
+      aSum += theValues[static_cast<size_t>(l) * thePixels + j];
+      ++aCount;
+    }
+  return aSum / aCount;
+}
