@@ -1,6 +1,7 @@
 // Command parameter files (schema, XML file, environment check) and the
 // standard header read and written for a raster.
 #include "tlrx_description_section.h"
+#include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
@@ -222,8 +223,12 @@ TEST_F(ParameterFileTest, MissingOrUnwritableHeadersRaiseTheirFileErrors) {
   EXPECT_EQ(aMessage, aRaster + "_hdr");
   fdfDeclareStandardHeader(aHeader);
   aHeader.getField("RasterInfo.NrOfLinesPerImage").setInteger(1);
+  // The XML form alone: the ENVI companion has failures of its own.
+  const TLRXEnviHeaderWriter aEnvi = fdfSetEnviHeaderWriter(nullptr);
   const std::string aNowhere = mDir.file("no_dir/raster");
   EXPECT_FALSE(fdfWriteStandardHeader(aNowhere.c_str(), aHeader));
-  EXPECT_EQ(codeOf([&] { fdfWriteStandardHeader(aNowhere.c_str(), aHeader, true); }, &aMessage), CTLRX_ERR_FILE_WRITE);
+  const int32_t aCode = codeOf([&] { fdfWriteStandardHeader(aNowhere.c_str(), aHeader, true); }, &aMessage);
+  fdfSetEnviHeaderWriter(aEnvi);
+  EXPECT_EQ(aCode, CTLRX_ERR_FILE_WRITE);
   EXPECT_EQ(aMessage, aNowhere);
 }
