@@ -20,7 +20,9 @@ static_assert(sizeof(off_t) >= 8, "raster files need 64-bit offsets");
 
 namespace {
 
-constexpr int64_t CTLRX_RF_SHORT_SEEK_LIMIT = 2000000000; // below it the original short seek sufficed
+// Offsets below it are reported in the short positioning trace; it also gives
+// mMaxLineSeek, the last line reachable below it.
+constexpr int64_t CTLRX_RF_SHORT_SEEK_LIMIT = 2000000000;
 constexpr size_t CTLRX_RF_PADDING_CHUNK = 1 << 20;        // bytes of zeros written per call when padding
 // Stream buffer: line-sized transfers then cost one system call per many
 // lines; transfers of a whole buffer or more bypass it.
