@@ -9,6 +9,7 @@
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_file.h"
 #include "tlrx_geotiff_georef.h"
+#include "tlrx_geotiff_source.h"
 #include "tlrx_geotiff_stretch.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
@@ -114,105 +115,6 @@ void openInputRaster(const std::string &theInput, const CDescription &theHeader,
     TLRX_RAISE_F(CTLRX_ERR_TIFF_RASTER_OPEN, "Wrong CRasterFile Status %s", theInput.c_str());
   }
 }
-
-// ------------------------------------------------------------ reading lines
-
-template <typename S>
-void loadParts(const uint8_t *theCells, int32_t theCount, double *theRe, double *theIm) {
-  for (int32_t i = 0; i < theCount; ++i) {
-    S aPair[2];
-    std::memcpy(aPair, theCells + 2 * sizeof(S) * static_cast<size_t>(i), sizeof aPair);
-    theRe[i] = static_cast<double>(aPair[0]);
-    theIm[i] = static_cast<double>(aPair[1]);
-  }
-}
-
-bool loadComplexCells(int32_t theCellType, const uint8_t *theCells, int32_t theCount, double *theRe, double *theIm) {
-  switch (theCellType) {
-  case CTLRX_CELL_BYTE_COMPLEX: loadParts<int8_t>(theCells, theCount, theRe, theIm); return true;
-  case CTLRX_CELL_UBYTE_COMPLEX: loadParts<uint8_t>(theCells, theCount, theRe, theIm); return true;
-  case CTLRX_CELL_SHORT_COMPLEX: loadParts<int16_t>(theCells, theCount, theRe, theIm); return true;
-  case CTLRX_CELL_UNSIGNED_SHORT_COMPLEX: loadParts<uint16_t>(theCells, theCount, theRe, theIm); return true;
-  case CTLRX_CELL_FLOAT_COMPLEX: loadParts<float>(theCells, theCount, theRe, theIm); return true;
-  case CTLRX_CELL_DOUBLE_COMPLEX: loadParts<double>(theCells, theCount, theRe, theIm); return true;
-  default: return false;
-  }
-}
-
-// Lines of the raster as the values the stretch works on: the cell value of
-// real cells; for complex cells the amplitude, the intensity (intensity
-// units) or the phase (phase units). Null and non-finite cells are invalid.
-class CTiffLineSource {
-public:
-  CTiffLineSource(CRasterFile &theRaster, ETLRXTiffFamily theFamily, const CDescription &theHeader)
-      : mRaster(theRaster), mFamily(theFamily), mComplex(fdfIsComplexCellType(theRaster.getCellType())),
-        mNull(theRaster.getDummyVal()),
-        mReScale(doubleOr(theHeader, "RasterInfo.RealScaleFactor", 1.0)),
-        mImScale(doubleOr(theHeader, "RasterInfo.ImaginaryScaleFactor", 1.0)) {
-    const size_t aPixels = static_cast<size_t>(theRaster.getNrOfPixelsPerLine());
-    mValues.resize(aPixels);
-    mValid.resize(aPixels);
-    if (mComplex) {
-      mRe.resize(aPixels);
-      mIm.resize(aPixels);
-    }
-  }
-
-  // Columns theColStart..theColEnd of file line theRow.
-  void read(int32_t theRow, int32_t theColStart, int32_t theColEnd) {
-    const int32_t aCount = theColEnd - theColStart + 1;
-    if (mComplex)
-      readComplex(theRow, theColStart, theColEnd, aCount);
-    else
-      readReal(theRow, theColStart, theColEnd, aCount);
-  }
-
-  bool isComplex() const { return mComplex; }
-  const double *values() const { return mValues.data(); }
-  const uint8_t *valid() const { return mValid.data(); }
-  const double *re() const { return mRe.data(); }
-  const double *im() const { return mIm.data(); }
-
-private:
-  void readReal(int32_t theRow, int32_t theColStart, int32_t theColEnd, int32_t theCount) {
-    mRaster.getLine<double>(mValues.data(), theRow, theColStart, theColEnd);
-    for (int32_t i = 0; i < theCount; ++i)
-      mValid[i] = std::isfinite(mValues[i]) && !fdfIsNull(mValues[i], mNull) ? 1 : 0;
-  }
-
-  void readComplex(int32_t theRow, int32_t theColStart, int32_t theColEnd, int32_t theCount) {
-    const uint8_t *aCells = static_cast<const uint8_t *>(mRaster.getLineBuffer(theRow, theColStart, theColEnd));
-    if (!loadComplexCells(mRaster.getCellType(), aCells, theCount, mRe.data(), mIm.data()))
-      TLRX_RAISE_F(CTLRX_ERR_TIFF_RASTER_OPEN, "Wrong CRasterFile Status %s", mRaster.getFileName());
-    for (int32_t i = 0; i < theCount; ++i) {
-      const bool aNull = fdfIsNull(mRe[i], mNull) && fdfIsNull(mIm[i], mNull);
-      mRe[i] *= mReScale;
-      mIm[i] *= mImScale;
-      mValid[i] = !aNull && std::isfinite(mRe[i]) && std::isfinite(mIm[i]) ? 1 : 0;
-      mValues[i] = complexValue(mRe[i], mIm[i]);
-    }
-  }
-
-  double complexValue(double theRe, double theIm) const {
-    switch (mFamily) {
-    case ETLRXTiffFamily::kInterferogram:
-    case ETLRXTiffFamily::kPhase: return std::atan2(theIm, theRe);
-    case ETLRXTiffFamily::kIntensity: return theRe * theRe + theIm * theIm;
-    default: return std::hypot(theRe, theIm);
-    }
-  }
-
-  CRasterFile &mRaster;
-  ETLRXTiffFamily mFamily;
-  bool mComplex;
-  double mNull;
-  double mReScale;
-  double mImScale;
-  std::vector<double> mValues;
-  std::vector<uint8_t> mValid;
-  std::vector<double> mRe;
-  std::vector<double> mIm;
-};
 
 // ------------------------------------------------------------ sample
 
@@ -503,7 +405,8 @@ int32_t convert(const STiffRequest &theRequest) {
   traceInput(theRequest, aRaster, aHeader);
   const STLRXTiffGrid aGrid = makeGrid(theRequest, aRaster, aHeader);
   const ETLRXTiffFamily aFamily = fdfTiffFamily(aRaster.getDataUnits());
-  CTiffLineSource aSource(aRaster, aFamily, aHeader);
+  CTiffLineSource aSource(aRaster, aFamily, doubleOr(aHeader, "RasterInfo.RealScaleFactor", 1.0),
+                          doubleOr(aHeader, "RasterInfo.ImaginaryScaleFactor", 1.0));
   CProgress aProgress;
 
   const SSampleWindow aWindow =
