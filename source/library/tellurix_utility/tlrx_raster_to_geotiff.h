@@ -46,7 +46,8 @@ constexpr int CTLRXGC_ROWS_INVERT_POS = 10;
 //   theColReduction    below 1 counts as 1, above the image size as the size
 //   theGain            "scale input"; negative (or 0) counts as 1
 //   theExponent        power of the stretch; not above -0.9 (or 0) counts as 1
-//   theInvertRows/Cols mirror top to bottom / left to right
+//   theInvertRows/Cols mirror top to bottom / left to right (so does "OK" in
+//                      the header's TiffRowsInvert / TiffColsInvert)
 //   theFlag, theLastFlag  reserved (0 by every caller)
 //   theHistogram       equalising histogram stretch over theHistogramSize classes
 //   theLevels          top data level (254; outside 1..254 counts as 254)
