@@ -474,6 +474,15 @@ TEST_F(DescriptionTest, OverLongKeyFileLineIsCutNotSplit) {
   EXPECT_STREQ(aSection->getField(1)->getName(), "B");
 }
 
+TEST_F(DescriptionTest, NulByteInsideALineDoesNotSwallowTheNextLine) {
+  std::string aText = "[Sec]\na = I";
+  aText += '\0';
+  aText += " junk\nb = D\n";
+  auto aSection = declare(aText);
+  ASSERT_EQ(aSection->getFieldCount(), 2);
+  EXPECT_STREQ(aSection->getField(1)->getName(), "b");
+}
+
 TEST_F(DescriptionTest, KeyFileDeclarationFailuresNameTheirCause) {
   CDescriptionSection aSection;
   EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(nullptr, nullptr); }), CTLRX_ERR_DS_DECLARATION);

@@ -211,19 +211,22 @@ long fdfReadTextLine(FILE *theFile, char *theBuffer, size_t theCapacity) {
   if (theFile == nullptr || theBuffer == nullptr || theCapacity < 2) {
     return -1;
   }
-  const int aChunk = theCapacity > static_cast<size_t>(INT_MAX) ? INT_MAX : static_cast<int>(theCapacity);
-  if (std::fgets(theBuffer, aChunk, theFile) == nullptr) {
-    theBuffer[0] = '\0';
-    return -1;
-  }
-  const size_t aLen = std::strlen(theBuffer);
-  if (aLen > 0 && theBuffer[aLen - 1] != '\n') {
-    // Over-long line: drop the rest up to and including its line end.
-    int aChar = 0;
-    while ((aChar = std::fgetc(theFile)) != EOF && aChar != '\n') {
+  // Byte by byte, so that a NUL inside a line cannot hide where it ends; the
+  // tail of an over-long line is consumed and dropped.
+  size_t aLen = 0;
+  bool aAny = false;
+  int aChar = 0;
+  while ((aChar = std::getc(theFile)) != EOF) {
+    aAny = true;
+    if (aLen + 1 < theCapacity) {
+      theBuffer[aLen++] = static_cast<char>(aChar);
+    }
+    if (aChar == '\n') {
+      break;
     }
   }
-  return static_cast<long>(aLen);
+  theBuffer[aLen] = '\0';
+  return aAny ? static_cast<long>(aLen) : -1;
 }
 
 bool fdfExistDescriptionFile(const char *thePath) {
