@@ -10,6 +10,7 @@
 #include <cmath>
 #include <limits>
 #include <random>
+#include <sys/stat.h>
 
 namespace {
 
@@ -172,6 +173,17 @@ protected:
   }
 };
 
+// Value of the first "RasterInfo.OtherInfo" row whose key begins with theKey.
+bool otherInfo(const CDescription &theHeader, const std::string &theKey, std::string &theValue) {
+  const CDescriptionField &aTable = theHeader.getField("RasterInfo.OtherInfo");
+  for (int32_t aRow = 0; aRow < aTable.getRowNbr(); ++aRow)
+    if (aTable.isSet(aRow, 0) && std::string(aTable.getString(aRow, 0)).compare(0, theKey.size(), theKey) == 0) {
+      theValue = aTable.getString(aRow, 1);
+      return true;
+    }
+  return false;
+}
+
 void expectNear(double theActual, double theExpected, const std::string &theWhat) {
   const float aExpected = static_cast<float>(theExpected);
   if (std::isnan(aExpected)) {
@@ -270,4 +282,195 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
         EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
     }
   }
+}
+
+TEST_F(TemporalFeaturesTest, OutputHeadersCarryTheGridAndTheReferenceDate) {
+  image("late", 2, 3, {1, 2, 3, 4, 5, 6}, tlrxAcquisitionText(40), true, -5);
+  image("early", 3, 4, std::vector<double>(12, 2.0), tlrxAcquisitionText(5, 7), true, -1);
+  // The first listed input carries calibration and a scale factor of 2.
+  CDescription aLate;
+  fdfReadStandardHeader(mDir.file("late").c_str(), aLate);
+  aLate.getField("RasterInfo.CalibrationValue").setDouble(12.5);
+  aLate.getField("RasterInfo.CalibrationType").setString("SIGMA0");
+  aLate.getField("RasterInfo.RealScaleFactor").setDouble(2.0);
+  fdfWriteStandardHeader(mDir.file("late").c_str(), aLate, true);
+  // A file named after the root is not the command's to remove.
+  tlrxWriteFile(mDir.file("out.xml"), "keep");
+  STLRXTemporalParameters aParameters = parameters({"late", "early"}, false);
+  aParameters.mSettings = {{"max", "OK"}, {"date_max", "OK"}};
+  const STLRXRun aRun = run(aParameters, "out.xml");
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+
+  CDescription aValue, aDate;
+  fdfReadStandardHeader(mDir.file("out_max").c_str(), aValue);
+  fdfReadStandardHeader(mDir.file("out_dateMax").c_str(), aDate);
+  for (CDescription *aHeader : {&aValue, &aDate}) {
+    EXPECT_EQ(aHeader->getField("RasterInfo.NrOfLinesPerImage").getInteger(), 2);
+    EXPECT_EQ(aHeader->getField("RasterInfo.NrOfPixelsPerLine").getInteger(), 3);
+    EXPECT_STREQ(aHeader->getField("RasterInfo.DataUnits").getString(), "NUMBER");
+    EXPECT_FALSE(aHeader->getField("RasterInfo.CalibrationValue").holdsValue());
+    EXPECT_FALSE(aHeader->getField("RasterInfo.CalibrationType").holdsValue());
+    const CDescriptionField &aScale = aHeader->getField("RasterInfo.RealScaleFactor");
+    EXPECT_TRUE(!aScale.holdsValue() || aScale.getDouble() == 1.0);
+  }
+  EXPECT_STREQ(aValue.getField("RasterInfo.CellType").getString(), "FLOAT");
+  EXPECT_EQ(aValue.getField("RasterInfo.NullCellValue").getDouble(), -5);
+  EXPECT_STREQ(aDate.getField("RasterInfo.CellType").getString(), "INT");
+  EXPECT_EQ(aDate.getField("RasterInfo.NullCellValue").getDouble(), -9999);
+  std::string aReference;
+  ASSERT_TRUE(otherInfo(aDate, "REFERENCE TIME OF MULTITEMPORAL : ", aReference));
+  EXPECT_EQ(aReference, tlrxAcquisitionText(5, 7));
+  EXPECT_FALSE(otherInfo(aValue, "REFERENCE TIME", aReference));
+  // Values read back as written: the input's scale factor is not carried over.
+  EXPECT_EQ(result("_max"), std::vector<double>({2, 4, 6, 8, 10, 12}));
+  EXPECT_EQ(result("_dateMax"), std::vector<double>({0, 35, 35, 35, 35, 35}));
+  // Only the requested outputs exist; the grid header is gone, out.xml kept.
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out_mea")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out.sml")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out_hdr")));
+  EXPECT_EQ(tlrxReadFile(mDir.file("out.xml")), tlrxTemporalParameterText(aParameters));
+}
+
+TEST_F(TemporalFeaturesTest, EveryParameterIsLoggedWithDefaultsApplied) {
+  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  STLRXTemporalParameters aParameters = parameters({"a"}, false);
+  aParameters.mSettings = {{"interp_type", "Bilinear_interpolation"}, {"max_increment_thr_db", "0"},
+                           {"max_decrement_thr_time", "2.5"}, {"normalize", "TRUE"}, {"out_db", "OK"},
+                           {"min", "OK"}, {"std", "ok"}, {"saturation_default", "0.25"}};
+  const STLRXRun aRun = run(aParameters);
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  const std::string aLog = log();
+  for (const std::string &aLine : std::vector<std::string>{
+           "MAIN PARAMETERS", "\n\n Input Slave List\n " + mDir.file("a") + "\n",
+        "\nout_root_file_name: [" + mDir.file("out") + "]", "\ninterp_type: [nearest_neighbour]",
+        "\nmax_increment_thr_db: [1000.000000]", "\nmax_decrement_thr_time: [2.500000]",
+        "\nnormalize: [FALSE]", "\nOut Db: [TRUE]", "\nmean: [FALSE]",
+        "\nstd: [FALSE]", "\nmin: [TRUE]", "\ndate_min_before_max: [FALSE]",
+        "\nmake_tiff: [FALSE]", "\nsaturation_default: [0.250000]"})
+    EXPECT_NE(aLog.find(aLine), std::string::npos) << aLine;
+  EXPECT_NE(aLog.find("START :  Multitemporal Feature Extraction"), std::string::npos);
+  // One sample each: min in decibels.
+  const std::vector<double> aMin = result("_min");
+  EXPECT_FLOAT_EQ(aMin[0], 0.0f);
+  EXPECT_FLOAT_EQ(aMin[1], static_cast<float>(10 * std::log10(2.0)));
+}
+
+TEST_F(TemporalFeaturesTest, ParameterFileFailuresAreParameterErrors) {
+  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  struct SCase {
+    const char *mWhat;
+    STLRXTemporalParameters mParameters;
+    const char *mLogText;
+  };
+  std::vector<SCase> aCases;
+  aCases.push_back({"empty list", parameters({}), "\nNeed at  least an input file: ["});
+  aCases.push_back({"no list", parameters({"a"}), "\nNeed at  least an input file: ["});
+  aCases.back().mParameters.mWithList = false;
+  aCases.push_back({"environment", parameters({"a"}), "\nError occour during initialization XML input parameter: ["});
+  aCases.back().mParameters.mEnvironment = "idl_envi_env";
+  aCases.push_back({"root", parameters({"a"}), "\nError occour during initialization XML input parameter: ["});
+  aCases.back().mParameters.mRootTag = "PARAMETERS";
+  for (const SCase &aCase : aCases) {
+    const STLRXRun aRun = run(aCase.mParameters);
+    EXPECT_EQ(aRun.mExitStatus, 8) << aCase.mWhat;
+    EXPECT_NE(error().find("[EC :456960]"), std::string::npos) << aCase.mWhat;
+    EXPECT_NE(log().find(aCase.mLogText + mDir.file("param.xml") + "]"), std::string::npos) << aCase.mWhat;
+    EXPECT_NE(log().find("[ERROR ID : 456960]"), std::string::npos) << aCase.mWhat;
+    EXPECT_NE(log().find(mDir.file("param.xml") + " \n"), std::string::npos) << aCase.mWhat;
+    expectNothingWritten();
+  }
+  // A setting without a default that the file lacks.
+  STLRXTemporalParameters aNoRoot = parameters({"a"});
+  aNoRoot.mRoot.clear();
+  EXPECT_EQ(run(aNoRoot).mExitStatus, 14);
+  EXPECT_NE(error().find("[EC :848642]"), std::string::npos);
+  EXPECT_NE(error().find("MAIN_CMD.out_root_file_name"), std::string::npos);
+}
+
+TEST_F(TemporalFeaturesTest, BadInputsStopBeforeAnyResultAndLeaveNothingBehind) {
+  image("a", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(0));
+  image("b", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(12));
+  image("geo", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(24));
+  tlrxGeocodeTestRaster(mDir.file("geo"), 5000, 300, -10, 10);
+  image("undated", 2, 2, {1, 2, 3, 4}, "");
+  image("baddate", 2, 2, {1, 2, 3, 4}, "31-FOO-2020 10:00:00.000000");
+  image("short", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
+  tlrxWriteFile(mDir.file("short"), "12345678");
+  image("nodata", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
+  std::remove(mDir.file("nodata").c_str());
+  struct SCase {
+    std::vector<std::string> mInputs;
+    int mExit;
+    const char *mCode;
+    std::string mMessage;
+  } aCases[] = {
+      {{"a", "geo"}, 5, "[EC :261124]", mDir.file("geo_hdr")},
+      {{"geo", "b"}, 5, "[EC :261124]", mDir.file("b_hdr")},
+      {{"a", "missing"}, 5, "[EC :261124]", mDir.file("missing_hdr")},
+      {{"a", "undated"}, 14, "[EC :848642]", "ACQUISITION TIME"},
+      {{"baddate", "a"}, 14, "[EC :848642]", "ACQUISITION TIME"},
+      {{"a", "nodata"}, 5, "[EC :261122]", mDir.file("nodata")},
+      {{"short", "b"}, 5, "[EC :2611", mDir.file("short")},
+  };
+  for (const SCase &aCase : aCases) {
+    const STLRXRun aRun = run(parameters(aCase.mInputs));
+    const std::string aWhat = aCase.mInputs[0] + "," + aCase.mInputs[1];
+    EXPECT_EQ(aRun.mExitStatus, aCase.mExit) << aWhat << aRun.mOutput;
+    EXPECT_NE(error().find(aCase.mCode), std::string::npos) << aWhat << error();
+    EXPECT_NE(log().find(aCase.mMessage + " \n"), std::string::npos) << aWhat;
+    expectNothingWritten();
+  }
+}
+
+TEST_F(TemporalFeaturesTest, AnOutputThatCannotBeCreatedRemovesTheOnesBefore) {
+  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  ASSERT_EQ(mkdir(mDir.file("out_min").c_str(), 0755), 0);
+  STLRXTemporalParameters aParameters = parameters({"a"}, false);
+  aParameters.mSettings = {{"mean", "OK"}, {"max", "OK"}, {"min", "OK"}};
+  const STLRXRun aRun = run(aParameters);
+  EXPECT_EQ(aRun.mExitStatus, 5);
+  EXPECT_NE(error().find("[EC :261122]"), std::string::npos);
+  EXPECT_NE(log().find(mDir.file("out_min") + " \n"), std::string::npos);
+  for (const char *aName : {"out_mea", "out_mea.sml", "out_max", "out_max.sml", "out.sml"})
+    EXPECT_FALSE(tlrxFileExists(mDir.file(aName))) << aName;
+}
+
+TEST_F(TemporalFeaturesTest, GeocodedInputsMeetOnTheUnionGridAtTheFinestSpacing) {
+  // A: 3 x 4 cells of 10 m from (E 1000, N 5000); B: 2 x 3 cells of 20 m
+  // from (E 1020, N 4990). Union: E 1000..1080, N 5000..4950 at 10 m.
+  image("A", 3, 4, {1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12}, tlrxAcquisitionText(0), true, -1);
+  image("B", 2, 3, {100, 200, 300, 400, 500, 600}, tlrxAcquisitionText(12), true, -2);
+  tlrxGeocodeTestRaster(mDir.file("A"), 5000, 1000, -10, 10);
+  tlrxGeocodeTestRaster(mDir.file("B"), 4990, 1020, -20, 20);
+  STLRXTemporalParameters aParameters = parameters({"A", "B"}, false);
+  aParameters.mSettings = {{"min", "OK"}, {"max", "OK"}, {"interp_type", "bilinear_interpolation"}};
+  const STLRXRun aRun = run(aParameters);
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  CDescription aHeader;
+  fdfReadStandardHeader(mDir.file("out_min").c_str(), aHeader);
+  EXPECT_EQ(aHeader.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 5);
+  EXPECT_EQ(aHeader.getField("RasterInfo.NrOfPixelsPerLine").getInteger(), 8);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LonEasting").getDouble(), 1000);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LatNorthing").getDouble(), 5000);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.PixelSpacingLonEast").getDouble(), 10);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.PixelSpacingLatNorth").getDouble(), -10);
+  // B on the grid: bilinear where its 2 x 2 cells exist (rows 2..3, columns
+  // 3..6: the ramp 100 + 300 u + 100 w), nearest neighbour on its rim;
+  // A lands cell for cell on rows 0..2, columns 0..3.
+  const double n = -1;
+  const std::vector<std::vector<double>> aB = {{n, n, n, n, n, n, n, n},
+                                               {n, n, 100, 100, 200, 200, 300, 300},
+                                               {n, n, 100, 200, 250, 300, 350, 300},
+                                               {n, n, 400, 350, 400, 450, 500, 600},
+                                               {n, n, 400, 400, 500, 500, 600, 600}};
+  const std::vector<double> aMin = result("_min");
+  const std::vector<double> aMax = result("_max");
+  ASSERT_EQ(aMin.size(), 40u);
+  for (int l = 0; l < 5; ++l)
+    for (int p = 0; p < 8; ++p) {
+      const double a = l < 3 && p < 4 ? 1 + 4 * l + p : n;
+      const double b = aB[l][p];
+      EXPECT_EQ(aMin[l * 8 + p], a != n ? a : b) << l << "," << p;
+      EXPECT_EQ(aMax[l * 8 + p], b != n ? b : a) << l << "," << p;
+    }
 }
