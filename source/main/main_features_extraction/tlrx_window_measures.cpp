@@ -29,13 +29,14 @@ void fdfTextureTerms(const double *theValues, const int32_t *theMask, int32_t th
 }
 
 // Texture: coefficient of variation of the amplitudes in the window,
-//   m = S1 / n, q = S2 / n, out = sqrt(q - m^2) / m,
+//   m = S1 / n, q = S2 / n, out = sqrt(q - m^2) / m = sqrt(n S2 / S1^2 - 1),
 // with S1, S2, n the window sums of a, a^2 and the valid count (window and
-// edges: tlrx_window_sums.h). No data: out = theNull where the pixel itself is
-// not valid (whatever its window holds), where n = 0, or where S1 <= 0 (no
-// division by a zero or negative mean). q - m^2 is the population variance;
-// rounding can push it a hair below 0 for a constant window, which is clamped
-// to 0 so a homogeneous area gives 0 instead of NaN.
+// edges: tlrx_window_sums.h); the second form costs one division and one
+// square root per pixel. No data: out = theNull where the pixel itself is not
+// valid (whatever its window holds), where n = 0, or where S1 <= 0 (no
+// division by a zero or negative mean). The variance is that of the
+// population; rounding can push it a hair below 0 for a constant window,
+// which is clamped to 0 so a homogeneous area gives 0 instead of NaN.
 void fdfTextureLine(const double *const *theSums, const uint8_t *theCentre, int32_t thePixels, float theNull,
                     float *theOut) {
   const double *aSum = theSums[0];
@@ -46,9 +47,8 @@ void fdfTextureLine(const double *const *theSums, const uint8_t *theCentre, int3
       theOut[j] = theNull;
       continue;
     }
-    const double aMean = aSum[j] / aCount[j];
-    const double aVariance = aSquares[j] / aCount[j] - aMean * aMean;
-    theOut[j] = static_cast<float>(std::sqrt(aVariance > 0.0 ? aVariance : 0.0) / aMean);
+    const double aRelativeVariance = aCount[j] * aSquares[j] / (aSum[j] * aSum[j]) - 1.0;
+    theOut[j] = static_cast<float>(std::sqrt(aRelativeVariance > 0.0 ? aRelativeVariance : 0.0));
   }
 }
 
@@ -121,31 +121,32 @@ void fdfCorrelationTerms(const double *theValues1, const int32_t *theMask1, bool
 // (independent images give a mean g near 0.15 with 11 x 11 windows), while
 // above about 0.3 the concave square root offsets the bias of r.
 // No data: theNull where the pixel itself does not count or A B is not
-// positive (an empty or all-zero window).
+// positive (an empty or all-zero window). A B cannot overflow: x <= 2 n1
+// since the normalisation value is at least I / (2 n1).
+// The class counts are sums of comparisons rather than branches: g is as
+// random as the speckle, so branches on it would mostly be mispredicted.
 void fdfCorrelationLine(const double *const *theSums, const uint8_t *theCentre, int32_t thePixels, float theNull,
                         float *theOut, SCorrelationStats &theStats) {
+  int64_t aComputed = 0, aAbove08 = 0, aAbove07 = 0, aAbove05 = 0, aAbove0 = 0;
   for (int32_t j = 0; j < thePixels; ++j) {
-    const double aA = theSums[1][j];
-    const double aB = theSums[2][j];
-    if (theCentre[j] == 0 || !(aA * aB > 0.0)) {
+    const double aQ = theSums[1][j] * theSums[2][j];
+    if (theCentre[j] == 0 || !(aQ > 0.0)) {
       theOut[j] = theNull;
       continue;
     }
-    const double aR = theSums[0][j] / (std::sqrt(aA) * std::sqrt(aB));
-    ++theStats.mComputed;
-    if (!(aR > 0.5)) {
-      theOut[j] = 0.0f;
-      continue;
-    }
-    const double aG = std::sqrt(2.0 * aR - 1.0);
+    const double aR = theSums[0][j] / std::sqrt(aQ);
+    const bool aCoherent = aR > 0.5;
+    const double aG = aCoherent ? std::sqrt(2.0 * aR - 1.0) : 0.0;
     theOut[j] = static_cast<float>(aG);
-    if (aG > 0.8)
-      ++theStats.mAbove08;
-    else if (aG > 0.7)
-      ++theStats.mAbove07;
-    else if (aG > 0.5)
-      ++theStats.mAbove05;
-    else
-      ++theStats.mAbove0;
+    ++aComputed;
+    aAbove08 += aG > 0.8;
+    aAbove07 += (aG > 0.7) & (aG <= 0.8);
+    aAbove05 += (aG > 0.5) & (aG <= 0.7);
+    aAbove0 += aCoherent & (aG <= 0.5);
   }
+  theStats.mComputed += aComputed;
+  theStats.mAbove08 += aAbove08;
+  theStats.mAbove07 += aAbove07;
+  theStats.mAbove05 += aAbove05;
+  theStats.mAbove0 += aAbove0;
 }
