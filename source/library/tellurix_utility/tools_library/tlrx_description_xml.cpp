@@ -798,7 +798,9 @@ bool CDescription::writeToFile(const char *theName, bool theAlsoText, bool theRa
       TLRX_RAISE(CTLRX_ERR_FILE_WRITE, aText.c_str());
     }
   }
-  if (sEnviHeaderWriter != nullptr)
+  // The ENVI header is built from the header just written: without it there
+  // is nothing to describe, and the caller reports the failed write.
+  if (aWritten && sEnviHeaderWriter != nullptr)
     sEnviHeaderWriter(aName.c_str());
   return aWritten;
 }
