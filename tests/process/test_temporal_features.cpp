@@ -474,3 +474,107 @@ TEST_F(TemporalFeaturesTest, GeocodedInputsMeetOnTheUnionGridAtTheFinestSpacing)
       EXPECT_EQ(aMax[l * 8 + p], b != n ? b : a) << l << "," << p;
     }
 }
+
+TEST_F(TemporalFeaturesTest, SimulatedSeriesMatchesTheDirectComputationWithRejections) {
+  // Six dates listed out of order, two on one day (08:00 and 17:00), no data
+  // scattered and in a band of image 3, a field brightening 5x from image 4.
+  const STLRXRun aSim = tlrxRun("tlrx_simulate",
+                                {"series", "--out", mDir.file("sim"), "--lines", "33", "--pixels", "47", "--dates",
+                                 "2021-03-05,2021-01-10,2021-02-01T08:00,2021-02-01T17:00,2021-04-20,2021-06-01",
+                                 "--null", "-9999", "--nodata-fraction", "0.1", "--nodata-box", "0,0,4,47,3",
+                                 "--change", "10,10,8,8,4,5", "--seed", "11"},
+                                mDir.path());
+  ASSERT_EQ(aSim.mExitStatus, 0) << aSim.mOutput;
+  const std::vector<std::string> aListed = {"sim_01", "sim_02", "sim_03", "sim_04", "sim_05", "sim_06"};
+  const std::vector<int> aOrder = {1, 2, 3, 0, 4, 5};
+  const std::vector<long> aDays = {0, 22, 22, 54, 100, 142};
+  std::vector<std::vector<double>> aStack;
+  for (const std::string &aName : aListed)
+    aStack.push_back(tlrxReadTestRaster(mDir.file(aName)));
+  const std::vector<double> aNulls(6, -9999);
+  // Default thresholds, then 3 dB over 20 days: a ratio of 2 over 22 days
+  // passes, 2.2 does not.
+  for (const bool aStrict : {false, true}) {
+    STLRXTemporalParameters aParameters = parameters(aListed);
+    if (aStrict) {
+      aParameters.mSettings.insert(aParameters.mSettings.end(),
+                                   {{"max_increment_thr_db", "3"}, {"max_decrement_thr_time", "20"}, {"normalize", "OK"}});
+    }
+    const STLRXRun aRun = run(aParameters);
+    ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+    std::vector<std::vector<double>> aResults;
+    for (const char *aSuffix : theSuffixes)
+      aResults.push_back(result(aSuffix));
+    const double aRatioTime = aStrict ? std::pow(10.0, 0.3) / 20 : 1e100;
+    int aRejecting = 0;
+    for (size_t p = 0; p < aStack[0].size(); ++p) {
+      std::vector<double> aSeries;
+      for (int i : aOrder)
+        aSeries.push_back(aStack[i][p]);
+      const SReference aRef = reference(aSeries, aNulls, aDays, -9999, aRatioTime, aStrict, false);
+      const SReference aAll = reference(aSeries, aNulls, aDays, -9999, 1e100, aStrict, false);
+      aRejecting += aRef.mValue[0] != aAll.mValue[0];
+      for (int f = 0; f < 12; ++f)
+        expectNear(aResults[f][p], aRef.mValue[f], std::string(theSuffixes[f]) + " pixel " + std::to_string(p));
+      for (int f = 0; f < 2; ++f)
+        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
+    }
+    if (aStrict)
+      EXPECT_GT(aRejecting, 100);
+  }
+}
+
+TEST_F(TemporalFeaturesTest, SimulatedGeocodedSeriesLandsCellForCell) {
+  // UTM series: image 2 moved 2 cells east and 1 south, image 3 at 40 m
+  // over half the cells. Union: E 600000..600640, N 5100000..5099580 at 20 m.
+  const STLRXRun aSim = tlrxRun(
+      "tlrx_simulate", {"series", "--out", mDir.file("geo"), "--count", "3", "--lines", "20", "--pixels", "30",
+                        "--utm", "32N", "--origin", "600000,5100000", "--spacing", "20", "--image-origin",
+                        "2:600040,5099980", "--image-spacing", "3:40", "--image-size", "3:10,15", "--null", "-9999",
+                        "--nodata-fraction", "0.05", "--seed", "5"},
+      mDir.path());
+  ASSERT_EQ(aSim.mExitStatus, 0) << aSim.mOutput;
+  STLRXTemporalParameters aParameters = parameters({"geo_03", "geo_01", "geo_02"});
+  aParameters.mSettings.push_back({"interp_type", "nearest_neighbour"});
+  const STLRXRun aRun = run(aParameters);
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  CDescription aHeader;
+  fdfReadStandardHeader(mDir.file("out_mea").c_str(), aHeader);
+  ASSERT_EQ(aHeader.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 21);
+  ASSERT_EQ(aHeader.getField("RasterInfo.NrOfPixelsPerLine").getInteger(), 32);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LonEasting").getDouble(), 600000);
+  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LatNorthing").getDouble(), 5100000);
+  EXPECT_STREQ(aHeader.getField("CartographicSystem.State").getString(), "UTM-GLOBAL");
+  struct SImage {
+    const char *mName;
+    double mEast0, mNorth0, mStep;
+    int mLines, mPixels;
+  } aImages[] = {{"geo_01", 600000, 5100000, 20, 20, 30},
+                 {"geo_02", 600040, 5099980, 20, 20, 30},
+                 {"geo_03", 600000, 5100000, 40, 10, 15}};
+  std::vector<std::vector<double>> aData;
+  for (const SImage &aImage : aImages)
+    aData.push_back(tlrxReadTestRaster(mDir.file(aImage.mName)));
+  std::vector<std::vector<double>> aResults;
+  for (const char *aSuffix : theSuffixes)
+    aResults.push_back(result(aSuffix));
+  // Null of the first listed image (geo_03).
+  const double n = -9999;
+  for (int r = 0; r < 21; ++r)
+    for (int c = 0; c < 32; ++c) {
+      const double aE = 600000 + 20 * c + 10, aN = 5100000 - 20 * r - 10;
+      std::vector<double> aSeries;
+      for (int i = 0; i < 3; ++i) {
+        const int l = static_cast<int>(std::floor((aImages[i].mNorth0 - aN) / aImages[i].mStep));
+        const int p = static_cast<int>(std::floor((aE - aImages[i].mEast0) / aImages[i].mStep));
+        const bool aInside = l >= 0 && l < aImages[i].mLines && p >= 0 && p < aImages[i].mPixels;
+        aSeries.push_back(aInside ? aData[i][l * aImages[i].mPixels + p] : n);
+      }
+      const SReference aRef = reference(aSeries, {n, n, n}, {0, 12, 24}, n, 1e100, false, false);
+      for (int f = 0; f < 12; ++f)
+        expectNear(aResults[f][r * 32 + c], aRef.mValue[f], std::string(theSuffixes[f]) + " " + std::to_string(r) +
+                                                                 "," + std::to_string(c));
+      for (int f = 0; f < 2; ++f)
+        EXPECT_EQ(aResults[12 + f][r * 32 + c], aRef.mDate[f]) << theSuffixes[12 + f] << " " << r << "," << c;
+    }
+}
