@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# Demo: builds and installs the program, then runs it as a host would in a
-# fresh working folder and shows what the host gets back.
+# Demo: builds and installs the program, simulates a small dated SAR series
+# and a correlated pair, then runs the commands as a host would and lists
+# what they wrote.
 set -euo pipefail
 top=$(cd "$(dirname "$0")/.." && pwd)
 prefix=$top/install
@@ -10,21 +11,35 @@ out=${TLRX_DEMO_DIR:-$top/demo_out}
 cmake --install "$top/build" --prefix "$prefix" >/dev/null
 rm -rf "$out" && mkdir -p "$out"
 export TELLURIX_WORKING_DIR=$out TELLURIX_BATCH_DIR=$out
+sim=$prefix/bin/tlrx_simulate
+
+# A host creates the working file, starts one command, reads the outcome.
 run() {
   printf '0\nDemo host\n' >"$out/Process.working"
   set +e
   "$prefix/bin/main_features_extraction" "$1" 2>/dev/null
   local status=$?
   set -e
-  echo "== $1 -> exit status $status"
-  [ -f "$out/Process.working_error" ] && { echo "-- error file:"; cat "$out/Process.working_error"; }
-  rm -f "$out/Process.working_error"
+  echo "== ${1%%#*} -> exit status $status"
+  if [ -f "$out/Process.working_error" ]; then
+    echo "-- error file:"; cat "$out/Process.working_error"; rm -f "$out/Process.working_error"
+  fi
 }
+# An argument file: a title line, then one token per line.
+args() { local f=$out/$1; shift; printf '%s\n' "demo arguments" "$@" >"$f"; echo "$f"; }
 
-echo "== installed under $prefix; configuration $prefix/etc/tellurix/Tellurix_configuration.ini"
+echo "== simulating a 5-date UTM series (a field brightens from date 3, a no-data strip) and a correlated pair"
+"$sim" series --out "$out/s" --lines 300 --pixels 320 --count 5 --utm 32N --origin 600000,5100000 --spacing 20 \
+  --change 40,40,48,64,3,4 --nodata-box 200,0,56,40 --null -9999 --seed 7 >/dev/null
+"$sim" pair --out "$out/p" --lines 300 --pixels 320 --coherence-ramp 0.2,0.95 --seed 7 >/dev/null
+
 run "main_principal_component_analysis#x"
-run "MAIN_RATIO#args.txt"
+run "main_min_and_max#$(args minmax.txt "$out/s_list.txt" "$out/stack" 2 3 4 5 6 OK 0.3)"
+run "main_ratio#$(args ratio.txt "$out/s_list.txt" "$out/change" 1 unused OK 0.3)"
+
 echo "== outputs in $out"
-ls -l "$out"
+ls -l "$out" | grep -v -e ' s_0' -e ' p_' || true
+echo "-- date classes of the maximum (ENVI header read by GDAL):"
+gdalinfo "$out/stack_max_date" 2>/dev/null | sed -n '/Categories/,/Color Table/p' | head -8 || true
 echo "-- end of the log:"
-tail -n 12 "$out/Process.log"
+tail -n 8 "$out/Process.log"
