@@ -519,8 +519,9 @@ TEST_F(TemporalFeaturesTest, SimulatedSeriesMatchesTheDirectComputationWithRejec
       for (int f = 0; f < 2; ++f)
         EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
     }
-    if (aStrict)
+    if (aStrict) {
       EXPECT_GT(aRejecting, 100);
+    }
   }
 }
 
