@@ -195,3 +195,13 @@ TEST_F(CorrelationCommandTest, HostInterruptionStopsTheRun) {
   expectError(326400);
   EXPECT_FALSE(tlrxFileExists(file("coh_norm")));
 }
+
+// Guards the complex-cell fault: complex cells already read as intensities
+// and must not be squared again.
+TEST_F(CorrelationCommandTest, ComplexPairIsReadAsIntensities) {
+  const int aSize = 200;
+  simulate({"pair", "--out", "c", "--scene", "flat", "--coherence", "0.6", "--slc", "--lines",
+            std::to_string(aSize), "--pixels", std::to_string(aSize), "--seed", "6"});
+  ASSERT_EQ(correlation(tokens("c_slc_1", "c_slc_2")).mExitStatus, 0) << error();
+  EXPECT_NEAR(tlrxInteriorMean(tlrxReadTestRaster(file("coh")), aSize, aSize, 5), 0.6, 0.05);
+}

@@ -50,16 +50,18 @@ TEST_F(TextureCommandTest, TiffSwitchPlansTheConversionWithItsArguments) {
   texture("in.img", "5", "5", "OK", true);
   const std::string aTrace = trace();
   EXPECT_TRUE(tlrxContains(aTrace, "Step (0) texture\n"));
-  for (const std::string &aArg : std::vector<std::string>{"aArgv[1] " + file("in.img"), "aArgv[2] " + file("out.img"), "aArgv[3] 0",
-                                  "aArgv[4] 5", "aArgv[5] 5"})
+  const std::vector<std::string> aTextureArgs = {"aArgv[1] " + file("in.img"), "aArgv[2] " + file("out.img"),
+                                                 "aArgv[3] 0", "aArgv[4] 5", "aArgv[5] 5"};
+  for (const std::string &aArg : aTextureArgs)
     EXPECT_TRUE(tlrxContains(aTrace, aArg + "\n")) << aArg;
   EXPECT_TRUE(tlrxContains(aTrace, "Step (1) texture to tiff conversion\n"));
   const size_t aTiff = aTrace.find("Step (1) texture to tiff conversion\n");
   ASSERT_NE(aTiff, std::string::npos);
   const std::string aTiffPart = aTrace.substr(aTiff);
   EXPECT_EQ(tlrxTracedProcessName(aTiffPart), "texture to tiff conversion");
-  for (const std::string &aArg : std::vector<std::string>{"aArgv[1] " + file("out.img"),
-                                  "aArgv[2] " + file("out.img.tif"), "aArgv[3] 0", "aArgv[4] 1", "aArgv[5] 1"})
+  const std::vector<std::string> aTiffArgs = {"aArgv[1] " + file("out.img"), "aArgv[2] " + file("out.img.tif"),
+                                              "aArgv[3] 0", "aArgv[4] 1", "aArgv[5] 1"};
+  for (const std::string &aArg : aTiffArgs)
     EXPECT_TRUE(tlrxContains(aTiffPart, aArg + "\n")) << aArg;
 }
 
@@ -131,4 +133,16 @@ TEST_F(TextureCommandTest, HostInterruptionStopsTheRun) {
   const STLRXRun aRun = texture("in.img", "3", "3");
   EXPECT_EQ(aRun.mExitStatus, 6);
   expectError(326400);
+}
+
+// Guards the complex-cell fault: complex cells are read as re^2 + im^2, so an
+// SLC image must be taken to amplitude like a "POWER" one (its texture would
+// otherwise be that of the intensity, 1 instead of 0.5227).
+TEST_F(TextureCommandTest, ComplexSingleLookImageIsTakenToAmplitude) {
+  const int aSize = 256;
+  simulate({"series", "--out", "slc", "--count", "1", "--scene", "flat", "--cell-type", "FLOAT_COMPLEX", "--lines",
+            std::to_string(aSize), "--pixels", std::to_string(aSize), "--seed", "5"});
+  ASSERT_EQ(texture("slc_01", "31", "31").mExitStatus, 0) << error();
+  EXPECT_NEAR(tlrxInteriorMean(tlrxReadTestRaster(file("out.img")), aSize, aSize, 15), std::sqrt(4.0 / M_PI - 1.0),
+              0.01);
 }

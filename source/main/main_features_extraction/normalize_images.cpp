@@ -34,7 +34,7 @@ int normalize_images(int argc, char **argv) {
   CWindowInput aSecond(argv[2]);
   fdfCheckSameSize(aFirst, aSecond);
   for (const CWindowInput *aInput : {&aFirst, &aSecond})
-    if (aInput->isPower())
+    if (aInput->deliversIntensity())
       fdfTraceMessage(" Intensity\n");
   aFirst.open();
   aSecond.open();
@@ -57,8 +57,8 @@ int normalize_images(int argc, char **argv) {
       [&](int32_t theLine) {
         aFirst.readLine(theLine);
         aSecond.readLine(theLine);
-        fdfNormalizeTerms(aFirst.values(), aFirst.mask(), aFirst.isPower(), aSecond.values(), aSecond.mask(),
-                          aSecond.isPower(), aPixels, aTerms, aRing.centre(theLine));
+        fdfNormalizeTerms(aFirst.values(), aFirst.mask(), aFirst.deliversIntensity(), aSecond.values(),
+                          aSecond.mask(), aSecond.deliversIntensity(), aPixels, aTerms, aRing.centre(theLine));
       },
       [&](int32_t theLine) {
         aComputed += fdfNormalizeLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());

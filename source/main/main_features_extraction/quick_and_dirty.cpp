@@ -48,7 +48,7 @@ int quick_and_dirty(int argc, char **argv) {
   fdfCheckSameSize(aFirst, aSecond);
   fdfCheckSameSize(aFirst, aNorm);
   for (const CWindowInput *aInput : {&aFirst, &aSecond})
-    if (aInput->isPower())
+    if (aInput->deliversIntensity())
       fdfTraceMessage(" Intensity\n");
   aFirst.open();
   aSecond.open();
@@ -73,9 +73,9 @@ int quick_and_dirty(int argc, char **argv) {
         aFirst.readLine(theLine);
         aSecond.readLine(theLine);
         aNorm.readLine(theLine);
-        fdfCorrelationTerms(aFirst.values(), aFirst.mask(), aFirst.isPower(), aSecond.values(), aSecond.mask(),
-                            aSecond.isPower(), aNorm.values(), aNorm.mask(), aPixels, aTerms,
-                            aRing.centre(theLine));
+        fdfCorrelationTerms(aFirst.values(), aFirst.mask(), aFirst.deliversIntensity(), aSecond.values(),
+                            aSecond.mask(), aSecond.deliversIntensity(), aNorm.values(), aNorm.mask(), aPixels,
+                            aTerms, aRing.centre(theLine));
       },
       [&](int32_t theLine) {
         fdfCorrelationLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data(), aStats);

@@ -43,7 +43,7 @@ int texture(int argc, char **argv) {
   fdfCheckWindowSize(aRows, aCols);
 
   CWindowInput aInput(argv[1]);
-  fdfTraceMessage(aInput.isPower() ? "Intensity (Power)input image\n" : "Amplitude input image\n");
+  fdfTraceMessage(aInput.deliversIntensity() ? "Intensity (Power)input image\n" : "Amplitude input image\n");
   aInput.open();
   const float aNull = fdfGetDummyValue();
   CDescription aHeader;
@@ -61,7 +61,8 @@ int texture(int argc, char **argv) {
       aRing, aInput.lines(),
       [&](int32_t theLine) {
         aInput.readLine(theLine);
-        fdfTextureTerms(aInput.values(), aInput.mask(), aPixels, aInput.isPower(), aTerms, aRing.centre(theLine));
+        fdfTextureTerms(aInput.values(), aInput.mask(), aPixels, aInput.deliversIntensity(), aTerms,
+                        aRing.centre(theLine));
       },
       [&](int32_t theLine) {
         fdfTextureLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());

@@ -1,5 +1,6 @@
 #include "tlrx_window_step.h"
 
+#include "tlrx_cell_types.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
@@ -8,17 +9,26 @@
 
 #include <cstring>
 
-bool fdfIsPowerHeader(const CDescription &theHeader) {
-  const CDescriptionField *aField = theHeader.findField("RasterInfo.DataUnits");
-  return aField != nullptr && aField->holdsValue() && aField->getValueType() == CTLRX_DS_STRING &&
-         std::strcmp(aField->getString(), "POWER") == 0;
+namespace {
+
+const char *fdfHeaderText(const CDescription &theHeader, const char *theKey) {
+  const CDescriptionField *aField = theHeader.findField(theKey);
+  return aField != nullptr && aField->holdsValue() && aField->getValueType() == CTLRX_DS_STRING ? aField->getString()
+                                                                                                : "";
+}
+
+} // namespace
+
+bool fdfDeliversIntensity(const CDescription &theHeader) {
+  return std::strcmp(fdfHeaderText(theHeader, "RasterInfo.DataUnits"), "POWER") == 0 ||
+         fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType")));
 }
 
 CWindowInput::CWindowInput(const char *theName) : mName(theName) {
   fdfLoadInputHeader(mName, mHeader);
   mLines = fdfHeaderInteger(mHeader, "RasterInfo.NrOfLinesPerImage");
   mPixels = fdfHeaderInteger(mHeader, "RasterInfo.NrOfPixelsPerLine");
-  mPower = fdfIsPowerHeader(mHeader);
+  mIntensity = fdfDeliversIntensity(mHeader);
 }
 
 void CWindowInput::open() {

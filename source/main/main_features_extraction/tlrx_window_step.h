@@ -14,11 +14,13 @@
 // Codes of the window steps beside those of the raster file.
 constexpr int32_t CTLRX_ERR_SIZE_MISMATCH = 652807; // 10, 6
 
-// Whether a header's "DataUnits" is "POWER" (intensity data).
-bool fdfIsPowerHeader(const CDescription &theHeader);
+// Whether the line read delivers intensities for a raster of this header:
+// "DataUnits" "POWER", or a complex cell type (whose cells are read as
+// re^2 + im^2 whatever the data units say).
+bool fdfDeliversIntensity(const CDescription &theHeader);
 
 // One input raster of a window step: its header (missing: 261122 with the
-// header name), size and data unit, then the open raster and one line of
+// header name), size and whether it delivers intensities, then the open raster and one line of
 // values with their validity flags.
 class CWindowInput {
 public:
@@ -34,7 +36,7 @@ public:
   const CDescription &header() const { return mHeader; }
   int32_t lines() const { return mLines; }
   int32_t pixels() const { return mPixels; }
-  bool isPower() const { return mPower; }
+  bool deliversIntensity() const { return mIntensity; }
   const double *values() const { return mValues.data(); }
   const int32_t *mask() const { return mMask.data(); }
 
@@ -43,7 +45,7 @@ private:
   CDescription mHeader;
   int32_t mLines = 0;
   int32_t mPixels = 0;
-  bool mPower = false;
+  bool mIntensity = false;
   CRasterFile mRaster;
   std::vector<double> mValues;
   std::vector<int32_t> mMask;

@@ -12,10 +12,11 @@ void fdfCheckWindowSize(int32_t theRows, int32_t theCols) {
       TLRX_RAISE(CTLRX_ERR_WINDOW_SIZE, nullptr);
 }
 
-// Window [j - h, j + h] clipped to [0, P - 1]: the first window holds columns
-// 0 .. min(h, P - 1); then column j + h enters while it exists and column
-// j - h - 1 leaves once it exists. The three phases are split so the inner
-// loop carries no tests.
+// Sum over the window [j - h, j + h] clipped to [0, P - 1]: the first window
+// holds columns 0 .. min(h, P - 1); then column j + h enters while it exists
+// and column j - h - 1 leaves once it exists. The three phases are split so
+// the inner loop carries no tests. No data: the measures give no-data pixels
+// a term of 0, so they add nothing; column 0 is no exception.
 void fdfRowWindowSum(const double *theTerms, int32_t thePixels, int32_t theHalf, double *theSums) {
   if (thePixels <= 0)
     return;
