@@ -1,6 +1,7 @@
 // The normalisation and intensity coherence step programs on small rasters:
-// pixel by pixel against direct window computations, simulated pairs of
-// known coherence, headers, the closing operation and the errors.
+// pixel by pixel against direct window computations, speckle invariants,
+// headers, the closing operation and the errors. Pairs of known coherence
+// from the scene simulator are in the process tests.
 #include "normalize_images.h"
 #include "quick_and_dirty.h"
 #include "tlrx_description_xml.h"
@@ -113,22 +114,6 @@ TEST_F(CorrelationStepTest, IdenticalSpeckleImagesGiveOneWhateverTheirNoData) {
       EXPECT_EQ(aOut[i], theNull) << i;
     else
       EXPECT_NEAR(aOut[i], 1.0, 1e-6) << i;
-  }
-}
-
-// The output is g = sqrt(2 r - 1), an estimate of |gamma| itself: r tends to
-// (1 + |gamma|^2) / 2 for circular Gaussian speckle. The window bias of r and
-// the cut at r <= 0.5 are small against 0.05 from 0.3 up, large near 0 (see
-// fdfCorrelationLine).
-TEST_F(CorrelationStepTest, SimulatedPairsGiveTheirCoherence) {
-  const int aLines = 160, aPixels = 200;
-  for (double aGamma : {0.3, 0.6, 0.9}) {
-    STestImage aA, aB;
-    speckledPair(aLines, aPixels, aGamma, 100 + static_cast<uint64_t>(aGamma * 10), aA, aB);
-    write("a", aA, "POWER");
-    write("b", aB, "POWER");
-    const std::vector<double> aOut = coherence("a", "b", 11, 11, 11, 11);
-    EXPECT_NEAR(interiorMean(aOut, aLines, aPixels, 10), aGamma, 0.05) << "gamma " << aGamma;
   }
 }
 

@@ -1,5 +1,6 @@
 // The texture step program on small rasters: pixel by pixel against a direct
-// window computation, edge cases, speckle statistics and its errors.
+// window computation, edge cases and its errors. Speckle statistics on
+// simulated scenes are in the process tests.
 #include "texture.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_standard_header.h"
@@ -37,16 +38,6 @@ STestImage smallImage(uint64_t theSeed, double theLow, double theHigh) {
   }
   for (int aNoData : {0, 8, 9, 18, 22, 31, 32, 40, 54, 62})
     aImage.mValid[aNoData] = 0;
-  return aImage;
-}
-
-STestImage speckleAmplitude(int theLines, int thePixels, int theLooks, bool theAsIntensity, uint64_t theSeed) {
-  CTestSpeckle aSpeckle(theSeed);
-  STestImage aImage = constantImage(theLines, thePixels, 0.0);
-  for (double &aValue : aImage.mValues) {
-    const double aIntensity = 50.0 * aSpeckle.intensity(theLooks);
-    aValue = theAsIntensity ? aIntensity : std::sqrt(aIntensity);
-  }
   return aImage;
 }
 
@@ -140,22 +131,6 @@ TEST_F(TextureStepTest, InputScaleFactorIsNotCopiedToTheResult) {
   ASSERT_TRUE(fdfWriteStandardHeader(file("s").c_str(), aHeader));
   // The coefficient of variation does not change with the scale.
   expectMatches(texture("s", 3, 5), refTexture(aImage, false, 3, 5, theNull), theNull, "scaled input");
-}
-
-TEST_F(TextureStepTest, SingleLookAmplitudeSpeckleHasCoefficientOfVariation0_5227) {
-  const int aLines = 200, aPixels = 240, aWindow = 31;
-  write("sl", speckleAmplitude(aLines, aPixels, 1, false, 42), "AMPLITUDE");
-  const double aMean = interiorMean(texture("sl", aWindow, aWindow), aLines, aPixels, aWindow / 2);
-  EXPECT_NEAR(aMean, std::sqrt(4.0 / M_PI - 1.0), 0.01);
-}
-
-TEST_F(TextureStepTest, FourLookIntensitySpeckleHasCoefficientOfVariation0_2536) {
-  const int aLines = 200, aPixels = 240, aWindow = 31;
-  write("fl", speckleAmplitude(aLines, aPixels, 4, true, 43), "POWER");
-  const double aMean = interiorMean(texture("fl", aWindow, aWindow), aLines, aPixels, aWindow / 2);
-  const double aRatio = std::tgamma(4.0) / std::tgamma(4.5);
-  EXPECT_NEAR(aMean, std::sqrt(4.0 * aRatio * aRatio - 1.0), 0.01);
-  EXPECT_NEAR(aMean, 0.2536, 0.01);
 }
 
 TEST_F(TextureStepTest, ErrorsAndTheirCodes) {

@@ -125,16 +125,11 @@ inline std::vector<double> refCoherence(const STestImage &theA, bool thePowerA, 
   return aOut;
 }
 
-// Seeded random images. Single-look intensity is exponential; L looks give a
-// gamma of shape L and mean 1; a pair of coherence theGamma comes from
+// Seeded random pairs of single-look intensities of coherence theGamma, from
 // circular Gaussian fields s2 = gamma s1 + sqrt(1 - gamma^2) n.
 class CTestSpeckle {
 public:
   explicit CTestSpeckle(uint64_t theSeed) : mEngine(theSeed) {}
-  double intensity(int theLooks) {
-    std::gamma_distribution<double> aGamma(theLooks, 1.0 / theLooks);
-    return aGamma(mEngine);
-  }
   std::complex<double> circular() {
     std::normal_distribution<double> aNormal(0.0, std::sqrt(0.5));
     const double aRe = aNormal(mEngine);
@@ -147,7 +142,6 @@ public:
     theI1 = std::norm(aS1);
     theI2 = std::norm(aS2);
   }
-  double uniform() { return std::uniform_real_distribution<double>(0.0, 1.0)(mEngine); }
 
 private:
   std::mt19937_64 mEngine;
