@@ -200,3 +200,23 @@ TEST_F(RatioTest, HostInterruptionStopsTheRun) {
   EXPECT_NE(error().find("[EC :326400]"), std::string::npos);
   EXPECT_EQ(tlrxReadLines(working())[0], "-1");
 }
+
+TEST_F(RatioTest, GeoTiffStepFollowsEveryRatioStep) {
+  for (const char *aName : {"a", "b", "c"})
+    image(aName, {1, 2, 3, 4, 5, 6, 7, 8}, true, -1, "", 2);
+  tlrxWriteConfiguration(mDir.path(), {{12, "ACTIVE"}});
+  const STLRXRun aRun = tlrxRunMain(arguments({"a", "b", "c"}, "out", "0", "OK"), mDir.path(),
+                                    {{"TELLURIX_INIT_DIR", mDir.path()}});
+  ASSERT_EQ(aRun.mExitStatus, 0) << error();
+  EXPECT_TRUE(tlrxFileExists(mDir.file("out_0_rto.tif")));
+  EXPECT_TRUE(tlrxFileExists(mDir.file("out_1_rto.tif.sml")));
+  const std::string aTrace = tlrxReadFile(mDir.file("Process.trace"));
+  const size_t aFirst = aTrace.find("Step (0) Ratio");
+  const size_t aSecond = aTrace.find("Step (1) ratio to tiff conversion");
+  const size_t aThird = aTrace.find("Step (2) Ratio");
+  const size_t aFourth = aTrace.find("Step (3) ratio to tiff conversion");
+  ASSERT_NE(aFourth, std::string::npos);
+  EXPECT_TRUE(aFirst < aSecond && aSecond < aThird && aThird < aFourth);
+  EXPECT_NE(aTrace.find("aArgv[2] " + mDir.file("out_1_rto.tif")), std::string::npos);
+  EXPECT_NE(aTrace.find("RATIO TOTAL TIME (s): "), std::string::npos);
+}

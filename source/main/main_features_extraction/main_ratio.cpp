@@ -3,13 +3,13 @@
 #include "main_ratio.h"
 
 #include "ratio_images.h"
+#include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_step.h"
 #include "tlrx_step_runner.h"
 
-#include <exception>
 
 namespace {
 
@@ -73,15 +73,4 @@ std::vector<int> fdfRatioPlan(size_t theFiles, bool theTiff) {
   return aPlan;
 }
 
-int32_t main_ratio(const char *theArguments) {
-  try {
-    return fdfRunRatio(theArguments);
-  } catch (const CErrorExceptionManager &) {
-    throw;
-  } catch (const std::exception &aError) {
-    fdfTraceMessage("Exception raised: %s\n", aError.what());
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
-  } catch (...) {
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
-  }
-}
+int32_t main_ratio(const char *theArguments) { return fdfRunGuardedDriver(fdfRunRatio, theArguments); }

@@ -4,6 +4,7 @@
 #include "main_search_min_max_value.h"
 
 #include "tlrx_description_xml.h"
+#include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
@@ -12,7 +13,6 @@
 #include "tlrx_raster_file.h"
 
 #include <cstdlib>
-#include <exception>
 #include <memory>
 
 namespace {
@@ -239,12 +239,4 @@ void fdfDateClassColour(int theClass, int &theRed, int &theGreen, int &theBlue) 
   theBlue = (5 * theClass) % 100 + 150;
 }
 
-int32_t main_search_min_max_value(const char *theArguments) {
-  try {
-    return fdfRunMinMax(theArguments);
-  } catch (const CErrorExceptionManager &) {
-    throw;
-  } catch (...) {
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
-  }
-}
+int32_t main_search_min_max_value(const char *theArguments) { return fdfRunGuardedDriver(fdfRunMinMax, theArguments); }

@@ -4,13 +4,13 @@
 // normal float. One line of each raster is held at a time.
 #include "ratio_images.h"
 
-#include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_window_step.h"
 
 #include <algorithm>
 #include <cmath>
@@ -39,57 +39,6 @@ std::string fdfRatioOutputName(const char *theName) {
   return aName + CTLRX_RATIO_SUFFIX;
 }
 
-struct SRatioInput {
-  CDescription mHeader;
-  double mNull = 0.0;
-  int32_t mLines = 0;
-  int32_t mPixels = 0;
-};
-
-void fdfLoadRatioInput(const char *theName, SRatioInput &theInput) {
-  fdfLoadInputHeader(theName, theInput.mHeader);
-  theInput.mNull = fdfHeaderNullValue(theInput.mHeader);
-  theInput.mLines = fdfHeaderInteger(theInput.mHeader, "RasterInfo.NrOfLinesPerImage");
-  theInput.mPixels = fdfHeaderInteger(theInput.mHeader, "RasterInfo.NrOfPixelsPerLine");
-  fdfTraceMessage(" Number of lines per image = %d\n Number of pixels per line = %d\n", theInput.mLines,
-                  theInput.mPixels);
-}
-
-void fdfCheckSameSize(const SRatioInput &theFirst, const SRatioInput &theSecond) {
-  if (theSecond.mLines != theFirst.mLines) {
-    fdfTraceMessage("Error: The number of lines does not match (%d , %d)\n", theFirst.mLines, theSecond.mLines);
-    TLRX_RAISE(652807, nullptr);
-  }
-  if (theSecond.mPixels != theFirst.mPixels) {
-    fdfTraceMessage("Error: The number of pixels per line does not match (%d , %d)\n", theFirst.mPixels,
-                    theSecond.mPixels);
-    TLRX_RAISE(652807, nullptr);
-  }
-}
-
-// The result header: input 1's header made a float ratio raster of the pair.
-void fdfMakeRatioHeader(CDescription &theHeader, const SRatioInput &theFirst, const SRatioInput &theSecond,
-                        const char *theName1, const char *theName2) {
-  fdfDeclareStandardHeader(theHeader);
-  theHeader = theFirst.mHeader;
-  fdfSetHeaderText(theHeader, "RasterInfo.DataUnits", "RATIO");
-  fdfSetHeaderNumber(theHeader, "RasterInfo.HeaderOffset", 0);
-  fdfSetHeaderNumber(theHeader, "RasterInfo.RowPrefix", 0);
-  fdfSetHeaderNumber(theHeader, "RasterInfo.RowSuffix", 0);
-  fdfSetHeaderText(theHeader, "RasterInfo.CellType", "FLOAT");
-  fdfSetHeaderNumber(theHeader, "RasterInfo.NullCellValue", fdfGetDummyValueDouble());
-  fdfSetHeaderNumber(theHeader, "RasterInfo.NrOfLinesPerImage", theFirst.mLines);
-  fdfSetHeaderNumber(theHeader, "RasterInfo.NrOfPixelsPerLine", theFirst.mPixels);
-  fdfSetHeaderList(theHeader, "RasterInfo.FilesList", {theName1, theName2});
-  std::string aTime;
-  if (fdfFindOtherInfo(theFirst.mHeader, CTLRX_ACQUISITION_TIME_KEY, aTime)) {
-    fdfStampOtherInfo(theHeader, "ACQUISITION TIME", aTime.c_str());
-    fdfStampOtherInfo(theHeader, "MASTER ACQUISITION TIME", aTime.c_str());
-  }
-  if (fdfFindOtherInfo(theSecond.mHeader, CTLRX_ACQUISITION_TIME_KEY, aTime))
-    fdfStampOtherInfo(theHeader, "SLAVE ACQUISITION TIME", aTime.c_str());
-}
-
 void fdfTraceUsage(const char *theProgram) {
   fdfTraceMessage("Usage: %s <input> <output> <int_par> [ref_image]\n"
                   "  input\t\t\t  input image file name, short int/ or float\n"
@@ -110,8 +59,8 @@ int fdfRatioHistogramClass(double theValue) {
   return CTLRX_RATIO_HISTOGRAM_CLASSES - 1;
 }
 
-float fdfRatioPixel(double theA, double theNullA, double theB, double theNullB, bool theDecibel, float theNull) {
-  if (fdfIsNull(theA, theNullA) || fdfIsNull(theB, theNullB) || theB <= CTLRX_EPS)
+float fdfRatioPixel(double theA, bool theValidA, double theB, bool theValidB, bool theDecibel, float theNull) {
+  if (!theValidA || !theValidB || theB <= CTLRX_EPS)
     return theNull;
   const double aRatio = theA / theB;
   return static_cast<float>(theDecibel ? 10.0 * std::log10(aRatio) : aRatio);
@@ -133,36 +82,39 @@ int ratio_images(int argc, char **argv) {
     fdfTraceMessage("  the out is in db \n");
   const float aNull = fdfGetDummyValue();
 
-  SRatioInput aFirst, aSecond;
-  fdfLoadRatioInput(argv[1], aFirst);
-  fdfLoadRatioInput(argv[2], aSecond);
+  CWindowInput aFirst(argv[1]);
+  CWindowInput aSecond(argv[2]);
+  for (const CWindowInput *aInput : {&aFirst, &aSecond})
+    fdfTraceMessage(" Number of lines per image = %d\n Number of pixels per line = %d\n", aInput->lines(),
+                    aInput->pixels());
   fdfCheckSameSize(aFirst, aSecond);
-
-  CRasterFile aIn1, aIn2, aOut;
-  aIn1.open_read(argv[1], aFirst.mHeader);
-  aIn2.open_read(argv[2], aSecond.mHeader);
-  fdfTraceMessage("  Max bytes per pixel = %d\n", std::max(aIn1.getBytesPerPixel(), aIn2.getBytesPerPixel()));
+  aFirst.open();
+  aSecond.open();
   CDescription aHeader;
-  fdfMakeRatioHeader(aHeader, aFirst, aSecond, argv[1], argv[2]);
+  fdfMakeWindowResultHeader(aHeader, aFirst.header(), fdfGetDummyValueDouble(), "RATIO");
+  fdfSetHeaderList(aHeader, "RasterInfo.FilesList", {argv[1], argv[2]});
+  fdfStampPairInputs(aHeader, aFirst, aSecond);
+  CRasterFile aOut;
   aOut.open_write(aOutput.c_str(), aHeader);
 
-  const int32_t aLines = aFirst.mLines;
-  const int32_t aPixels = aFirst.mPixels;
-  std::vector<float> aLine1(aPixels), aLine2(aPixels), aResult(aPixels);
+  const int32_t aLines = aFirst.lines();
+  const int32_t aPixels = aFirst.pixels();
+  std::vector<float> aResult(aPixels);
   long long aHistogram[CTLRX_RATIO_HISTOGRAM_CLASSES] = {};
   CLineProgress aProgress(99.0);
   for (int32_t aLine = 0; aLine < aLines; ++aLine) {
     aProgress.update(aLine, aLines);
-    aIn1.getLine(aLine1.data(), aLine);
-    aIn2.getLine(aLine2.data(), aLine);
+    aFirst.readLine(aLine);
+    aSecond.readLine(aLine);
     for (int32_t i = 0; i < aPixels; ++i) {
-      aResult[i] = fdfRatioPixel(aLine1[i], aFirst.mNull, aLine2[i], aSecond.mNull, aDecibel, aNull);
+      aResult[i] = fdfRatioPixel(aFirst.values()[i], aFirst.mask()[i] != 0, aSecond.values()[i],
+                                 aSecond.mask()[i] != 0, aDecibel, aNull);
       ++aHistogram[fdfRatioHistogramClass(aResult[i])];
     }
     aOut.putLine(aLine, aResult.data());
   }
-  aIn1.close();
-  aIn2.close();
+  aFirst.close();
+  aSecond.close();
   aOut.close();
   fdfTraceMessage("writing the output parameter file %s\n", aOutput.c_str());
   fdfWriteResultHeader(aOutput, aHeader, CTLRX_ERR_FILE_COPY);

@@ -9,5 +9,6 @@ int ratio_images(int argc, char **argv);
 constexpr int CTLRX_RATIO_HISTOGRAM_CLASSES = 13;
 // Index of the histogram class of theValue (the "0.01" class is never chosen).
 int fdfRatioHistogramClass(double theValue);
-// Ratio of one pixel pair with the null rules; theNull for no result.
-float fdfRatioPixel(double theA, double theNullA, double theB, double theNullB, bool theDecibel, float theNull);
+// Ratio of one pixel pair: theNull where an input is no data or the divisor
+// is not above the smallest normal float.
+float fdfRatioPixel(double theA, bool theValidA, double theB, bool theValidB, bool theDecibel, float theNull);
