@@ -31,15 +31,22 @@ args() { local f=$out/$1; shift; printf '%s\n' "demo arguments" "$@" >"$f"; echo
 echo "== simulating a 5-date UTM series (a field brightens from date 3, a no-data strip) and a correlated pair"
 "$sim" series --out "$out/s" --lines 300 --pixels 320 --count 5 --utm 32N --origin 600000,5100000 --spacing 20 \
   --change 40,40,48,64,3,4 --nodata-box 200,0,56,40 --null -9999 --seed 7 >/dev/null
-"$sim" pair --out "$out/p" --lines 300 --pixels 320 --coherence-ramp 0.2,0.95 --seed 7 >/dev/null
+"$sim" pair --out "$out/p" --lines 300 --pixels 320 --coherence-ramp 0.2,0.95 --null -9999 --seed 7 >/dev/null
+"$sim" series --out "$out/amp" --count 1 --units AMPLITUDE --lines 300 --pixels 320 --null -9999 \
+  --nodata-box 0,0,40,40 --seed 7 >/dev/null
 
 run "main_principal_component_analysis#x"
 run "main_min_and_max#$(args minmax.txt "$out/s_list.txt" "$out/stack" 2 3 4 5 6 OK 0.3)"
 run "main_ratio#$(args ratio.txt "$out/s_list.txt" "$out/change" 1 unused OK 0.3)"
+run "main_texture#$(args texture.txt "$out/amp_01" "$out/amp_tex" 0 7 7 x OK 0)"
+run "main_correlation#$(args correlation.txt "$out/p_1" "$out/p_2" "$out/p_coh" -9999 11 11 11 11 OK OK 0)"
 
 echo "== outputs in $out"
 ls -l "$out" | grep -v -e ' s_0' -e ' p_' || true
 echo "-- date classes of the maximum (ENVI header read by GDAL):"
 gdalinfo "$out/stack_max_date" 2>/dev/null | sed -n '/Categories/,/Color Table/p' | head -8 || true
+echo "-- mean texture of single-look amplitude speckle (theory 0.5227) and the coherence across the ramp:"
+gdalinfo -stats "$out/amp_tex" 2>/dev/null | grep -m1 STATISTICS_MEAN || true; rm -f "$out"/*.aux.xml
+gdalinfo -stats "$out/p_coh" 2>/dev/null | grep -m1 STATISTICS_MEAN || true; rm -f "$out"/*.aux.xml
 echo "-- end of the log:"
 tail -n 8 "$out/Process.log"
