@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <limits>
 #include <random>
@@ -258,4 +259,82 @@ TEST(TemporalSeries, OnlyWantedFeaturesAreComputedAndStridedInputsAreRead) {
   EXPECT_EQ(aValues[CTLRX_TF_MEDIAN], N);
   EXPECT_DOUBLE_EQ(aValues[CTLRX_TF_MAX], 10 * std::log10(40 / (70.0 / 3)));
   EXPECT_EQ(aDates[0], CTLRX_TF_NO_DATE);
+}
+
+TEST(TemporalSeries, RateLimitIsDecidedExactlyAtItsBoundary) {
+  // (4.5 / 3) / 1 == 1.5 is not below 1.5; the next smaller value is.
+  EXPECT_EQ(pixel({3, 4.5}, {0, 1}, {}, false, false, 1.5).mKept, 1);
+  EXPECT_EQ(pixel({3, std::nextafter(4.5, 0.0)}, {0, 1}, {}, false, false, 1.5).mKept, 2);
+  // Over 7 days the limit is 7 x 1.5 times the last value.
+  EXPECT_EQ(pixel({0.1, 1.05}, {0, 7}, {}, false, false, 1.5).mKept, (1.05 / 0.1) / 7 < 1.5 ? 2 : 1);
+  EXPECT_EQ(pixel({0.1, std::nextafter(1.05, 2.0)}, {0, 7}, {}, false, false, 1.5).mKept,
+            (std::nextafter(1.05, 2.0) / 0.1) / 7 < 1.5 ? 2 : 1);
+  // Infinite threshold, infinite and subnormal values.
+  const double aInf = std::numeric_limits<double>::infinity();
+  EXPECT_EQ(pixel({3, 1e300, 5}, {0, 1, 2}, {}, false, false, aInf).mKept, 3);
+  EXPECT_EQ(pixel({3, aInf}, {0, 1}, {}, false, false, aInf).mKept, 1);
+  EXPECT_EQ(pixel({1e-310, 1e-310}, {0, 1}, {}, false, false, 1.5).mKept, 2);
+  EXPECT_EQ(pixel({1e-310, 2e-310}, {0, 1}, {}, false, false, 1.5).mKept, 1);
+}
+
+TEST(TemporalSeries, MedianOfEveryLengthMatchesSorting) {
+  std::mt19937 aRandom(3);
+  std::uniform_int_distribution<int> aDraw(1, 9); // repeats on purpose
+  for (int n = 1; n <= 40; ++n)
+    for (int aTrial = 0; aTrial < 20; ++aTrial) {
+      std::vector<double> aValues;
+      std::vector<long> aDays;
+      for (int i = 0; i < n; ++i) {
+        aValues.push_back(aDraw(aRandom) * 1.5);
+        aDays.push_back(i);
+      }
+      std::vector<double> aSorted = aValues;
+      std::sort(aSorted.begin(), aSorted.end());
+      const double aExpected = n == 2 ? (aSorted[0] + aSorted[1]) / 2 : aSorted[(n - 1) / 2];
+      EXPECT_EQ(pixel(aValues, aDays)[CTLRX_TF_MEDIAN], aExpected) << n;
+    }
+}
+
+TEST(TemporalSeries, WholeLinesMatchPixelByPixel) {
+  STemporalSettings aSettings;
+  aSettings.mNull = N;
+  aSettings.mNormalize = true;
+  for (bool &aWanted : aSettings.mWanted)
+    aWanted = true;
+  const std::vector<long> aDays = {0, 5, 5, 9};
+  const std::vector<double> aNulls = {-1, 0, -1, theNaN};
+  CTemporalSeries aSeries(aSettings, aDays, aNulls);
+  const int P = 5;
+  const double aRows[4 * P] = {1, -1, 3, 4e39, 0,  //
+                               2, 0, 0, 1, 7,      //
+                               3, 2, 5, 1e-45, 7,  //
+                               theNaN, 1, 2, 3, 7};
+  std::vector<float> aValues(12 * P);
+  std::vector<int32_t> aDates(P), aUnused(P, 123);
+  STemporalLines aLines;
+  for (int f = 0; f < 12; ++f)
+    if (f != CTLRX_TF_MEDIAN)
+      aLines.mValue[f] = &aValues[f * P];
+  aLines.mDate[1] = aDates.data();
+  aSeries.line(aRows, P, aLines);
+  for (int x = 0; x < P; ++x) {
+    double aPixel[CTLRX_TF_VALUE_COUNT];
+    int32_t aPixelDates[2];
+    aSeries.select(aRows + x, P);
+    aSeries.features(aPixel, aPixelDates);
+    for (int f = 0; f < 12; ++f) {
+      if (f == CTLRX_TF_MEDIAN)
+        continue;
+      const double aExpected = aPixel[f] > 3.4028234663852886e+38    ? std::numeric_limits<double>::infinity()
+                               : aPixel[f] < -3.4028234663852886e+38 ? -std::numeric_limits<double>::infinity()
+                                                                     : static_cast<float>(aPixel[f]);
+      if (std::isnan(aExpected))
+        EXPECT_TRUE(std::isnan(aValues[f * P + x])) << f << " " << x;
+      else
+        EXPECT_EQ(aValues[f * P + x], aExpected) << f << " " << x;
+    }
+    EXPECT_EQ(aDates[x], aPixelDates[1]) << x;
+  }
+  EXPECT_EQ(aValues[CTLRX_TF_MEAN * P + 3], std::numeric_limits<float>::infinity());
+  EXPECT_EQ(aUnused, std::vector<int32_t>(P, 123));
 }

@@ -165,8 +165,6 @@ void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, co
     fdfRaiseMissing(fdfHeaderFileName(theOutput.mName));
 }
 
-float fdfToFloat(double theValue) { return tlrx_raster_detail::narrowFloating<float>(theValue); }
-
 // Days of the inputs, ordered in time with their names, and the trace of
 // their distances from the reference.
 std::vector<long> fdfOrderInTime(std::vector<std::string> &theNames) {
@@ -186,16 +184,6 @@ std::string fdfReferenceDateText(const std::string &theEarliest) {
   std::string aText;
   fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aText);
   return aText;
-}
-
-void fdfStoreFeatures(std::vector<std::unique_ptr<SOpenOutput>> &theOpen, int32_t thePixel, const double *theValues,
-                      const int32_t *theDates) {
-  for (auto &aOutput : theOpen) {
-    if (theOutputs[aOutput->mFeature].mDate)
-      aOutput->mDates[thePixel] = theDates[aOutput->mFeature - CTLRX_TF_DATE_MAX];
-    else
-      aOutput->mValues[thePixel] = fdfToFloat(theValues[aOutput->mFeature]);
-  }
 }
 
 } // namespace
@@ -266,17 +254,18 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   const size_t aInputs = aNames.size();
   std::vector<double> aRows(aInputs * static_cast<size_t>(aPixels));
   CTemporalSeries aSeries(aSettings, aDays, aSource->nulls());
-  double aValues[CTLRX_TF_VALUE_COUNT];
-  int32_t aDates[2];
+  STemporalLines aOutputLines;
+  for (auto &aOutput : aOutputs) {
+    if (theOutputs[aOutput->mFeature].mDate)
+      aOutputLines.mDate[aOutput->mFeature - CTLRX_TF_DATE_MAX] = aOutput->mDates.data();
+    else
+      aOutputLines.mValue[aOutput->mFeature] = aOutput->mValues.data();
+  }
   CLineProgress aProgress(100.0);
   for (int32_t l = 0; l < aLines; ++l) {
     aProgress.update(l, aLines);
     aSource->read(l, aRows.data());
-    for (int32_t x = 0; x < aPixels; ++x) {
-      aSeries.select(&aRows[x], static_cast<size_t>(aPixels));
-      aSeries.features(aValues, aDates);
-      fdfStoreFeatures(aOutputs, x, aValues, aDates);
-    }
+    aSeries.line(aRows.data(), aPixels, aOutputLines);
     for (auto &aOutput : aOutputs)
       aOutput->mFile.putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
                                                         : static_cast<const void *>(aOutput->mDates.data()));

@@ -1,41 +1,115 @@
 #include "tlrx_temporal_statistics.h"
 
 #include <algorithm>
+#include <array>
+#include <utility>
+#include <cfloat>
 #include <cmath>
 #include <limits>
 
 namespace {
 
 constexpr double CTLRX_NULL_TOLERANCE = 1.1754943508222875e-38;
-constexpr double CTLRX_RESCALE_LIMIT = 1e14;
 constexpr double CTLRX_FLOAT_MAX = 3.4028234663852886e+38;
+constexpr double CTLRX_RESCALE_LIMIT = 1e14; // as in CTemporalAccumulator::scaledAdd
+// Series up to this length sort with a network for the median.
+constexpr int32_t CTLRX_NETWORK_LIMIT = 32;
 
-// Features scaled by the modifiers: normalisation spares the mean and the
-// median, decibels only the mean.
-const ETemporalFeature theNormalised[] = {CTLRX_TF_STD,          CTLRX_TF_GRADIENT,      CTLRX_TF_MAX,
-                                          CTLRX_TF_MIN,          CTLRX_TF_SPAN_DIFFERENCE, CTLRX_TF_MAX_INCREMENT,
-                                          CTLRX_TF_MAX_DECREMENT, CTLRX_TF_SPAN_RATIO,   CTLRX_TF_MAX_RATIO,
-                                          CTLRX_TF_MIN_RATIO};
+// Features defined only from two kept samples on.
+const bool theNeedsTwo[CTLRX_TF_VALUE_COUNT] = {false, true,  false, true, false, false,
+                                                false, true,  true,  false, true, true};
 
-// The no-data interval; comparisons with a NaN bound are false, so a NaN
-// null value leaves only the NaN test.
-struct SNullTest {
-  double mLow, mHigh;
-  explicit SNullTest(double theNull) : mLow(theNull - CTLRX_NULL_TOLERANCE), mHigh(theNull + CTLRX_NULL_TOLERANCE) {}
-  bool matches(double theValue, bool theNaNMatches) const {
-    return (theNaNMatches && std::isnan(theValue)) || (theValue >= mLow && theValue <= mHigh);
+// Double to float, infinite beyond the float range (a plain conversion of
+// such a value is undefined).
+inline float fdfToFloat(double theValue) {
+  if (theValue > CTLRX_FLOAT_MAX)
+    return std::numeric_limits<float>::infinity();
+  if (theValue < -CTLRX_FLOAT_MAX)
+    return -std::numeric_limits<float>::infinity();
+  return static_cast<float>(theValue);
+}
+
+// Comparisons with NaN bounds are false, so a NaN null value leaves only the
+// NaN test.
+inline bool fdfInInterval(double theValue, double theLow, double theHigh) {
+  return theValue >= theLow && theValue <= theHigh;
+}
+
+// Whether (theValue / theLast) / theDays < theThreshold, as those divisions
+// and that comparison decide it, NaN, infinities and zeros included. Far
+// from the limit a product decides without dividing; within a few units in
+// the last place of it, or where the product leaves the normal range, the
+// divisions themselves do.
+inline bool fdfBelowRatePerDay(double theValue, double theLast, double theDays, double theThreshold) {
+  constexpr double aMargin = 1e-15;
+  const double aPerDay = theThreshold * theDays;
+  const double aLimit = aPerDay * theLast;
+  if (aPerDay >= DBL_MIN && aPerDay <= DBL_MAX && aLimit >= DBL_MIN && aLimit <= DBL_MAX) {
+    if (theValue < aLimit * (1.0 - aMargin))
+      return true;
+    if (theValue > aLimit * (1.0 + aMargin))
+      return false;
   }
+  return (theValue / theLast) / theDays < theThreshold;
+}
+
+// Median (lower median for an even count) of a few values through the
+// compare-exchanges of Batcher's odd-even merge sort. With the count known
+// at compile time the network unrolls into branch-free minima and maxima on
+// registers, several times faster than a general selection, whose branches
+// the random order of one pixel's values keeps mispredicting.
+struct SExchange {
+  int mLow, mHigh;
 };
 
-// One running sum with its power-of-ten scale.
-void fdfScaledAdd(double &theSum, double &theScale, double theValue) {
-  if (theSum > CTLRX_RESCALE_LIMIT) {
-    theScale *= 10.0;
-    theSum = 0.1 * theSum + theValue / theScale;
-  } else {
-    theSum += theValue / theScale;
-  }
+constexpr int fdfBatcher(int theCount, SExchange *theOut) {
+  int aSize = 0;
+  for (int p = 1; p < theCount; p *= 2)
+    for (int k = p; k >= 1; k /= 2)
+      for (int j = k % p; j + k < theCount; j += 2 * k)
+        for (int i = 0; i < k && i < theCount - j - k; ++i)
+          if ((i + j) / (2 * p) == (i + j + k) / (2 * p)) {
+            if (theOut != nullptr)
+              theOut[aSize] = {i + j, i + j + k};
+            ++aSize;
+          }
+  return aSize;
 }
+
+template <int N>
+struct SBatcherNetwork {
+  static constexpr int CSize = fdfBatcher(N, nullptr);
+  SExchange mPairs[CSize > 0 ? CSize : 1] = {};
+  constexpr SBatcherNetwork() { fdfBatcher(N, mPairs); }
+};
+
+template <int N, size_t... I>
+double fdfNetworkMedian(const double *theValues, std::index_sequence<I...>) {
+  constexpr SBatcherNetwork<N> aNetwork;
+  double a[N];
+  for (int i = 0; i < N; ++i)
+    a[i] = theValues[i];
+  [[maybe_unused]] auto aExchange = [&a](SExchange thePair) {
+    const double aLow = std::min(a[thePair.mLow], a[thePair.mHigh]);
+    a[thePair.mHigh] = std::max(a[thePair.mLow], a[thePair.mHigh]);
+    a[thePair.mLow] = aLow;
+  };
+  (aExchange(aNetwork.mPairs[I]), ...);
+  return a[(N - 1) / 2];
+}
+
+template <int N>
+double fdfNetworkMedian(const double *theValues) {
+  return fdfNetworkMedian<N>(theValues, std::make_index_sequence<SBatcherNetwork<N>::CSize>());
+}
+
+using TLRXMedian = double (*)(const double *);
+template <int... N>
+constexpr std::array<TLRXMedian, sizeof...(N)> fdfMedianTable(std::integer_sequence<int, N...>) {
+  return {&fdfNetworkMedian<N + 1>...};
+}
+// Networks for 1 .. CTLRX_NETWORK_LIMIT values, entry n - 1 for n values.
+constexpr auto theMedianNetworks = fdfMedianTable(std::make_integer_sequence<int, CTLRX_NETWORK_LIMIT>());
 
 } // namespace
 
@@ -43,15 +117,35 @@ void CTemporalAccumulator::reset(double theNull) {
   mSum = mSquares = 0.0;
   mSumScale = mSquaresScale = 1.0;
   mNull = theNull;
+  mNullLow = theNull - CTLRX_NULL_TOLERANCE;
+  mNullHigh = theNull + CTLRX_NULL_TOLERANCE;
+  mNullIsNaN = std::isnan(theNull);
   mCount = 0;
 }
 
-void CTemporalAccumulator::add(double theValue) {
-  if (SNullTest(mNull).matches(theValue, std::isnan(mNull)))
+void CTemporalAccumulator::addAll(const double *theValues, int32_t theCount, double theLargest) {
+  const double aBound = theCount * std::max(theLargest, theLargest * theLargest);
+  if (!(aBound <= CTLRX_RESCALE_LIMIT) || mSumScale != 1.0 || mSquaresScale != 1.0 || mSum != 0.0 ||
+      mSquares != 0.0) {
+    for (int32_t j = 0; j < theCount; ++j)
+      add(theValues[j]);
     return;
-  fdfScaledAdd(mSum, mSumScale, theValue);
-  fdfScaledAdd(mSquares, mSquaresScale, theValue * theValue);
-  ++mCount;
+  }
+  // Every partial sum stays below the limit: plain sums, in the same order,
+  // in locals (the members could alias theValues for the compiler).
+  double aSum = 0.0, aSquares = 0.0;
+  int32_t aCount = 0;
+  for (int32_t j = 0; j < theCount; ++j) {
+    const double v = theValues[j];
+    if (isNull(v))
+      continue;
+    aSum += v;
+    aSquares += v * v;
+    ++aCount;
+  }
+  mSum = aSum;
+  mSquares = aSquares;
+  mCount = aCount;
 }
 
 double CTemporalAccumulator::mean() const { return mCount < 1 ? mNull : mSum / mCount * mSumScale; }
@@ -69,29 +163,42 @@ double CTemporalAccumulator::std() const {
 
 CTemporalSeries::CTemporalSeries(const STemporalSettings &theSettings, const std::vector<long> &theDays,
                                  const std::vector<double> &theNulls)
-    : mSettings(theSettings), mDays(theDays), mNulls(theNulls), mValue(theDays.size()), mDay(theDays.size()),
-      mScratch(theDays.size()) {}
+    : mSettings(theSettings), mValue(theDays.size()), mRatio(theDays.size()), mDay(theDays.size()),
+      mScratch(theDays.size()) {
+  // The modifiers touch every wanted value but the mean; normalisation
+  // also spares the median.
+  if (mSettings.mNormalize || mSettings.mDecibels)
+    for (int f = CTLRX_TF_STD; f < CTLRX_TF_VALUE_COUNT; ++f)
+      if (mSettings.mWanted[f])
+        mModified.push_back(f);
+  for (size_t i = 0; i < theDays.size(); ++i)
+    mInputs.push_back({theNulls[i] - CTLRX_NULL_TOLERANCE, theNulls[i] + CTLRX_NULL_TOLERANCE,
+                       static_cast<double>(theDays[i]), static_cast<int32_t>(theDays[i] - theDays[0])});
+}
 
 int32_t CTemporalSeries::select(const double *theValues, size_t theStride) {
-  mKept = 0;
-  double aLast = 0.0;
-  long aLastDay = 0;
-  const size_t aInputs = mDays.size();
+  int32_t k = 0;
+  double aLast = 0.0, aLastDay = 0.0, aLargest = 0.0;
+  const size_t aInputs = mInputs.size();
   for (size_t i = 0; i < aInputs; ++i) {
+    const SInputTerms &aInput = mInputs[i];
     double v = theValues[i * theStride];
     // Not a number carries no measurement, whatever the null value.
-    if (SNullTest(mNulls[i]).matches(v, true))
+    if (std::isnan(v) || fdfInInterval(v, aInput.mNullLow, aInput.mNullHigh))
       continue;
     v = std::fabs(v);
-    if (mKept > 0 && !((v / aLast) / static_cast<double>(mDays[i] - aLastDay) < mSettings.mRatioTimeThreshold))
+    if (k > 0 && !fdfBelowRatePerDay(v, aLast, aInput.mDay - aLastDay, mSettings.mRatioTimeThreshold))
       continue;
-    mValue[mKept] = v;
-    mDay[mKept] = static_cast<int32_t>(mDays[i] - mDays[0]);
-    ++mKept;
+    mValue[k] = v;
+    mDay[k] = aInput.mFromReference;
+    ++k;
     aLast = v;
-    aLastDay = mDays[i];
+    aLastDay = aInput.mDay;
+    aLargest = std::max(aLargest, v);
   }
-  return mKept;
+  mKept = k;
+  mLargest = aLargest;
+  return k;
 }
 
 double CTemporalSeries::median() {
@@ -99,100 +206,127 @@ double CTemporalSeries::median() {
     return mValue[0];
   if (mKept == 2)
     return (mValue[0] + mValue[1]) / 2.0;
+  if (mKept <= CTLRX_NETWORK_LIMIT)
+    return theMedianNetworks[mKept - 1](mValue.data());
   std::copy(mValue.begin(), mValue.begin() + mKept, mScratch.begin());
   const auto aMiddle = mScratch.begin() + (mKept - 1) / 2;
   std::nth_element(mScratch.begin(), aMiddle, mScratch.begin() + mKept);
   return *aMiddle;
 }
 
+// The searches are written as selects, not branches: the order of one
+// pixel's values is random, and mispredicted branches would cost more than
+// the comparisons.
 void CTemporalSeries::computeDates(int32_t theDates[2]) const {
   int32_t aMax = -1;
   double aBest = -CTLRX_FLOAT_MAX;
-  for (int32_t j = 0; j < mKept; ++j)
-    if (mValue[j] > aBest) {
-      aBest = mValue[j];
-      aMax = j;
-    }
+  for (int32_t j = 0; j < mKept; ++j) {
+    const bool aAbove = mValue[j] > aBest;
+    aBest = aAbove ? mValue[j] : aBest;
+    aMax = aAbove ? j : aMax;
+  }
   if (aMax < 0)
     return;
   theDates[0] = mDay[aMax];
   int32_t aMin = -1;
   double aLowest = CTLRX_FLOAT_MAX;
-  for (int32_t j = 0; j < aMax; ++j)
-    if (mValue[j] < aLowest) {
-      aLowest = mValue[j];
-      aMin = j;
-    }
+  for (int32_t j = 0; j < aMax; ++j) {
+    const bool aBelow = mValue[j] < aLowest;
+    aLowest = aBelow ? mValue[j] : aLowest;
+    aMin = aBelow ? j : aMin;
+  }
   if (aMin >= 0)
     theDates[1] = mDay[aMin];
 }
 
 void CTemporalSeries::features(double theValues[CTLRX_TF_VALUE_COUNT], int32_t theDates[2]) {
   const double aNull = mSettings.mNull;
-  std::fill(theValues, theValues + CTLRX_TF_VALUE_COUNT, aNull);
   theDates[0] = theDates[1] = CTLRX_TF_NO_DATE;
   const int32_t k = mKept;
-  if (k == 0)
+  if (k == 0) {
+    std::fill(theValues, theValues + CTLRX_TF_VALUE_COUNT, aNull);
     return;
+  }
+  // Independent divisions, kept out of the selection's dependent chain.
+  for (int32_t j = 1; j < k; ++j)
+    mRatio[j] = mValue[j] / mValue[j - 1];
   mAccumulator.reset(aNull);
-  double aMin = mValue[0], aMax = mValue[0];
+  mAccumulator.addAll(mValue.data(), k, mLargest);
+  double aPrevious = mValue[0];
+  double aMin = aPrevious, aMax = aPrevious;
   double aUp = -std::numeric_limits<double>::infinity(), aDown = std::numeric_limits<double>::infinity();
   double aSteepest = 0.0;
   double aRatioUp = -std::numeric_limits<double>::infinity(), aRatioDown = std::numeric_limits<double>::infinity();
-  for (int32_t j = 0; j < k; ++j) {
+  for (int32_t j = 1; j < k; ++j) {
     const double v = mValue[j];
-    mAccumulator.add(v);
     aMin = std::min(aMin, v);
     aMax = std::max(aMax, v);
-    if (j == 0)
-      continue;
-    const double aStep = v - mValue[j - 1];
-    const double aRatio = v / mValue[j - 1];
+    const double aStep = v - aPrevious;
+    const double aRatio = mRatio[j];
     aUp = std::max(aUp, aStep);
     aDown = std::min(aDown, aStep);
     aSteepest = std::max(aSteepest, std::fabs(aStep));
     aRatioUp = std::max(aRatioUp, aRatio);
     aRatioDown = std::min(aRatioDown, aRatio);
+    aPrevious = v;
   }
   const double aMean = mAccumulator.mean();
   // Without a sample in the accumulator there is no mean to scale by.
   const bool aHasMean = mAccumulator.count() > 0;
-  bool aSet[CTLRX_TF_VALUE_COUNT] = {};
-  auto aPut = [&](ETemporalFeature theFeature, double theValue) {
-    theValues[theFeature] = theValue;
-    aSet[theFeature] = true;
-  };
-  aPut(CTLRX_TF_MEAN, aMean);
-  if (mSettings.mWanted[CTLRX_TF_MEDIAN])
-    aPut(CTLRX_TF_MEDIAN, median());
-  aPut(CTLRX_TF_MAX, aMax);
-  aPut(CTLRX_TF_MIN, aMin);
-  aPut(CTLRX_TF_SPAN_DIFFERENCE, aMax - aMin);
-  aPut(CTLRX_TF_SPAN_RATIO, aMax / aMin);
-  if (k > 1) {
-    aPut(CTLRX_TF_MAX_INCREMENT, aUp);
-    aPut(CTLRX_TF_MAX_DECREMENT, aDown);
-    aPut(CTLRX_TF_MAX_RATIO, aRatioUp);
-    aPut(CTLRX_TF_MIN_RATIO, aRatioDown);
-    aPut(CTLRX_TF_GRADIENT, aSteepest);
-    if (aHasMean)
-      aPut(CTLRX_TF_STD, mAccumulator.std());
-  }
-  if (mSettings.mNormalize)
-    for (ETemporalFeature aFeature : theNormalised) {
-      if (!aSet[aFeature] || !mSettings.mWanted[aFeature])
+  const bool aPairs = k > 1;
+  theValues[CTLRX_TF_MEAN] = aMean;
+  theValues[CTLRX_TF_MEDIAN] = mSettings.mWanted[CTLRX_TF_MEDIAN] ? median() : aNull;
+  theValues[CTLRX_TF_MAX] = aMax;
+  theValues[CTLRX_TF_MIN] = aMin;
+  theValues[CTLRX_TF_SPAN_DIFFERENCE] = aMax - aMin;
+  theValues[CTLRX_TF_SPAN_RATIO] = aMax / aMin;
+  theValues[CTLRX_TF_MAX_INCREMENT] = aPairs ? aUp : aNull;
+  theValues[CTLRX_TF_MAX_DECREMENT] = aPairs ? aDown : aNull;
+  theValues[CTLRX_TF_MAX_RATIO] = aPairs ? aRatioUp : aNull;
+  theValues[CTLRX_TF_MIN_RATIO] = aPairs ? aRatioDown : aNull;
+  theValues[CTLRX_TF_GRADIENT] = aPairs ? aSteepest : aNull;
+  const bool aHasStd = aPairs && aHasMean;
+  theValues[CTLRX_TF_STD] = aHasStd && mSettings.mWanted[CTLRX_TF_STD] ? mAccumulator.std() : aNull;
+  for (int f : mModified) {
+    const bool aDefined = f == CTLRX_TF_STD ? aHasStd : aPairs || !theNeedsTwo[f];
+    if (!aDefined)
+      continue;
+    double x = theValues[f];
+    if (mSettings.mNormalize && f != CTLRX_TF_MEDIAN) {
+      if (!aHasMean) {
+        theValues[f] = aNull;
         continue;
-      if (aHasMean) {
-        theValues[aFeature] /= aMean;
-      } else {
-        theValues[aFeature] = aNull;
-        aSet[aFeature] = false;
       }
+      x /= aMean;
     }
-  if (mSettings.mDecibels)
-    for (int f = CTLRX_TF_STD; f < CTLRX_TF_VALUE_COUNT; ++f)
-      if (aSet[f] && mSettings.mWanted[f])
-        theValues[f] = 10.0 * std::log10(theValues[f]);
+    if (mSettings.mDecibels)
+      x = 10.0 * std::log10(x);
+    theValues[f] = x;
+  }
   if (mSettings.mWanted[CTLRX_TF_DATE_MAX] || mSettings.mWanted[CTLRX_TF_DATE_MIN_BEFORE_MAX])
     computeDates(theDates);
+}
+
+void CTemporalSeries::line(const double *theRows, int32_t thePixels, const STemporalLines &theLines) {
+  // The written features as a short table, so the pixel loop does not look
+  // at the ones left out.
+  int aFeatures[CTLRX_TF_VALUE_COUNT];
+  float *aValueLines[CTLRX_TF_VALUE_COUNT];
+  int aWritten = 0;
+  for (int f = 0; f < CTLRX_TF_VALUE_COUNT; ++f)
+    if (theLines.mValue[f] != nullptr) {
+      aFeatures[aWritten] = f;
+      aValueLines[aWritten++] = theLines.mValue[f];
+    }
+  double aValues[CTLRX_TF_VALUE_COUNT];
+  int32_t aDates[2];
+  for (int32_t x = 0; x < thePixels; ++x) {
+    select(theRows + x, static_cast<size_t>(thePixels));
+    features(aValues, aDates);
+    for (int j = 0; j < aWritten; ++j)
+      aValueLines[j][x] = fdfToFloat(aValues[aFeatures[j]]);
+    for (int d = 0; d < 2; ++d)
+      if (theLines.mDate[d] != nullptr)
+        theLines.mDate[d][x] = aDates[d];
+  }
 }

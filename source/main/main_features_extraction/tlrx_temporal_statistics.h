@@ -43,7 +43,18 @@ constexpr int32_t CTLRX_TF_NO_DATE = -9999;
 class CTemporalAccumulator {
 public:
   void reset(double theNull);
-  void add(double theValue);
+  // Adds theCount values no larger than theLargest (>= 0), as add() one by
+  // one would; when the sums cannot pass the rescaling limit, without its
+  // tests.
+  void addAll(const double *theValues, int32_t theCount, double theLargest);
+  // Inline: called for every kept sample of every pixel.
+  void add(double theValue) {
+    if (isNull(theValue))
+      return;
+    scaledAdd(mSum, mSumScale, theValue);
+    scaledAdd(mSquares, mSquaresScale, theValue * theValue);
+    ++mCount;
+  }
   int32_t count() const { return mCount; }
   // The null value when nothing was added.
   double mean() const;
@@ -52,9 +63,24 @@ public:
   double std() const;
 
 private:
+  bool isNull(double theValue) const {
+    return (mNullIsNaN && theValue != theValue) || (theValue >= mNullLow && theValue <= mNullHigh);
+  }
+  // A scale of 1 divides exactly, so the usual case skips the division.
+  static void scaledAdd(double &theSum, double &theScale, double theValue) {
+    if (theSum > 1e14) {
+      theScale *= 10.0;
+      theSum = 0.1 * theSum + theValue / theScale;
+    } else {
+      theSum += theScale == 1.0 ? theValue : theValue / theScale;
+    }
+  }
+
   double mSum = 0.0, mSumScale = 1.0;
   double mSquares = 0.0, mSquaresScale = 1.0;
   double mNull = 0.0;
+  double mNullLow = 0.0, mNullHigh = 0.0; // the no-data interval (NaN bounds for a NaN null)
+  bool mNullIsNaN = false;
   int32_t mCount = 0;
 };
 
@@ -64,6 +90,13 @@ struct STemporalSettings {
   bool mDecibels = false;            // 10 log10
   bool mWanted[CTLRX_TF_COUNT] = {}; // features to compute
   double mNull = 0.0;                // output null value N
+};
+
+// Where a line of features goes: one float line per value feature and one
+// integer line per date, nullptr for the features not written.
+struct STemporalLines {
+  float *mValue[CTLRX_TF_VALUE_COUNT] = {};
+  int32_t *mDate[2] = {};
 };
 
 // One pixel's series: selection, then features. Buffers are sized once for
@@ -84,20 +117,35 @@ public:
 
   // Features of the selected samples: theValues[f] for the value features
   // (the null value where undefined), theDates[0] and theDates[1] for the
-  // two dates (CTLRX_TF_NO_DATE where undefined). Only wanted features are
-  // computed; the others hold the null value or CTLRX_TF_NO_DATE.
+  // two dates (CTLRX_TF_NO_DATE where undefined). The median, the standard
+  // deviation and the dates are computed only when wanted, the modifiers
+  // applied only to wanted features; other entries are not to be used.
   void features(double theValues[CTLRX_TF_VALUE_COUNT], int32_t theDates[2]);
+
+  // Both steps for every pixel of a line, the value of input i at pixel x
+  // being theRows[i * thePixels + x]; values stored as floats (beyond the
+  // float range: infinite), dates as integers.
+  void line(const double *theRows, int32_t thePixels, const STemporalLines &theLines);
 
 private:
   void computeDates(int32_t theDates[2]) const;
   double median();
 
+  // What the selection needs of every input, in temporal order.
+  struct SInputTerms {
+    double mNullLow, mNullHigh; // no-data interval (NaN bounds for a NaN null)
+    double mDay;                // day number
+    int32_t mFromReference;     // days from the first input
+  };
+
   STemporalSettings mSettings;
-  std::vector<long> mDays;
-  std::vector<double> mNulls;
+  std::vector<SInputTerms> mInputs;
   std::vector<double> mValue;   // kept values
+  std::vector<double> mRatio;   // mValue[j] / mValue[j - 1], from j = 1
   std::vector<int32_t> mDay;    // their days from the reference
   std::vector<double> mScratch; // median selection
+  std::vector<int> mModified;   // wanted features the modifiers change
   int32_t mKept = 0;
+  double mLargest = 0.0; // of the kept values
   CTemporalAccumulator mAccumulator;
 };

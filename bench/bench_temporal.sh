@@ -1,0 +1,139 @@
+#!/usr/bin/env bash
+# Temporal feature extraction on simulated series of 8 FLOAT images, run as
+# whole processes the way a host runs them:
+#   all fourteen outputs of 8 co-registered SIDE x SIDE images against a
+#   numpy peer (mean, deviation, median, min, max, largest increment and
+#   decrement; bench_temporal_peer.py): target peer / ours >= 3;
+#   the read-and-write baseline (cat of the 8 inputs, dd of 14 outputs'
+#   worth of bytes): target ours / baseline <= 3;
+#   the same series geocoded (UTM, three images moved by a quarter cell, so
+#   every cell is interpolated) with bilinear resampling: target
+#   geocoded / co-registered <= 2;
+#   peak RSS below 64 MB, and flat in the number of lines (a series with a
+#   quarter of the lines peaks within 2 MB of the full one).
+# Every case runs ROUNDS times, alternately; medians and ratios are printed.
+# Exit status 1 when a memory limit is missed.
+#
+# Usage: bench/bench_temporal.sh [side] [rounds]    (default 2048, 3)
+# The build goes to $TLRX_BENCH_BUILD (default build_bench) in Release.
+set -euo pipefail
+
+SIDE=${1:-2048}
+ROUNDS=${2:-3}
+COUNT=8
+ROOT=$(cd "$(dirname "$0")/.." && pwd)
+BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
+PYTHON=${TLRX_BENCH_PYTHON:-/usr/bin/python3}
+PEAK_LIMIT_KB=$((64 * 1024))
+FLAT_LIMIT_KB=2048
+
+command -v /usr/bin/time >/dev/null || { echo "bench_temporal: /usr/bin/time is not installed" >&2; exit 2; }
+"$PYTHON" -c "import numpy" 2>/dev/null ||
+  { echo "bench_temporal: $PYTHON lacks numpy (apt-get install python3-numpy)" >&2; exit 2; }
+
+cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_TESTS=OFF >/dev/null
+cmake --build "$BUILD" -j2 --target main_features_extraction main_delete_file tlrx_simulate >/dev/null
+
+WORK=$(mktemp -d /tmp/tlrx_bench_temporal.XXXXXX)
+trap 'rm -rf "$WORK"' EXIT
+export TELLURIX_INIT_DIR="$BUILD/etc/tellurix"
+export TELLURIX_WORKING_DIR="$WORK/"
+export TELLURIX_BATCH_DIR="$WORK/"
+NULL=-9999
+
+simulate() {
+  "$BUILD/bin/tlrx_simulate" series --count "$COUNT" --pixels "$SIDE" --cell-type FLOAT --null "$NULL" \
+    --nodata-fraction 0.001 --change 100,100,200,200,4,4 --seed 3 "$@" >>"$WORK/simulate.log" 2>&1 ||
+    { cat "$WORK/simulate.log" >&2; exit 1; }
+}
+simulate --out "$WORK/s" --lines "$SIDE"
+simulate --out "$WORK/q" --lines $((SIDE / 4))
+simulate --out "$WORK/g" --lines "$SIDE" --utm 32N --origin 600000,5100000 --spacing 20 \
+  --image-origin 3:600005,5100000 --image-origin 5:600000,5099995 --image-origin 7:600005,5099995
+names() { for ((i = 1; i <= COUNT; ++i)); do printf '%s_%02d ' "$1" "$i"; done; }
+
+# Parameter file: inputs of root $1, output root $2, kernel $3, every output.
+parameters() {
+  {
+    printf '<?xml version="1.0" ?>\n<HEADER_INFO>\n<MAIN_CMD>\n<input_file_list>\n'
+    printf '<VectorString NumberOfElements = "%d">\n' "$COUNT"
+    local i=0
+    for aName in $(names "$1"); do
+      printf '<ValueString ID = "%d">%s</ValueString>\n' "$i" "$aName"
+      i=$((i + 1))
+    done
+    printf '</VectorString>\n</input_file_list>\n<out_root_file_name>%s</out_root_file_name>\n' "$2"
+    printf '<interp_type>%s</interp_type>\n' "$3"
+    for aSwitch in mean std median gradient max min span_max_less_min max_less_min_sup max_less_min_inf \
+      span_max_on_min max_on_min_sup max_on_min_inf date_max date_min_before_max; do
+      printf '<%s>OK</%s>\n' "$aSwitch" "$aSwitch"
+    done
+    printf '<TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>\n</MAIN_CMD>\n</HEADER_INFO>\n'
+  } >"$WORK/$4"
+}
+parameters "$WORK/s" "$WORK/ours" nearest_neighbour ours.xml
+parameters "$WORK/q" "$WORK/quarter" nearest_neighbour quarter.xml
+parameters "$WORK/g" "$WORK/geo" bilinear_interpolation geo.xml
+OUTPUT_MB=$((14 * SIDE * SIDE * 4 / 1048576))
+
+# One run: wall, user, system seconds and peak resident kilobytes.
+timed() {
+  printf '0\n\n' >"$WORK/Process.working"
+  /usr/bin/time -f "%e %U %S %M" -o "$WORK/time.txt" "$@" >/dev/null 2>&1 ||
+    { echo "bench_temporal: failed: $*" >&2; cat "$WORK/Process.working_error" >&2 2>/dev/null; exit 1; }
+  cat "$WORK/time.txt"
+}
+MAIN="$BUILD/bin/main_features_extraction"
+PEER="$ROOT/bench/bench_temporal_peer.py"
+# The peer reads the images in temporal order (the simulator's order).
+declare -A RUN=(
+  [ours]="$MAIN main_temporal_feature_extraction#$WORK/ours.xml"
+  [peer]="$PYTHON $PEER $WORK/peer $SIDE $SIDE $NULL $(names "$WORK/s")"
+  [base]="sh -c 'cat $(names "$WORK/s") >/dev/null; dd if=/dev/zero of=$WORK/base bs=1M count=$OUTPUT_MB 2>/dev/null'"
+  [geo]="$MAIN main_temporal_feature_extraction#$WORK/geo.xml"
+  [quarter]="$MAIN main_temporal_feature_extraction#$WORK/quarter.xml"
+)
+CASES="ours peer base geo quarter"
+for aCase in $CASES; do : >"$WORK/$aCase.times"; done
+for ((aRound = 0; aRound < ROUNDS; ++aRound)); do
+  for aCase in $CASES; do
+    eval "timed ${RUN[$aCase]}" >>"$WORK/$aCase.times"
+  done
+done
+
+median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
+# Column 1 wall, 23 user + system, 4 peak RSS (kB).
+stat() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$WORK/$1.times" | median; }
+
+MB=$(awk -v s="$SIDE" 'BEGIN { print s * s * 4 / 1048576 }')
+printf "Temporal features of %d FLOAT images of %dx%d (%.0f MB each), %d rounds, medians\n" "$COUNT" "$SIDE" "$SIDE" \
+  "$MB" "$ROUNDS"
+printf "%-10s %9s %9s %12s %14s\n" "" "wall s" "cpu s" "peak RSS MB" "input MB/s"
+for aCase in $CASES; do
+  aInput=$(awk -v m="$MB" -v n="$COUNT" 'BEGIN { print m * n }')
+  [[ $aCase == quarter ]] && aInput=$(awk -v m="$aInput" 'BEGIN { print m / 4 }')
+  printf "%-10s %9.3f %9.3f %12.1f %14.1f\n" "$aCase" "$(stat $aCase 1)" "$(stat $aCase 23)" \
+    "$(awk -v k="$(stat $aCase 4)" 'BEGIN { print k / 1024 }')" \
+    "$(awk -v m="$aInput" -v w="$(stat $aCase 1)" 'BEGIN { print m / w }')"
+done
+
+ratio() { awk -v a="$(stat "$1" "$3")" -v b="$(stat "$2" "$3")" 'BEGIN { printf "%.2f", a / b }'; }
+check() { awk -v v="$1" -v t="$3" -v op="$2" 'BEGIN { ok = (op == "<=") ? v <= t : v >= t; print ok ? "ok" : "MISSED" }'; }
+echo "ratios (wall; cpu in brackets):"
+R=$(ratio peer ours 1); printf "  numpy peer / ours              %s (%s)  target >= 3: %s\n" "$R" "$(ratio peer ours 23)" "$(check "$R" ">=" 3)"
+R=$(ratio ours base 1); printf "  ours / read-and-write baseline %s (%s)  target <= 3: %s\n" "$R" "$(ratio ours base 23)" "$(check "$R" "<=" 3)"
+R=$(ratio geo ours 1); printf "  geocoded bilinear / ours       %s (%s)  target <= 2: %s\n" "$R" "$(ratio geo ours 23)" "$(check "$R" "<=" 2)"
+
+aStatus=0
+for aCase in ours geo quarter; do
+  aPeak=$(stat $aCase 4)
+  if ((aPeak >= PEAK_LIMIT_KB)); then
+    echo "bench_temporal: $aCase peak RSS ${aPeak} kB not below 64 MB" >&2
+    aStatus=1
+  fi
+done
+aGrowth=$(($(stat ours 4) - $(stat quarter 4)))
+printf "  peak RSS, full minus quarter of the lines: %d kB  target < %d: %s\n" "$aGrowth" "$FLAT_LIMIT_KB" \
+  "$(check "$aGrowth" "<=" "$FLAT_LIMIT_KB")"
+((aGrowth < FLAT_LIMIT_KB)) || aStatus=1
+exit $aStatus
