@@ -579,3 +579,22 @@ TEST_F(TemporalFeaturesTest, SimulatedGeocodedSeriesLandsCellForCell) {
         EXPECT_EQ(aResults[12 + f][r * 32 + c], aRef.mDate[f]) << theSuffixes[12 + f] << " " << r << "," << c;
     }
 }
+
+TEST_F(TemporalFeaturesTest, GeoTiffCopiesOfValueAndDateOutputs) {
+  std::vector<double> aRamp, aFlat(64, 3.0);
+  for (int i = 0; i < 64; ++i)
+    aRamp.push_back(1 + i);
+  image("a", 8, 8, aRamp, tlrxAcquisitionText(0));
+  image("b", 8, 8, aFlat, tlrxAcquisitionText(24));
+  STLRXTemporalParameters aParameters = parameters({"a", "b"}, false);
+  aParameters.mSettings = {{"mean", "OK"}, {"date_max", "OK"}, {"make_tiff", "OK"}, {"saturation_default", "0.5"}};
+  const STLRXRun aRun = run(aParameters);
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  for (const char *aName : {"out_mea.tif", "out_dateMax.tif"}) {
+    const std::string aTiff = tlrxReadFile(mDir.file(aName));
+    ASSERT_GT(aTiff.size(), 64u) << aName;
+    EXPECT_TRUE(aTiff.compare(0, 4, "II*\0", 4) == 0 || aTiff.compare(0, 4, "MM\0*", 4) == 0) << aName;
+  }
+  EXPECT_TRUE(tlrxFileExists(mDir.file("out_mea.tif.sml")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out_std.tif")));
+}
