@@ -159,9 +159,11 @@ TEST_F(GeocodedStackTest, NoDataInsideASupportFallsBackAndNoDataStaysNoData) {
   raster("holed", 6, 7, 6000, 1000, 20, [&](int l, int p) { return l == 2 && p == 3 ? theNull : aRamp(l, p); });
   raster("grid", 12, 14, 6000, 1000, 10, [](int, int) { return 0.0; });
   for (const char *aKernel : {"bilinear_interpolation", "4th_order_cc"}) {
-    CGeocodedImageStack aStack;
+    CGeocodedImageStack aStack, aByLine;
     open(aStack, {"holed"}, "grid", aKernel);
-    for (int r = 0; r < 12; ++r)
+    open(aByLine, {"holed"}, "grid", aKernel);
+    for (int r = 0; r < 12; ++r) {
+      const std::vector<double> aLine = line(aByLine, 0, r);
       for (int c = 0; c < 14; ++c) {
         const double u = inputPosition(r), w = inputPosition(c);
         const double ju = std::floor(u), jw = std::floor(w);
@@ -171,7 +173,9 @@ TEST_F(GeocodedStackTest, NoDataInsideASupportFallsBackAndNoDataStaysNoData) {
         if (aBilinear)
           aExpected = aRamp(u, w); // bilinear or a higher kernel: exact on the ramp
         EXPECT_NEAR(aStack.value(0, r, c), aExpected, 1e-9) << aKernel << " " << r << "," << c;
+        EXPECT_NEAR(aLine[c], aExpected, 1e-9) << aKernel << " line " << r << "," << c;
       }
+    }
   }
 }
 

@@ -33,7 +33,12 @@ struct CGeocodedImageStack::SInput {
   bool mRowInside = false;
   std::vector<SKernelTaps> mRowTaps; // per level
 
-  bool isNull(double theValue) const { return std::isnan(theValue) || fdfIsNull(theValue, mNull); }
+  double mNullLow = 0.0, mNullHigh = 0.0; // no-data interval (NaN bounds for a NaN null)
+
+  // No data, or not a number: nothing to interpolate from.
+  bool isNull(double theValue) const {
+    return theValue != theValue || (theValue >= mNullLow && theValue <= mNullHigh);
+  }
   const double *line(int32_t theLine) const {
     return &mRing[static_cast<size_t>(theLine % mSlots) * static_cast<size_t>(mGrid.mPixels)];
   }
@@ -114,6 +119,8 @@ bool CGeocodedImageStack::addInput(const std::string &theName) {
   }
   aIn.mFile.open_read(theName.c_str(), aHeader);
   aIn.mNull = aIn.mFile.getDummyVal();
+  aIn.mNullLow = aIn.mNull - CTLRX_RF_NULL_TOLERANCE;
+  aIn.mNullHigh = aIn.mNull + CTLRX_RF_NULL_TOLERANCE;
   // The header's size is the one the raster file checked against the data.
   aIn.mGrid.mLines = aIn.mFile.getNrOfLinesPerImage();
   aIn.mGrid.mPixels = aIn.mFile.getNrOfPixelsPerLine();
@@ -197,6 +204,39 @@ void CGeocodedImageStack::prepareLine(SInput &theInput, int32_t theLine) {
   }
 }
 
+namespace {
+
+// Sum of the weighted cells of a T x T support (theLines: its T lines,
+// from column theFirst), or false when a cell holds no data. T known at
+// compile time lets the loops unroll; clipping keeps the result within the
+// cells' range.
+template <int T, typename SInputType>
+bool fdfApplyTaps(const SInputType &theInput, const double *const *theLines, const double *theRowWeights,
+                  int32_t theFirst, const double *theWeights, bool theClip, double &theValue) {
+  double aSum = 0.0;
+  double aLow = std::numeric_limits<double>::infinity();
+  double aHigh = -aLow;
+  for (int a = 0; a < T; ++a) {
+    const double *aCells = theLines[a] + theFirst;
+    double aPartial = 0.0;
+    for (int b = 0; b < T; ++b) {
+      const double v = aCells[b];
+      if (theInput.isNull(v))
+        return false;
+      aPartial += theWeights[b] * v;
+      if (theClip) {
+        aLow = std::min(aLow, v);
+        aHigh = std::max(aHigh, v);
+      }
+    }
+    aSum += theRowWeights[a] * aPartial;
+  }
+  theValue = theClip ? std::min(std::max(aSum, aLow), aHigh) : aSum;
+  return true;
+}
+
+} // namespace
+
 bool CGeocodedImageStack::applyKernel(const SInput &theInput, int32_t theLevel, int32_t theColumn,
                                       double &theValue) const {
   const SKernelTaps &aRow = theInput.mRowTaps[theLevel];
@@ -207,24 +247,40 @@ bool CGeocodedImageStack::applyKernel(const SInput &theInput, int32_t theLevel, 
       aFirst + aStride > theInput.mGrid.mPixels)
     return false;
   const double *aWeights = &theInput.mColWeight[theLevel][static_cast<size_t>(aIndex) * aStride];
-  double aSum = 0.0;
-  double aLow = std::numeric_limits<double>::infinity();
-  double aHigh = -aLow;
-  for (int32_t a = 0; a < aRow.mCount; ++a) {
-    const double *aCells = theInput.line(aRow.mFirst + a) + aFirst;
-    double aPartial = 0.0;
-    for (int32_t b = 0; b < aStride; ++b) {
-      const double v = aCells[b];
-      if (theInput.isNull(v))
-        return false;
-      aPartial += aWeights[b] * v;
-      aLow = std::min(aLow, v);
-      aHigh = std::max(aHigh, v);
-    }
-    aSum += aRow.mWeight[a] * aPartial;
+  const double *aLines[CTLRX_KERNEL_MAX_TAPS];
+  for (int32_t a = 0; a < aRow.mCount; ++a)
+    aLines[a] = theInput.line(aRow.mFirst + a);
+  switch (aStride) {
+  case 2: return fdfApplyTaps<2>(theInput, aLines, aRow.mWeight, aFirst, aWeights, mClip, theValue);
+  case 4: return fdfApplyTaps<4>(theInput, aLines, aRow.mWeight, aFirst, aWeights, mClip, theValue);
+  case 6: return fdfApplyTaps<6>(theInput, aLines, aRow.mWeight, aFirst, aWeights, mClip, theValue);
+  default: return fdfApplyTaps<CTLRX_KERNEL_MAX_TAPS>(theInput, aLines, aRow.mWeight, aFirst, aWeights, mClip, theValue);
   }
-  theValue = mClip ? std::min(std::max(aSum, aLow), aHigh) : aSum;
-  return true;
+}
+
+template <int T>
+void CGeocodedImageStack::fillLine(const SInput &theInput, double *theDest) const {
+  const SKernelTaps &aRow = theInput.mRowTaps[0];
+  const bool aRowInside = aRow.mFirst >= 0 && aRow.mFirst + T <= theInput.mGrid.mLines;
+  const double *aLines[T];
+  for (int a = 0; a < T; ++a)
+    aLines[a] = aRowInside ? theInput.line(aRow.mFirst + a) : nullptr;
+  const int32_t *aFirsts = theInput.mColFirst[0].data();
+  const double *aWeights = theInput.mColWeight[0].data();
+  const int32_t aLastFirst = theInput.mGrid.mPixels - T;
+  for (int32_t c = theInput.mColBegin; c < theInput.mColEnd; ++c) {
+    const int32_t aIndex = c - theInput.mColBegin;
+    const int32_t aFirst = aFirsts[aIndex];
+    double aValue;
+    // The kernel itself where its support is inside and holds data; the
+    // fallbacks otherwise.
+    if (aRowInside && aFirst >= 0 && aFirst <= aLastFirst &&
+        fdfApplyTaps<T>(theInput, aLines, aRow.mWeight, aFirst, aWeights + static_cast<size_t>(aIndex) * T, mClip,
+                        aValue))
+      theDest[c] = aValue;
+    else
+      theDest[c] = evaluate(theInput, c);
+  }
 }
 
 double CGeocodedImageStack::applyFootprint(const SInput &theInput, int32_t theColumn) const {
@@ -286,7 +342,16 @@ void CGeocodedImageStack::getLine(int32_t theInput, int32_t theLine, double *the
   if (aIn.mLine != theLine)
     prepareLine(aIn, theLine);
   std::fill(theDest, theDest + aIn.mColBegin, aIn.mNull);
-  for (int32_t c = aIn.mColBegin; c < aIn.mColEnd; ++c)
-    theDest[c] = evaluate(aIn, c);
+  if (!aIn.mRowInside || fdfIsFootprintKernel(mKernel) || mChain.size() == 1) {
+    for (int32_t c = aIn.mColBegin; c < aIn.mColEnd; ++c)
+      theDest[c] = evaluate(aIn, c);
+  } else {
+    switch (aIn.mColStride[0]) {
+    case 2: fillLine<2>(aIn, theDest); break;
+    case 4: fillLine<4>(aIn, theDest); break;
+    case 6: fillLine<6>(aIn, theDest); break;
+    default: fillLine<CTLRX_KERNEL_MAX_TAPS>(aIn, theDest); break;
+    }
+  }
   std::fill(theDest + std::max(aIn.mColEnd, aIn.mColBegin), theDest + mGrid.mPixels, aIn.mNull);
 }

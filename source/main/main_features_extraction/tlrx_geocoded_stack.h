@@ -63,6 +63,10 @@ private:
   double evaluate(const SInput &theInput, int32_t theColumn) const;
   bool applyKernel(const SInput &theInput, int32_t theLevel, int32_t theColumn, double &theValue) const;
   double applyFootprint(const SInput &theInput, int32_t theColumn) const;
+  // The values of one line for a kernel of T x T cells, its fallbacks where
+  // it cannot be applied.
+  template <int T>
+  void fillLine(const SInput &theInput, double *theDest) const;
 
   SMapGrid mGrid;
   ETLRXKernel mKernel = ETLRXKernel::NEAREST;
