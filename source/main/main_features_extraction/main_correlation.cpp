@@ -8,6 +8,7 @@
 #include "quick_and_dirty.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_step.h"
 #include "tlrx_step_runner.h"
@@ -49,15 +50,10 @@ std::vector<std::string> fdfCorrelationArguments(const std::vector<std::string> 
 }
 
 int32_t fdfRunCorrelation(const char *theArguments) {
-  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
-  std::vector<const char *> aArgv;
-  for (const std::string &aToken : aTokens)
-    aArgv.push_back(aToken.c_str());
-  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Correlation", nullptr);
+  const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Correlation");
   if (aTokens.size() < CTLRX_CORR_TOKENS)
     return 456962;
-  for (int i = 0; i < CTLRX_CORR_TOKENS; ++i)
-    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  fdfTraceTokens(aTokens, CTLRX_CORR_TOKENS);
   CStepRunner aRunner(fdfCorrelationSteps(fdfIsSwitchOn(aTokens[CTLRX_CORR_CLOSE])), "INT");
   std::vector<int> aPlan = {CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP};
   if (fdfIsSwitchOn(aTokens[CTLRX_CORR_TIFF]))

@@ -5,6 +5,7 @@
 #include "ratio_images.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_features_common.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_step.h"
@@ -22,16 +23,11 @@ const std::vector<STLRXStep> theRatioSteps = {
 };
 
 int32_t fdfRunRatio(const char *theArguments) {
-  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
-  std::vector<const char *> aArgv;
-  for (const std::string &aToken : aTokens)
-    aArgv.push_back(aToken.c_str());
-  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Ratio", nullptr);
+  const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Ratio");
   CStepRunner aRunner(theRatioSteps, "RATIO");
   if (aTokens.size() < CTLRX_RATIO_TOKENS)
     return 456962;
-  for (int i = 0; i < CTLRX_RATIO_TOKENS; ++i)
-    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  fdfTraceTokens(aTokens, CTLRX_RATIO_TOKENS);
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_RATIO_TIFF]);
   const std::vector<std::string> aFiles = fdfReadLineList(aTokens[CTLRX_RATIO_LIST].c_str(), true);
   fdfTraceMessage("Number of FILES = %d\n", static_cast<int>(aFiles.size()));

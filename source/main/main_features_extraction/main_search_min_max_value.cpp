@@ -137,11 +137,7 @@ void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::ve
 }
 
 int32_t fdfRunMinMax(const char *theArguments) {
-  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
-  std::vector<const char *> aArgv;
-  for (const std::string &aToken : aTokens)
-    aArgv.push_back(aToken.c_str());
-  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Min and Max", nullptr);
+  const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Min and Max");
   if (aTokens.size() < CTLRX_MINMAX_TOKENS)
     TLRX_RAISE(456962, fdfJoin(aTokens).c_str());
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_MINMAX_TIFF]);

@@ -5,6 +5,7 @@
 #include "texture.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_step.h"
 #include "tlrx_step_runner.h"
@@ -26,16 +27,11 @@ const std::vector<STLRXStep> theTextureSteps = {
 };
 
 int32_t fdfRunTexture(const char *theArguments) {
-  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
-  std::vector<const char *> aArgv;
-  for (const std::string &aToken : aTokens)
-    aArgv.push_back(aToken.c_str());
-  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), "Texture", nullptr);
+  const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Texture");
   CStepRunner aRunner(theTextureSteps, "TEXTURE");
   if (aTokens.size() < CTLRX_TEXTURE_TOKENS)
     return 456962;
-  for (int i = 0; i < CTLRX_TEXTURE_TOKENS; ++i)
-    fdfTraceMessage(" argv[%d] = %s\n", i, aTokens[i].c_str());
+  fdfTraceTokens(aTokens, CTLRX_TEXTURE_TOKENS);
   std::vector<int> aPlan = {CTLRX_TEXTURE_STEP};
   if (fdfIsSwitchOn(aTokens[CTLRX_TEXTURE_TIFF]))
     aPlan.push_back(CTLRX_TEXTURE_TIFF_STEP);

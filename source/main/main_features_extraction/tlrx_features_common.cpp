@@ -8,6 +8,20 @@
 
 #include <cstring>
 
+std::vector<std::string> fdfStartArgumentCommand(const char *theArguments, const char *theTitle) {
+  const std::vector<std::string> aTokens = fdfReadArgumentFile(theArguments);
+  std::vector<const char *> aArgv;
+  for (const std::string &aToken : aTokens)
+    aArgv.push_back(aToken.c_str());
+  fdfStartProcess(aArgv.data(), static_cast<int>(aArgv.size()), theTitle, nullptr);
+  return aTokens;
+}
+
+void fdfTraceTokens(const std::vector<std::string> &theTokens, size_t theCount) {
+  for (size_t i = 0; i < theCount && i < theTokens.size(); ++i)
+    fdfTraceMessage(" argv[%d] = %s\n", static_cast<int>(i), theTokens[i].c_str());
+}
+
 void fdfLoadInputHeader(const std::string &theRaster, CDescription &theHeader) {
   const std::string aHeaderName = fdfHeaderFileName(theRaster);
   if (!fdfExistFile(fdfXmlHeaderFileName(aHeaderName).c_str()) && !fdfExistFile(aHeaderName.c_str())) {

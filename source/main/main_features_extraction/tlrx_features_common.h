@@ -11,6 +11,12 @@
 // Key of the acquisition date in "RasterInfo.OtherInfo".
 constexpr const char *CTLRX_ACQUISITION_TIME_KEY = "ACQUISITION TIME";
 
+// Start of the drivers that take an argument file: its tokens (the lines
+// after the first), echoed in the START banner of theTitle.
+std::vector<std::string> fdfStartArgumentCommand(const char *theArguments, const char *theTitle);
+// " argv[i] = token" for the first theCount tokens, to the trace.
+void fdfTraceTokens(const std::vector<std::string> &theTokens, size_t theCount);
+
 // Reads the standard header of raster theRaster (its name + "_hdr", the
 // ".sml" form first). A missing header traces "Error: missing parameter
 // file " and raises 261122 with the header name.
