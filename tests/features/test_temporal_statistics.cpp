@@ -338,3 +338,82 @@ TEST(TemporalSeries, WholeLinesMatchPixelByPixel) {
   EXPECT_EQ(aValues[CTLRX_TF_MEAN * P + 3], std::numeric_limits<float>::infinity());
   EXPECT_EQ(aUnused, std::vector<int32_t>(P, 123));
 }
+
+TEST(TemporalSeries, BlocksOfPixelsGiveThePixelByPixelResultsBitForBit) {
+  // Long lines mixing pixels the blocks take with every kind they leave to
+  // the pixel path: no data, NaN, samples equal to the output null value,
+  // same-day inputs, rejections near the rate limit, sums beyond the
+  // rescaling limit, infinities.
+  std::mt19937 aRandom(99);
+  std::uniform_int_distribution<int> aKind(0, 99);
+  std::exponential_distribution<double> aSpeckle(0.2);
+  const int P = 700;
+  struct SCase {
+    std::vector<long> mDays;
+    bool mNormalize, mDb;
+    double mRatioTime, mNull;
+  } aCases[] = {{{0, 12, 24, 36, 48, 60, 72, 84}, false, false, 1e100, -1},
+                {{0, 12, 24, 36, 48, 60, 72, 84}, true, true, 1e100, 5},
+                {{0, 5, 5, 9, 30}, true, false, 0.3, 0},
+                {{3, 4}, false, true, 2.0, theNaN},
+                {{0, 7, 14, 21, 28, 35, 42, 49, 56, 63, 70, 77, 84, 91, 98, 105, 112, 119, 126, 133},
+                 false, false, 1e100, -1}};
+  for (const SCase &aCase : aCases) {
+    const size_t n = aCase.mDays.size();
+    STemporalSettings aSettings;
+    aSettings.mNull = aCase.mNull;
+    aSettings.mNormalize = aCase.mNormalize;
+    aSettings.mDecibels = aCase.mDb;
+    aSettings.mRatioTimeThreshold = aCase.mRatioTime;
+    for (bool &aWanted : aSettings.mWanted)
+      aWanted = true;
+    std::vector<double> aNulls(n, -1.0);
+    aNulls[n - 1] = 0.0;
+    std::vector<double> aRows(n * P);
+    for (size_t i = 0; i < n; ++i)
+      for (int x = 0; x < P; ++x) {
+        const int k = aKind(aRandom);
+        double v = aSpeckle(aRandom);
+        if (k == 0)
+          v = aNulls[i];
+        else if (k == 1)
+          v = theNaN;
+        else if (k == 2)
+          v = 5.0;
+        else if (k == 3)
+          v = 3e7;
+        else if (k == 4)
+          v = std::numeric_limits<double>::infinity();
+        else if (k == 5)
+          v = -v;
+        else if (k < 30 && x < 100)
+          v = 0.0;
+        aRows[i * P + x] = v;
+      }
+    CTemporalSeries aSeries(aSettings, aCase.mDays, aNulls);
+    std::vector<float> aValues(12 * P);
+    std::vector<int32_t> aDates(2 * P);
+    STemporalLines aLines;
+    for (int f = 0; f < 12; ++f)
+      aLines.mValue[f] = &aValues[f * P];
+    aLines.mDate[0] = &aDates[0];
+    aLines.mDate[1] = &aDates[P];
+    aSeries.line(aRows.data(), P, aLines);
+    for (int x = 0; x < P; ++x) {
+      double aPixel[CTLRX_TF_VALUE_COUNT];
+      int32_t aPixelDates[2];
+      aSeries.select(aRows.data() + x, P);
+      aSeries.features(aPixel, aPixelDates);
+      for (int f = 0; f < 12; ++f) {
+        const double aExpected = aPixel[f] > 3.4028234663852886e+38    ? std::numeric_limits<double>::infinity()
+                                 : aPixel[f] < -3.4028234663852886e+38 ? -std::numeric_limits<double>::infinity()
+                                                                       : static_cast<float>(aPixel[f]);
+        const float aGot = aValues[f * P + x];
+        EXPECT_TRUE((std::isnan(aExpected) && std::isnan(aGot)) || aGot == aExpected)
+            << "inputs " << n << " feature " << f << " pixel " << x << ": " << aGot << " vs " << aExpected;
+      }
+      EXPECT_EQ(aDates[x], aPixelDates[0]) << n << " " << x;
+      EXPECT_EQ(aDates[P + x], aPixelDates[1]) << n << " " << x;
+    }
+  }
+}

@@ -128,8 +128,27 @@ public:
   void line(const double *theRows, int32_t thePixels, const STemporalLines &theLines);
 
 private:
+  // Runs of pixels are computed together, as loops over the pixels that
+  // the compiler vectorises, for the pixels that surely keep every sample,
+  // none equal to the output null value, with sums that cannot reach the
+  // rescaling limit (nearly all of them): the same operations in the same
+  // order as select() and features(), so the results are identical. The
+  // others ("in doubt") go through select() and features().
+  struct SBlock {
+    std::vector<double> mValues;   // value j of block pixel m at j * size + m
+    std::vector<double> mSorted;   // the same, through the sorting network
+    std::vector<double> mState;    // running quantities, one row each
+    std::vector<double> mFeatures; // feature f of block pixel m at f * size + m
+    std::vector<int32_t> mDates;   // date d of block pixel m at d * size + m
+    std::vector<double> mDoubt;    // non-zero: block pixel m goes one by one
+    std::vector<int32_t> mNetwork; // compare-exchanges for all inputs: low, high, ...
+    int32_t mCount = 0;
+  };
+
   void computeDates(int32_t theDates[2]) const;
   double median();
+  void gatherBlock(const double *theRows, size_t theStride);
+  void computeBlock();
 
   // What the selection needs of every input, in temporal order.
   struct SInputTerms {
@@ -148,4 +167,5 @@ private:
   int32_t mKept = 0;
   double mLargest = 0.0; // of the kept values
   CTemporalAccumulator mAccumulator;
+  SBlock mBlock;
 };
