@@ -2,10 +2,10 @@
 
 #include <algorithm>
 #include <array>
-#include <utility>
 #include <cfloat>
 #include <cmath>
 #include <limits>
+#include <utility>
 
 namespace {
 
@@ -384,6 +384,13 @@ void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
     aDoubt[m] += aInputs * std::max(aLargest[m], aLargest[m] * aLargest[m]) <= CTLRX_RESCALE_LIMIT ? 0.0 : 1.0;
     aDoubt[m] += aSmallest[m] >= CTLRX_BLOCK_SMALLEST ? 0.0 : 1.0;
   }
+  // The block computes the pixels in doubt too, on a harmless series of
+  // ones, so that every result of the block lies within the float range.
+  for (int32_t j = 0; j < n; ++j) {
+    double *__restrict aNow = mBlock.mValues.data() + static_cast<size_t>(j) * B;
+    for (int32_t m = 0; m < M; ++m)
+      aNow[m] = aDoubt[m] > 0.0 ? 1.0 : aNow[m];
+  }
 }
 
 void CTemporalSeries::computeBlock() {
@@ -568,14 +575,13 @@ void CTemporalSeries::line(const double *theRows, int32_t thePixels, const STemp
     mBlock.mCount = M;
     gatherBlock(theRows + x0, aStride);
     computeBlock();
-    // Within the float range for the pixels not in doubt (gatherBlock), so
-    // a plain conversion; the others, 0 for now, are overwritten below.
-    const double *__restrict aDoubt = mBlock.mDoubt.data();
+    // Every block result lies within the float range (gatherBlock): a plain
+    // conversion. The pixels in doubt are overwritten below.
     for (int j = 0; j < aWritten; ++j) {
       const double *__restrict aBlock = &mBlock.mFeatures[static_cast<size_t>(aFeatures[j]) * CTLRX_BLOCK_SIZE];
       float *__restrict aLine = aValueLines[j] + x0;
       for (int32_t m = 0; m < M; ++m)
-        aLine[m] = static_cast<float>(aDoubt[m] > 0.0 ? 0.0 : aBlock[m]);
+        aLine[m] = static_cast<float>(aBlock[m]);
     }
     for (int d = 0; d < 2; ++d)
       if (theLines.mDate[d] != nullptr)
