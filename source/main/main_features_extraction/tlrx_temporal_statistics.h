@@ -147,8 +147,11 @@ private:
 
   void computeDates(int32_t theDates[2]) const;
   double median();
+  // Block steps (tlrx_temporal_block.cpp): the pixels' values and whether
+  // each is in doubt; the features of the block; the rows of SBlock::mState.
   void gatherBlock(const double *theRows, size_t theStride);
   void computeBlock();
+  static int32_t blockStateRows();
 
   // What the selection needs of every input, in temporal order.
   struct SInputTerms {
