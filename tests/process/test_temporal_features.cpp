@@ -598,3 +598,14 @@ TEST_F(TemporalFeaturesTest, GeoTiffCopiesOfValueAndDateOutputs) {
   EXPECT_TRUE(tlrxFileExists(mDir.file("out_mea.tif.sml")));
   EXPECT_FALSE(tlrxFileExists(mDir.file("out_std.tif")));
 }
+
+TEST_F(TemporalFeaturesTest, OperatorInterruptionStopsWithItsCodeAndNoResult) {
+  image("a", 4, 4, std::vector<double>(16, 2.0), tlrxAcquisitionText(0));
+  image("b", 4, 4, std::vector<double>(16, 3.0), tlrxAcquisitionText(12));
+  tlrxWriteFile(mDir.file("param.xml"), tlrxTemporalParameterText(parameters({"a", "b"})));
+  tlrxWriteFile(working(), "101\nhost\n");
+  const STLRXRun aRun = tlrxRunMain("main_temporal_feature_extraction#" + mDir.file("param.xml"), mDir.path());
+  EXPECT_EQ(aRun.mExitStatus, 6) << aRun.mOutput;
+  EXPECT_NE(error().find("[EC :326400]"), std::string::npos) << error();
+  expectNothingWritten();
+}
