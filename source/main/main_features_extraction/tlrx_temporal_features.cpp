@@ -19,6 +19,7 @@
 #include "tlrx_standard_header.h"
 #include "tlrx_temporal_grid.h"
 
+#include <algorithm>
 #include <cmath>
 #include <cstdio>
 #include <memory>
@@ -44,7 +45,6 @@ const STemporalOutput theOutputs[CTLRX_TF_COUNT] = {
 
 constexpr const char *CTLRX_TF_PROCESS = "Multi Temporal Features Extraction";
 constexpr const char *CTLRX_TF_TIFF_PROCESS = "Tiff generation ... ";
-constexpr int32_t CTLRX_TF_DATE_NULL = CTLRX_TF_NO_DATE;
 
 // The inputs' values along one output line: n rows of P values.
 class CInputRows {
@@ -155,7 +155,7 @@ void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, co
   aHeader = theGridHeader;
   if (theOutputs[theOutput.mFeature].mDate) {
     fdfSetHeaderText(aHeader, "RasterInfo.CellType", "INT");
-    fdfSetHeaderNumber(aHeader, "RasterInfo.NullCellValue", CTLRX_TF_DATE_NULL);
+    fdfSetHeaderNumber(aHeader, "RasterInfo.NullCellValue", CTLRX_TF_NO_DATE);
     fdfStampOtherInfo(aHeader, CTLRX_TF_REFERENCE_KEY, theReference.c_str());
   }
   fdfCheckCreatable(theOutput.mName);
@@ -196,6 +196,55 @@ double fdfMaxRatioTimeThreshold(double theMaxIncrementThrDb, double theMaxDecrem
   return fdfMaxRatioThreshold(theMaxIncrementThrDb) / theMaxDecrementThrTime;
 }
 
+namespace {
+
+// Opens every requested output, in the order of the output table, with its
+// header written beside it.
+std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest &theRequest,
+                                                         const CDescription &theGridHeader, int32_t thePixels,
+                                                         const std::string &theReference, CPendingFiles &thePending) {
+  std::vector<std::unique_ptr<SOpenOutput>> aOutputs;
+  for (int f = 0; f < CTLRX_TF_COUNT; ++f) {
+    if (!theRequest.mOutputs[f])
+      continue;
+    auto aOutput = std::make_unique<SOpenOutput>();
+    aOutput->mFeature = f;
+    aOutput->mName = theRequest.mRoot + theOutputs[f].mSuffix;
+    if (theOutputs[f].mDate)
+      aOutput->mDates.assign(thePixels, CTLRX_TF_NO_DATE);
+    else
+      aOutput->mValues.assign(thePixels, 0.0f);
+    fdfOpenOutput(*aOutput, theGridHeader, theReference, thePending);
+    aOutputs.push_back(std::move(aOutput));
+  }
+  return aOutputs;
+}
+
+// The pass over the output lines: inputs read (or resampled), features
+// computed into the outputs' line buffers, lines written.
+void fdfWriteFeatureLines(CInputRows &theSource, CTemporalSeries &theSeries, int32_t theLines, int32_t thePixels,
+                          size_t theInputs, std::vector<std::unique_ptr<SOpenOutput>> &theOpen) {
+  STemporalLines aOutputLines;
+  for (auto &aOutput : theOpen) {
+    if (theOutputs[aOutput->mFeature].mDate)
+      aOutputLines.mDate[aOutput->mFeature - CTLRX_TF_DATE_MAX] = aOutput->mDates.data();
+    else
+      aOutputLines.mValue[aOutput->mFeature] = aOutput->mValues.data();
+  }
+  std::vector<double> aRows(theInputs * static_cast<size_t>(thePixels));
+  CLineProgress aProgress(100.0);
+  for (int32_t l = 0; l < theLines; ++l) {
+    aProgress.update(l, theLines);
+    theSource.read(l, aRows.data());
+    theSeries.line(aRows.data(), thePixels, aOutputLines);
+    for (auto &aOutput : theOpen)
+      aOutput->mFile.putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
+                                                        : static_cast<const void *>(aOutput->mDates.data()));
+  }
+}
+
+} // namespace
+
 int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   fdfTraceMessage("\n\nMulti Temporal Features Extraction\n");
   fdfSetProcessName(CTLRX_TF_PROCESS);
@@ -213,6 +262,7 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   aSettings.mDecibels = theRequest.mDecibels;
   aSettings.mRatioTimeThreshold =
       fdfMaxRatioTimeThreshold(theRequest.mMaxIncrementThrDb, theRequest.mMaxDecrementThrTime);
+  std::copy(theRequest.mOutputs, theRequest.mOutputs + CTLRX_TF_COUNT, aSettings.mWanted);
   fdfTraceMessage("\n\t MaxIncrementThrDb = %f\t MaxRatioThr = %g\n\t MaxIncrementThrTime = %f\n\t MaxRatioTimeThr = %g\n",
                   theRequest.mMaxIncrementThrDb, fdfMaxRatioThreshold(theRequest.mMaxIncrementThrDb),
                   theRequest.mMaxDecrementThrTime, aSettings.mRatioTimeThreshold);
@@ -235,41 +285,10 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   fdfRemoveHeaderFiles(aRoot);
   aPending.forgetAll();
 
-  std::vector<std::unique_ptr<SOpenOutput>> aOutputs;
-  for (int f = 0; f < CTLRX_TF_COUNT; ++f) {
-    aSettings.mWanted[f] = theRequest.mOutputs[f];
-    if (!theRequest.mOutputs[f])
-      continue;
-    auto aOutput = std::make_unique<SOpenOutput>();
-    aOutput->mFeature = f;
-    aOutput->mName = aRoot + theOutputs[f].mSuffix;
-    if (theOutputs[f].mDate)
-      aOutput->mDates.assign(aPixels, CTLRX_TF_DATE_NULL);
-    else
-      aOutput->mValues.assign(aPixels, 0.0f);
-    fdfOpenOutput(*aOutput, aGridHeader, aReference, aPending);
-    aOutputs.push_back(std::move(aOutput));
-  }
-
-  const size_t aInputs = aNames.size();
-  std::vector<double> aRows(aInputs * static_cast<size_t>(aPixels));
+  std::vector<std::unique_ptr<SOpenOutput>> aOutputs =
+      fdfOpenOutputs(theRequest, aGridHeader, aPixels, aReference, aPending);
   CTemporalSeries aSeries(aSettings, aDays, aSource->nulls());
-  STemporalLines aOutputLines;
-  for (auto &aOutput : aOutputs) {
-    if (theOutputs[aOutput->mFeature].mDate)
-      aOutputLines.mDate[aOutput->mFeature - CTLRX_TF_DATE_MAX] = aOutput->mDates.data();
-    else
-      aOutputLines.mValue[aOutput->mFeature] = aOutput->mValues.data();
-  }
-  CLineProgress aProgress(100.0);
-  for (int32_t l = 0; l < aLines; ++l) {
-    aProgress.update(l, aLines);
-    aSource->read(l, aRows.data());
-    aSeries.line(aRows.data(), aPixels, aOutputLines);
-    for (auto &aOutput : aOutputs)
-      aOutput->mFile.putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
-                                                        : static_cast<const void *>(aOutput->mDates.data()));
-  }
+  fdfWriteFeatureLines(*aSource, aSeries, aLines, aPixels, aNames.size(), aOutputs);
   aSource.reset();
 
   for (auto &aOutput : aOutputs)
