@@ -23,7 +23,7 @@ enum EBlockState { CTLRX_BS_SUM, CTLRX_BS_SQUARES, CTLRX_BS_BEST, CTLRX_BS_BEST_
 
 int32_t CTemporalSeries::blockStateRows() { return CTLRX_BS_ROWS; }
 
-void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
+TLRX_VECTOR_CLONES void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
   const int32_t n = static_cast<int32_t>(mInputs.size());
   const int32_t M = mBlock.mCount;
   constexpr int32_t B = CTLRX_BLOCK_SIZE;
@@ -45,7 +45,7 @@ void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
       aNow[m] = a;
       const bool aNoData = (r != r) | ((r >= aLow) & (r <= aHigh));
       const bool aNullValued = (a >= aNullLow) & (a <= aNullHigh);
-      aDoubt[m] += aNoData | aNullValued ? 1.0 : 0.0;
+      aDoubt[m] += (aNoData | aNullValued) ? 1.0 : 0.0;
       aLargest[m] = std::max(aLargest[m], a);
       aSmallest[m] = std::min(aSmallest[m], a);
     }
@@ -53,7 +53,7 @@ void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
       continue;
     // Kept after the previous sample, surely: far below the rate limit (the
     // selection decides the cases near it).
-      const double aPerDay = mSettings.mRatioTimeThreshold * (mInputs[j].mDay - mInputs[j - 1].mDay);
+    const double aPerDay = mSettings.mRatioTimeThreshold * (mInputs[j].mDay - mInputs[j - 1].mDay);
     const double *__restrict aBefore = aNow - B;
     if (!(aPerDay >= DBL_MIN && aPerDay <= DBL_MAX)) {
       std::fill(aDoubt, aDoubt + M, 1.0);
@@ -84,7 +84,7 @@ void CTemporalSeries::gatherBlock(const double *theRows, size_t theStride) {
   }
 }
 
-void CTemporalSeries::computeBlock() {
+TLRX_VECTOR_CLONES void CTemporalSeries::computeBlock() {
   const int32_t n = static_cast<int32_t>(mInputs.size());
   const int32_t M = mBlock.mCount;
   constexpr int32_t B = CTLRX_BLOCK_SIZE;
