@@ -28,6 +28,9 @@ struct CGeocodedImageStack::SInput {
   int32_t mSlots = 1;
   std::vector<double> mRing;
   std::vector<int32_t> mSlotLine;
+  // Per slot, the no-data cells before each position (mPixels + 1 counts),
+  // so that a support's cells are known free of no data in two reads.
+  std::vector<int32_t> mNullsBefore;
   // Current output line.
   int32_t mLine = -1;
   bool mRowInside = false;
@@ -38,6 +41,12 @@ struct CGeocodedImageStack::SInput {
   // No data, or not a number: nothing to interpolate from.
   bool isNull(double theValue) const {
     return theValue != theValue || (theValue >= mNullLow && theValue <= mNullHigh);
+  }
+  int32_t *nullsBefore(int32_t theLine) {
+    return &mNullsBefore[static_cast<size_t>(theLine % mSlots) * (static_cast<size_t>(mGrid.mPixels) + 1)];
+  }
+  const int32_t *nullsBefore(int32_t theLine) const {
+    return &mNullsBefore[static_cast<size_t>(theLine % mSlots) * (static_cast<size_t>(mGrid.mPixels) + 1)];
   }
   const double *line(int32_t theLine) const {
     return &mRing[static_cast<size_t>(theLine % mSlots) * static_cast<size_t>(mGrid.mPixels)];
@@ -170,6 +179,7 @@ bool CGeocodedImageStack::addInput(const std::string &theName) {
   }
   aIn.mRing.assign(static_cast<size_t>(aIn.mSlots) * aIn.mGrid.mPixels, aIn.mNull);
   aIn.mSlotLine.assign(aIn.mSlots, -1);
+  aIn.mNullsBefore.assign(static_cast<size_t>(aIn.mSlots) * (aIn.mGrid.mPixels + 1), 0);
   mNulls.push_back(aIn.mNull);
   fdfTraceMessage("Geocoded stack: %s  %d x %d  kernel %s  columns %d..%d\n", theName.c_str(), aIn.mGrid.mLines,
                   aIn.mGrid.mPixels, fdfKernelName(mKernel), aIn.mColBegin, aIn.mColEnd - 1);
@@ -199,8 +209,13 @@ void CGeocodedImageStack::prepareLine(SInput &theInput, int32_t theLine) {
     const int32_t aSlot = j % theInput.mSlots;
     if (theInput.mSlotLine[aSlot] == j)
       continue;
-    theInput.mFile.getLine(&theInput.mRing[static_cast<size_t>(aSlot) * theInput.mGrid.mPixels], j);
+    double *aCells = &theInput.mRing[static_cast<size_t>(aSlot) * theInput.mGrid.mPixels];
+    theInput.mFile.getLine(aCells, j);
     theInput.mSlotLine[aSlot] = j;
+    int32_t *aBefore = theInput.nullsBefore(j);
+    aBefore[0] = 0;
+    for (int32_t p = 0; p < theInput.mGrid.mPixels; ++p)
+      aBefore[p + 1] = aBefore[p] + (theInput.isNull(aCells[p]) ? 1 : 0);
   }
 }
 
@@ -263,20 +278,39 @@ void CGeocodedImageStack::fillLine(const SInput &theInput, double *theDest) cons
   const SKernelTaps &aRow = theInput.mRowTaps[0];
   const bool aRowInside = aRow.mFirst >= 0 && aRow.mFirst + T <= theInput.mGrid.mLines;
   const double *aLines[T];
-  for (int a = 0; a < T; ++a)
+  const int32_t *aNulls[T];
+  for (int a = 0; a < T; ++a) {
     aLines[a] = aRowInside ? theInput.line(aRow.mFirst + a) : nullptr;
+    aNulls[a] = aRowInside ? theInput.nullsBefore(aRow.mFirst + a) : nullptr;
+  }
   const int32_t *aFirsts = theInput.mColFirst[0].data();
   const double *aWeights = theInput.mColWeight[0].data();
   const int32_t aLastFirst = theInput.mGrid.mPixels - T;
   for (int32_t c = theInput.mColBegin; c < theInput.mColEnd; ++c) {
     const int32_t aIndex = c - theInput.mColBegin;
     const int32_t aFirst = aFirsts[aIndex];
+    const double *aColumnWeights = aWeights + static_cast<size_t>(aIndex) * T;
+    // The kernel itself where its support is inside and free of no data
+    // (the same sums as fdfApplyTaps, without its tests); the fallbacks
+    // otherwise.
+    bool aDirect = aRowInside && !mClip && aFirst >= 0 && aFirst <= aLastFirst;
+    for (int a = 0; a < T && aDirect; ++a)
+      aDirect = aNulls[a][aFirst + T] == aNulls[a][aFirst];
+    if (aDirect) {
+      double aSum = 0.0;
+      for (int a = 0; a < T; ++a) {
+        const double *aCells = aLines[a] + aFirst;
+        double aPartial = 0.0;
+        for (int b = 0; b < T; ++b)
+          aPartial += aColumnWeights[b] * aCells[b];
+        aSum += aRow.mWeight[a] * aPartial;
+      }
+      theDest[c] = aSum;
+      continue;
+    }
     double aValue;
-    // The kernel itself where its support is inside and holds data; the
-    // fallbacks otherwise.
     if (aRowInside && aFirst >= 0 && aFirst <= aLastFirst &&
-        fdfApplyTaps<T>(theInput, aLines, aRow.mWeight, aFirst, aWeights + static_cast<size_t>(aIndex) * T, mClip,
-                        aValue))
+        fdfApplyTaps<T>(theInput, aLines, aRow.mWeight, aFirst, aColumnWeights, mClip, aValue))
       theDest[c] = aValue;
     else
       theDest[c] = evaluate(theInput, c);
