@@ -35,14 +35,39 @@ echo "== simulating a 5-date UTM series (a field brightens from date 3, a no-dat
 "$sim" series --out "$out/amp" --count 1 --units AMPLITUDE --lines 300 --pixels 320 --null -9999 \
   --nodata-box 0,0,40,40 --seed 7 >/dev/null
 
+"$sim" series --out "$out/g" --count 6 --lines 400 --pixels 500 --looks 4 --utm 32N --origin 600000,5100000 \
+  --spacing 20 --change 100,150,80,120,4,6 --trend 250,300,100,150,1.5 --nodata-box 300,0,60,80 --null -9999 \
+  --image-origin 3:600010,5099990 --image-spacing 5:40 --image-size 5:200,250 --seed 7 >/dev/null
+# The temporal command reads an XML parameter file.
+{
+  echo '<?xml version="1.0" ?>'
+  echo '<HEADER_INFO>'
+  echo '   <MAIN_CMD>'
+  echo '      <input_file_list>'
+  echo '         <VectorString NumberOfElements = "6">'
+  for k in 1 2 3 4 5 6; do echo "            <ValueString ID = \"$((k - 1))\">$out/g_0$k</ValueString>"; done
+  echo '         </VectorString>'
+  echo '      </input_file_list>'
+  echo "      <out_root_file_name>$out/mt</out_root_file_name>"
+  for key in mean std median max_less_min_sup date_max date_min_before_max out_db make_tiff; do
+    echo "      <$key>OK</$key>"
+  done
+  echo '      <interp_type>bilinear_interpolation</interp_type>'
+  echo '      <saturation_default>0.33</saturation_default>'
+  echo '      <TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>'
+  echo '   </MAIN_CMD>'
+  echo '</HEADER_INFO>'
+} >"$out/temporal.xml"
+
 run "main_principal_component_analysis#x"
 run "main_min_and_max#$(args minmax.txt "$out/s_list.txt" "$out/stack" 2 3 4 5 6 OK 0.3)"
 run "main_ratio#$(args ratio.txt "$out/s_list.txt" "$out/change" 1 unused OK 0.3)"
 run "main_texture#$(args texture.txt "$out/amp_01" "$out/amp_tex" 0 7 7 x OK 0)"
+run "main_temporal_feature_extraction#$out/temporal.xml"
 run "main_correlation#$(args correlation.txt "$out/p_1" "$out/p_2" "$out/p_coh" -9999 11 11 11 11 OK OK 0)"
 
 echo "== outputs in $out"
-ls -l "$out" | grep -v -e ' s_0' -e ' p_' || true
+ls -l "$out" | grep -v -e ' s_0' -e ' p_' -e ' g_0' || true
 echo "-- date classes of the maximum (ENVI header read by GDAL):"
 gdalinfo "$out/stack_max_date" 2>/dev/null | sed -n '/Categories/,/Color Table/p' | head -8 || true
 echo "-- mean texture of single-look amplitude speckle (theory 0.5227) and the coherence across the ramp:"

@@ -7,7 +7,8 @@ build=${1:-$top/build}
 shift || true
 
 packages=(cmake g++ make pkg-config libexpat1-dev libtiff-dev libgeotiff-dev libfftw3-dev libgtest-dev
-          libbenchmark-dev gdal-bin geotiff-bin libtiff-tools libxml2-utils clang libclang-rt-14-dev)
+          libbenchmark-dev gdal-bin geotiff-bin libtiff-tools libxml2-utils clang libclang-rt-14-dev
+          python3-numpy python3-scipy time)
 missing=()
 for p in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q "install ok installed" || missing+=("$p")
