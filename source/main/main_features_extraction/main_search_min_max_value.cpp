@@ -12,6 +12,8 @@
 #include "tlrx_geotiff_step.h"
 #include "tlrx_raster_file.h"
 
+#include <algorithm>
+#include <cmath>
 #include <cstdlib>
 #include <memory>
 
@@ -104,35 +106,56 @@ struct SMinMax {
   float *mMin, *mMax, *mMinDate, *mMaxDate;
 };
 
-void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
-                   int32_t thePixels, float theNull, const SMinMax &theOut) {
-  const size_t aInputs = theRows.size();
+// Validity of one input line against its null value (same rule as fdfIsNull).
+void fdfValidCells(const float *__restrict theRow, double theNull, int32_t thePixels, uint8_t *__restrict theValid) {
+  constexpr double aTolerance = 1.1754943508222875e-38;
+  if (std::isnan(theNull)) {
+    for (int32_t x = 0; x < thePixels; ++x)
+      theValid[x] &= theRow[x] == theRow[x];
+    return;
+  }
   for (int32_t x = 0; x < thePixels; ++x) {
-    double aMin = 0, aMax = 0;
-    int aMinDate = 0, aMaxDate = 0;
-    bool aNoData = false;
-    for (size_t i = 0; i < aInputs && !aNoData; ++i) {
-      const double aValue = theRows[i][x];
-      if (fdfIsNull(aValue, theNulls[i])) {
-        aNoData = true;
-      } else if (i == 0) {
-        aMin = aMax = aValue;
-        aMinDate = aMaxDate = 1;
-      } else {
-        if (aValue < aMin) {
-          aMin = aValue;
-          aMinDate = static_cast<int>(i) + 1;
-        }
-        if (aValue > aMax) {
-          aMax = aValue;
-          aMaxDate = static_cast<int>(i) + 1;
-        }
-      }
+    const double aValue = theRow[x];
+    theValid[x] &= !(aValue >= theNull - aTolerance && aValue <= theNull + aTolerance);
+  }
+}
+
+// Input by input over the whole line, so each loop vectorises; a pixel that
+// is no data in any input ends as theNull with date 0, as if the visit had
+// stopped at that input. Strict comparisons keep the earlier date on ties.
+void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
+                   int32_t thePixels, float theNull, std::vector<uint8_t> &theValid, const SMinMax &theOut) {
+  std::fill(theValid.begin(), theValid.end(), 1);
+  const float *aFirst = theRows[0].data();
+  for (int32_t x = 0; x < thePixels; ++x) {
+    theOut.mMin[x] = theOut.mMax[x] = aFirst[x];
+    theOut.mMinDate[x] = theOut.mMaxDate[x] = 1.0f;
+  }
+  fdfValidCells(aFirst, theNulls[0], thePixels, theValid.data());
+  for (size_t i = 1; i < theRows.size(); ++i) {
+    const float *__restrict aRow = theRows[i].data();
+    float *__restrict aMin = theOut.mMin;
+    float *__restrict aMax = theOut.mMax;
+    float *__restrict aMinDate = theOut.mMinDate;
+    float *__restrict aMaxDate = theOut.mMaxDate;
+    const float aDate = static_cast<float>(i + 1);
+    for (int32_t x = 0; x < thePixels; ++x) {
+      const float aValue = aRow[x];
+      const bool aLower = aValue < aMin[x];
+      const bool aHigher = aValue > aMax[x];
+      aMin[x] = aLower ? aValue : aMin[x];
+      aMinDate[x] = aLower ? aDate : aMinDate[x];
+      aMax[x] = aHigher ? aValue : aMax[x];
+      aMaxDate[x] = aHigher ? aDate : aMaxDate[x];
     }
-    theOut.mMin[x] = aNoData ? theNull : static_cast<float>(aMin);
-    theOut.mMax[x] = aNoData ? theNull : static_cast<float>(aMax);
-    theOut.mMinDate[x] = aNoData ? 0.0f : static_cast<float>(aMinDate);
-    theOut.mMaxDate[x] = aNoData ? 0.0f : static_cast<float>(aMaxDate);
+    fdfValidCells(aRow, theNulls[i], thePixels, theValid.data());
+  }
+  for (int32_t x = 0; x < thePixels; ++x) {
+    const bool aValid = theValid[x] != 0;
+    theOut.mMin[x] = aValid ? theOut.mMin[x] : theNull;
+    theOut.mMax[x] = aValid ? theOut.mMax[x] : theNull;
+    theOut.mMinDate[x] = aValid ? theOut.mMinDate[x] : 0.0f;
+    theOut.mMaxDate[x] = aValid ? theOut.mMaxDate[x] : 0.0f;
   }
 }
 
@@ -189,12 +212,13 @@ int32_t fdfRunMinMax(const char *theArguments) {
   std::vector<float> aResultRows(4 * static_cast<size_t>(aPixels));
   const SMinMax aLine = {&aResultRows[0], &aResultRows[aPixels], &aResultRows[2 * static_cast<size_t>(aPixels)],
                          &aResultRows[3 * static_cast<size_t>(aPixels)]};
+  std::vector<uint8_t> aValid(aPixels);
   CLineProgress aProgress(50.0);
   for (int32_t l = 0; l < aLines; ++l) {
     aProgress.update(l, aLines);
     for (int32_t i = 0; i < aInputs; ++i)
       aIn[i]->getLine(aRows[i].data(), l);
-    fdfMinMaxLine(aRows, aNulls, aPixels, aNull, aLine);
+    fdfMinMaxLine(aRows, aNulls, aPixels, aNull, aValid, aLine);
     for (int k = 0; k < 4; ++k)
       aOut[k].putLine(l, &aResultRows[k * static_cast<size_t>(aPixels)]);
   }
