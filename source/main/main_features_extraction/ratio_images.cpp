@@ -13,6 +13,7 @@
 #include "tlrx_window_step.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
@@ -34,13 +35,14 @@ const char *const theHistogramLabels[CTLRX_RATIO_HISTOGRAM_CLASSES] = {
     "Less than 1 ",    "Less than 10 ",    "Less than 100 ",    "Less than 1000 ", "Less than 10000 ",
     "Less than 100000 ", "Less than 1000000 ", "Other "};
 
-std::vector<float> fdfFloatLimits() {
-  std::vector<float> aLimits;
-  for (double aLimit : theHistogramLimits) {
-    float aFloat = static_cast<float>(aLimit);
-    if (static_cast<double>(aFloat) < aLimit)
-      aFloat = std::nextafter(aFloat, std::numeric_limits<float>::infinity());
-    aLimits.push_back(aFloat);
+using CFloatLimits = std::array<float, CTLRX_RATIO_COUNTED_CLASSES - 1>;
+
+CFloatLimits fdfFloatLimits() {
+  CFloatLimits aLimits;
+  for (size_t k = 0; k < aLimits.size(); ++k) {
+    aLimits[k] = static_cast<float>(theHistogramLimits[k]);
+    if (static_cast<double>(aLimits[k]) < theHistogramLimits[k])
+      aLimits[k] = std::nextafter(aLimits[k], std::numeric_limits<float>::infinity());
   }
   return aLimits;
 }
@@ -67,8 +69,9 @@ void fdfRatioLine(const double *theA, const int32_t *theValidA, const double *th
                   int32_t thePixels, bool theDecibel, float theNull, float *theOut, long long *theHistogram) {
   // Branch-free so the compiler vectorises it: invalid pairs divide by 1.
   for (int32_t i = 0; i < thePixels; ++i) {
-    const bool aValid = (theValidA[i] != 0) & (theValidB[i] != 0) & (theB[i] > CTLRX_EPS);
-    const double aRatio = theA[i] / (aValid ? theB[i] : 1.0);
+    const double aB = theB[i];
+    const bool aValid = ((theValidA[i] & theValidB[i]) != 0) & (aB > CTLRX_EPS);
+    const double aRatio = theA[i] / (aValid ? aB : 1.0);
     theOut[i] = aValid ? static_cast<float>(aRatio) : theNull;
   }
   if (theDecibel)
@@ -78,12 +81,13 @@ void fdfRatioLine(const double *theA, const int32_t *theValidA, const double *th
   // The class is the number of limits not above the value ("Other" for NaN),
   // found with float compares against the limits rounded up to floats, which
   // gives the same answer as comparing the stored float with each limit.
-  static const std::vector<float> theFloatLimits = fdfFloatLimits();
+  static const CFloatLimits theFloatLimits = fdfFloatLimits();
   for (int32_t i = 0; i < thePixels; ++i) {
     const float aValue = theOut[i];
     int aClass = 0;
-    for (float aLimit : theFloatLimits)
-      aClass += aValue >= aLimit;
+#pragma GCC unroll 11
+    for (size_t k = 0; k < theFloatLimits.size(); ++k)
+      aClass += aValue >= theFloatLimits[k];
     ++theHistogram[aValue != aValue ? CTLRX_RATIO_COUNTED_CLASSES - 1 : aClass];
   }
 }
