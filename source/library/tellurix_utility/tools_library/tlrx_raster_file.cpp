@@ -262,52 +262,50 @@ void CRasterFile::raiseUnexpected(int theLine) const {
 
 // ------------------------------------------------------------------ opening
 
-void CRasterFile::open_read(const char *theFileName, bool theLinesReversed, bool thePixelsReversed) {
+// Every named opener takes its layout from the raster's header on disk or
+// from a loaded description, then opens through openWith.
+void CRasterFile::openFromHeader(const char *theFileName, int32_t theMode, bool theLinesReversed,
+                                 bool thePixelsReversed) {
   refuseWhenOpen(nameOrEmpty(theFileName));
   CRasterFileParam aParam;
   aParam.readFromHeader(nameOrEmpty(theFileName));
   aParam.mLinesReversed = theLinesReversed;
   aParam.mPixelsReversed = thePixelsReversed;
-  openWith(aParam, CTLRX_RF_OPEN_READ);
+  openWith(aParam, theMode);
+}
+
+void CRasterFile::openFromDescription(const char *theFileName, const CDescription &theHeader, int32_t theMode,
+                                      bool theLinesReversed, bool thePixelsReversed) {
+  CRasterFileParam aParam;
+  aParam.setFromDescription(theFileName, theHeader);
+  aParam.mLinesReversed = theLinesReversed;
+  aParam.mPixelsReversed = thePixelsReversed;
+  openWith(aParam, theMode);
+}
+
+void CRasterFile::open_read(const char *theFileName, bool theLinesReversed, bool thePixelsReversed) {
+  openFromHeader(theFileName, CTLRX_RF_OPEN_READ, theLinesReversed, thePixelsReversed);
 }
 
 void CRasterFile::open_read(const char *theFileName, const CDescription &theHeader, bool theLinesReversed,
                             bool thePixelsReversed) {
-  CRasterFileParam aParam;
-  aParam.setFromDescription(theFileName, theHeader);
-  aParam.mLinesReversed = theLinesReversed;
-  aParam.mPixelsReversed = thePixelsReversed;
-  openWith(aParam, CTLRX_RF_OPEN_READ);
+  openFromDescription(theFileName, theHeader, CTLRX_RF_OPEN_READ, theLinesReversed, thePixelsReversed);
 }
 
 void CRasterFile::open_read(const CRasterFileParam &theParam) { openWith(theParam, CTLRX_RF_OPEN_READ); }
 
-void CRasterFile::open_write(const char *theFileName) {
-  refuseWhenOpen(nameOrEmpty(theFileName));
-  CRasterFileParam aParam;
-  aParam.readFromHeader(nameOrEmpty(theFileName));
-  openWith(aParam, CTLRX_RF_OPEN_WRITE);
-}
+void CRasterFile::open_write(const char *theFileName) { openFromHeader(theFileName, CTLRX_RF_OPEN_WRITE); }
 
 void CRasterFile::open_write(const char *theFileName, const CDescription &theHeader) {
-  CRasterFileParam aParam;
-  aParam.setFromDescription(theFileName, theHeader);
-  openWith(aParam, CTLRX_RF_OPEN_WRITE);
+  openFromDescription(theFileName, theHeader, CTLRX_RF_OPEN_WRITE);
 }
 
 void CRasterFile::open_write(const CRasterFileParam &theParam) { openWith(theParam, CTLRX_RF_OPEN_WRITE); }
 
-void CRasterFile::open_read_write(const char *theFileName) {
-  refuseWhenOpen(nameOrEmpty(theFileName));
-  CRasterFileParam aParam;
-  aParam.readFromHeader(nameOrEmpty(theFileName));
-  openWith(aParam, CTLRX_RF_OPEN_READ_WRITE);
-}
+void CRasterFile::open_read_write(const char *theFileName) { openFromHeader(theFileName, CTLRX_RF_OPEN_READ_WRITE); }
 
 void CRasterFile::open_read_write(const char *theFileName, const CDescription &theHeader) {
-  CRasterFileParam aParam;
-  aParam.setFromDescription(theFileName, theHeader);
-  openWith(aParam, CTLRX_RF_OPEN_READ_WRITE);
+  openFromDescription(theFileName, theHeader, CTLRX_RF_OPEN_READ_WRITE);
 }
 
 void CRasterFile::open_read_write(const CRasterFileParam &theParam) {

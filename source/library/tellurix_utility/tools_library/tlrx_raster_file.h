@@ -172,6 +172,10 @@ private:
   };
 
   void openWith(const CRasterFileParam &theParam, int32_t theMode);
+  void openFromHeader(const char *theFileName, int32_t theMode, bool theLinesReversed = false,
+                      bool thePixelsReversed = false);
+  void openFromDescription(const char *theFileName, const CDescription &theHeader, int32_t theMode,
+                           bool theLinesReversed = false, bool thePixelsReversed = false);
   void refuseWhenOpen(const char *theFileName) const;
   void validateLayout(const CRasterFileParam &theParam, int32_t theMode) const;
   void openStream(const char *theFileName, int32_t theMode);
