@@ -65,19 +65,32 @@ void fdfTraceUsage(const char *theProgram) {
 
 } // namespace
 
-void fdfRatioLine(const double *theA, const int32_t *theValidA, const double *theB, const int32_t *theValidB,
-                  int32_t thePixels, bool theDecibel, float theNull, float *theOut, long long *theHistogram) {
+// Whether v is a valid cell against null D: not NaN-with-NaN, not within
+// the smallest normal float of D.
+inline bool fdfValidCell(double theValue, double theNull, bool theNullIsNaN) {
+  return theNullIsNaN ? theValue == theValue
+                      : !(theValue >= theNull - CTLRX_EPS && theValue <= theNull + CTLRX_EPS);
+}
+
+void fdfRatioLine(const float *theA, double theNullA, const float *theB, double theNullB, int32_t thePixels,
+                  bool theDecibel, float theNull, float *theOut, long long *theHistogram) {
+  const bool aNaNA = std::isnan(theNullA);
+  const bool aNaNB = std::isnan(theNullB);
   // Branch-free so the compiler vectorises it: invalid pairs divide by 1.
   for (int32_t i = 0; i < thePixels; ++i) {
+    const double aA = theA[i];
     const double aB = theB[i];
-    const bool aValid = ((theValidA[i] & theValidB[i]) != 0) & (aB > CTLRX_EPS);
-    const double aRatio = theA[i] / (aValid ? aB : 1.0);
+    const bool aValid = fdfValidCell(aA, theNullA, aNaNA) & fdfValidCell(aB, theNullB, aNaNB) & !(aB <= CTLRX_EPS);
+    const double aRatio = aA / (aValid ? aB : 1.0);
     theOut[i] = aValid ? static_cast<float>(aRatio) : theNull;
   }
   if (theDecibel)
-    for (int32_t i = 0; i < thePixels; ++i)
-      if (theValidA[i] != 0 && theValidB[i] != 0 && theB[i] > CTLRX_EPS)
-        theOut[i] = static_cast<float>(10.0 * std::log10(theA[i] / theB[i]));
+    for (int32_t i = 0; i < thePixels; ++i) {
+      const double aA = theA[i];
+      const double aB = theB[i];
+      if (fdfValidCell(aA, theNullA, aNaNA) && fdfValidCell(aB, theNullB, aNaNB) && !(aB <= CTLRX_EPS))
+        theOut[i] = static_cast<float>(10.0 * std::log10(aA / aB));
+    }
   // The class is the number of limits not above the value ("Other" for NaN),
   // found with float compares against the limits rounded up to floats, which
   // gives the same answer as comparing the stored float with each limit.
@@ -125,14 +138,14 @@ int ratio_images(int argc, char **argv) {
 
   const int32_t aLines = aFirst.lines();
   const int32_t aPixels = aFirst.pixels();
-  std::vector<float> aResult(aPixels);
+  std::vector<float> aResult(aPixels), aLine1(aPixels), aLine2(aPixels);
   long long aHistogram[CTLRX_RATIO_COUNTED_CLASSES] = {};
   CLineProgress aProgress(99.0);
   for (int32_t aLine = 0; aLine < aLines; ++aLine) {
     aProgress.update(aLine, aLines);
-    aFirst.readLine(aLine);
-    aSecond.readLine(aLine);
-    fdfRatioLine(aFirst.values(), aFirst.mask(), aSecond.values(), aSecond.mask(), aPixels, aDecibel, aNull,
+    aFirst.readFloatLine(aLine, aLine1.data());
+    aSecond.readFloatLine(aLine, aLine2.data());
+    fdfRatioLine(aLine1.data(), aFirst.nullValue(), aLine2.data(), aSecond.nullValue(), aPixels, aDecibel, aNull,
                  aResult.data(), aHistogram);
     aOut.putLine(aLine, aResult.data());
   }

@@ -30,6 +30,10 @@ public:
   void open();
   // Reads line theLine into values() and mask() (1 valid, 0 no data).
   void readLine(int32_t theLine);
+  // Line theLine as floats into theValues (no-data cells hold nullValue()),
+  // for steps that test validity themselves.
+  void readFloatLine(int32_t theLine, float *theValues) { mRaster.getLine(theValues, theLine); }
+  double nullValue() const { return mRaster.getDummyVal(); }
   void close() { mRaster.close(); }
 
   const std::string &name() const { return mName; }
