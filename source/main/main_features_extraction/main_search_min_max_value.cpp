@@ -15,6 +15,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
+#include <cstring>
 #include <memory>
 
 namespace {
@@ -106,6 +107,19 @@ struct SMinMax {
   float *mMin, *mMax, *mMinDate, *mMaxDate;
 };
 
+// theCondition ? theYes : theNo on the bits, which the compiler vectorises
+// where a floating-point selection would stay a branch.
+inline float fdfSelect(bool theCondition, float theYes, float theNo) {
+  uint32_t aYes, aNo;
+  std::memcpy(&aYes, &theYes, sizeof aYes);
+  std::memcpy(&aNo, &theNo, sizeof aNo);
+  const uint32_t aMask = 0u - static_cast<uint32_t>(theCondition);
+  const uint32_t aBits = (aYes & aMask) | (aNo & ~aMask);
+  float aResult;
+  std::memcpy(&aResult, &aBits, sizeof aResult);
+  return aResult;
+}
+
 // Validity of one input line against its null value (same rule as fdfIsNull).
 void fdfValidCells(const float *__restrict theRow, double theNull, int32_t thePixels, uint8_t *__restrict theValid) {
   constexpr double aTolerance = 1.1754943508222875e-38;
@@ -143,10 +157,10 @@ void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::ve
       const float aValue = aRow[x];
       const bool aLower = aValue < aMin[x];
       const bool aHigher = aValue > aMax[x];
-      aMin[x] = aLower ? aValue : aMin[x];
-      aMinDate[x] = aLower ? aDate : aMinDate[x];
-      aMax[x] = aHigher ? aValue : aMax[x];
-      aMaxDate[x] = aHigher ? aDate : aMaxDate[x];
+      aMin[x] = fdfSelect(aLower, aValue, aMin[x]);
+      aMinDate[x] = fdfSelect(aLower, aDate, aMinDate[x]);
+      aMax[x] = fdfSelect(aHigher, aValue, aMax[x]);
+      aMaxDate[x] = fdfSelect(aHigher, aDate, aMaxDate[x]);
     }
     fdfValidCells(aRow, theNulls[i], thePixels, theValid.data());
   }
