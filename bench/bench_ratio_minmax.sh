@@ -8,6 +8,7 @@
 #
 # Usage: bench/bench_ratio_minmax.sh [rounds]    (default 5)
 set -euo pipefail
+source "$(dirname "$0")/bench_common.sh"
 
 ROUNDS=${1:-5}
 ROOT=$(cd "$(dirname "$0")/.." && pwd)
@@ -35,12 +36,6 @@ printf 'ratio\n%s\n%s\n0\nx\nNO\n0\n' "$WORK/r_list.txt" "$WORK/out" >"$WORK/rat
 for s in m t; do printf 'minmax\n%s\n%s\n2\n3\n4\n5\n6\nNO\n0\n' "$WORK/${s}_list.txt" "$WORK/${s}out" >"$WORK/$s.txt"; done
 mapfile -t STACK <"$WORK/m_list.txt"
 
-timed() {
-  printf '0\n\n' >"$WORK/Process.working"
-  /usr/bin/time -f "%e %U %S %M" -o "$WORK/time.txt" "$@" >/dev/null 2>&1 ||
-    { echo "bench: failed: $*" >&2; cat "$WORK/Process.working_error" >&2 2>/dev/null; exit 1; }
-  cat "$WORK/time.txt"
-}
 MAIN="$BUILD/bin/main_features_extraction"
 PEER="$ROOT/bench/bench_ratio_minmax_peer.py"
 RBYTES=$((RATIO_SIDE * RATIO_SIDE * 4))
@@ -60,10 +55,6 @@ for ((r = 0; r < ROUNDS; ++r)); do
   for c in $CASES; do eval "timed ${RUN[$c]}" >>"$WORK/$c.times"; done
 done
 
-median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
-stat() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$WORK/$1.times" | median; }
-ratio() { awk -v a="$(stat "$1" "$3")" -v b="$(stat "$2" "$3")" 'BEGIN { printf "%.2f", a / b }'; }
-check() { awk -v v="$1" -v t="$3" -v op="$2" 'BEGIN { ok = (op == "<=") ? v <= t : v >= t; print ok ? "ok" : "MISSED" }'; }
 
 printf "%d rounds, medians\n%-12s %9s %9s %12s\n" "$ROUNDS" "" "wall s" "cpu s" "peak RSS MB"
 for c in $CASES; do

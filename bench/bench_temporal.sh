@@ -17,6 +17,7 @@
 # Usage: bench/bench_temporal.sh [side] [rounds]    (default 2048, 3)
 # The build goes to $TLRX_BENCH_BUILD (default build_bench) in Release.
 set -euo pipefail
+source "$(dirname "$0")/bench_common.sh"
 
 SIDE=${1:-2048}
 ROUNDS=${2:-3}
@@ -76,13 +77,6 @@ parameters "$WORK/q" "$WORK/quarter" nearest_neighbour quarter.xml
 parameters "$WORK/g" "$WORK/geo" bilinear_interpolation geo.xml
 OUTPUT_MB=$((14 * SIDE * SIDE * 4 / 1048576))
 
-# One run: wall, user, system seconds and peak resident kilobytes.
-timed() {
-  printf '0\n\n' >"$WORK/Process.working"
-  /usr/bin/time -f "%e %U %S %M" -o "$WORK/time.txt" "$@" >/dev/null 2>&1 ||
-    { echo "bench_temporal: failed: $*" >&2; cat "$WORK/Process.working_error" >&2 2>/dev/null; exit 1; }
-  cat "$WORK/time.txt"
-}
 MAIN="$BUILD/bin/main_features_extraction"
 PEER="$ROOT/bench/bench_temporal_peer.py"
 # The peer reads the images in temporal order (the simulator's order).
@@ -101,9 +95,6 @@ for ((aRound = 0; aRound < ROUNDS; ++aRound)); do
   done
 done
 
-median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
-# Column 1 wall, 23 user + system, 4 peak RSS (kB).
-stat() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$WORK/$1.times" | median; }
 
 MB=$(awk -v s="$SIDE" 'BEGIN { print s * s * 4 / 1048576 }')
 printf "Temporal features of %d FLOAT images of %dx%d (%.0f MB each), %d rounds, medians\n" "$COUNT" "$SIDE" "$SIDE" \
@@ -117,8 +108,6 @@ for aCase in $CASES; do
     "$(awk -v m="$aInput" -v w="$(stat $aCase 1)" 'BEGIN { print m / w }')"
 done
 
-ratio() { awk -v a="$(stat "$1" "$3")" -v b="$(stat "$2" "$3")" 'BEGIN { printf "%.2f", a / b }'; }
-check() { awk -v v="$1" -v t="$3" -v op="$2" 'BEGIN { ok = (op == "<=") ? v <= t : v >= t; print ok ? "ok" : "MISSED" }'; }
 echo "ratios (wall; cpu in brackets):"
 R=$(ratio peer ours 1); printf "  numpy peer / ours              %s (%s)  target >= 3: %s\n" "$R" "$(ratio peer ours 23)" "$(check "$R" ">=" 3)"
 R=$(ratio ours base 1); printf "  ours / read-and-write baseline %s (%s)  target <= 3: %s\n" "$R" "$(ratio ours base 23)" "$(check "$R" "<=" 3)"

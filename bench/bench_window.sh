@@ -13,6 +13,7 @@
 # Usage: bench/bench_window.sh [side] [rounds]    (default 4096, 5)
 # The build goes to $TLRX_BENCH_BUILD (default build_bench) in Release.
 set -euo pipefail
+source "$(dirname "$0")/bench_common.sh"
 
 SIDE=${1:-4096}
 ROUNDS=${2:-5}
@@ -49,13 +50,6 @@ for aSize in 3 7 31; do texture_args "$aSize"; done
 printf 'correlation\n%s\n%s\n%s\n%s\n7\n7\n7\n7\nNO\nNO\n0\n' "$WORK/pair_1" "$WORK/pair_2" "$WORK/coh" "$NULL" \
   >"$WORK/corr7.txt"
 
-# One run: wall, user, system seconds and peak resident kilobytes.
-timed() {
-  printf '0\n\n' >"$WORK/Process.working"
-  /usr/bin/time -f "%e %U %S %M" -o "$WORK/time.txt" "$@" >/dev/null 2>&1 ||
-    { echo "bench_window: failed: $*" >&2; cat "$WORK/Process.working_error" >&2 2>/dev/null; exit 1; }
-  cat "$WORK/time.txt"
-}
 MAIN="$BUILD/bin/main_features_extraction"
 PEER="$ROOT/bench/bench_window_peer.py"
 declare -A RUN=(
@@ -76,9 +70,6 @@ for ((aRound = 0; aRound < ROUNDS; ++aRound)); do
   done
 done
 
-median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
-# Column 1 wall, 23 user + system, 4 peak RSS (kB).
-stat() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$WORK/$1.times" | median; }
 
 MB=$(awk -v s="$SIDE" 'BEGIN { print s * s * 4 / 1048576 }')
 printf "Window commands on %dx%d FLOAT (%.0f MB per raster), %d rounds, medians\n" "$SIDE" "$SIDE" "$MB" "$ROUNDS"
@@ -91,8 +82,6 @@ for aCase in $CASES; do
     "$(awk -v m="$MB" -v n="$aInputs" -v w="$(stat $aCase 1)" 'BEGIN { print m * n / w }')"
 done
 
-ratio() { awk -v a="$(stat "$1" "$3")" -v b="$(stat "$2" "$3")" 'BEGIN { printf "%.2f", a / b }'; }
-check() { awk -v v="$1" -v t="$3" -v op="$2" 'BEGIN { ok = (op == "<=") ? v <= t : v >= t; print ok ? "ok" : "MISSED" }'; }
 echo "ratios (wall; cpu in brackets):"
 R=$(ratio tex31 tex3 1); printf "  texture 31x31 / 3x3          %s (%s)  target <= 1.3: %s\n" "$R" "$(ratio tex31 tex3 23)" "$(check "$R" "<=" 1.3)"
 R=$(ratio peer_tex7 tex7 1); printf "  numpy texture 7x7 / ours     %s (%s)  target >= 4: %s\n" "$R" "$(ratio peer_tex7 tex7 23)" "$(check "$R" ">=" 4)"

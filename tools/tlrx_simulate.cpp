@@ -6,7 +6,6 @@
 // message on standard error and exit status 1; a bad command line gives its
 // message, the usage line and exit status 2. The runtime is started without
 // its log and trace, so a run leaves nothing behind but the requested files.
-#include "tlrx_envi_util.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
@@ -82,8 +81,6 @@ int main(int argc, char **argv) {
     fdfSetReportAndExit(false);
     fdfSetProcessName("tlrx_simulate");
     loadCatalogues();
-    // ENVI headers beside the rasters let outside readers (GDAL) open them too.
-    fdfInstallEnviHeaderWriter();
     fdfSimRun(aOptions);
   } catch (const CErrorExceptionManager &theError) {
     printRuntimeError(theError);

@@ -10,7 +10,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
-#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_to_geotiff.h"
 #include "tlrx_step_runner.h"
 
 #include <string>
@@ -31,7 +31,7 @@ std::vector<STLRXStep> fdfCorrelationSteps(bool theClose) {
   return {
       {"normalize_images", normalize_images, fdfStepNothingToClose},
       {"quick_and_dirty", quick_and_dirty, theClose ? quick_and_dirty_close : fdfStepNothingToClose},
-      {"Out File to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+      {"Out File to tiff conversion", make_tiff, fdfStepNothingToClose},
   };
 }
 

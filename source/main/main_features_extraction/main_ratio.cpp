@@ -8,7 +8,7 @@
 #include "tlrx_features_common.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
-#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_to_geotiff.h"
 #include "tlrx_step_runner.h"
 
 
@@ -19,7 +19,7 @@ enum ERatioToken { CTLRX_RATIO_LIST, CTLRX_RATIO_ROOT, CTLRX_RATIO_DB, CTLRX_RAT
 
 const std::vector<STLRXStep> theRatioSteps = {
     {"Ratio", ratio_images, fdfStepNothingToClose},
-    {"ratio to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+    {"ratio to tiff conversion", make_tiff, fdfStepNothingToClose},
 };
 
 int32_t fdfRunRatio(const char *theArguments) {

@@ -9,7 +9,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
-#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_to_geotiff.h"
 #include "tlrx_raster_file.h"
 
 #include <algorithm>
@@ -245,7 +245,7 @@ int32_t fdfRunMinMax(const char *theArguments) {
     for (const std::string &aResult : aResults) {
       fdfSetProcessName("Generate tiff ...");
       getAndSetPerc(-1, 0, nullptr);
-      fdfMakeQuickLook(aResult, std::atof(aTokens[CTLRX_MINMAX_SATURATION].c_str()));
+      fdfRasterQuickLook(aResult.c_str(), std::atof(aTokens[CTLRX_MINMAX_SATURATION].c_str()));
     }
   return 0;
 }

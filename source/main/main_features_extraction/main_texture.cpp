@@ -7,7 +7,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
-#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_to_geotiff.h"
 #include "tlrx_step_runner.h"
 
 #include <string>
@@ -23,7 +23,7 @@ enum ETextureStep { CTLRX_TEXTURE_STEP, CTLRX_TEXTURE_TIFF_STEP };
 
 const std::vector<STLRXStep> theTextureSteps = {
     {"texture", texture, fdfStepNothingToClose},
-    {"texture to tiff conversion", fdfGeoTiffStep, fdfStepNothingToClose},
+    {"texture to tiff conversion", make_tiff, fdfStepNothingToClose},
 };
 
 int32_t fdfRunTexture(const char *theArguments) {

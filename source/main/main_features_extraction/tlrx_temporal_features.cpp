@@ -13,7 +13,7 @@
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geocoded_stack.h"
-#include "tlrx_geotiff_step.h"
+#include "tlrx_raster_to_geotiff.h"
 #include "tlrx_pending_files.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
@@ -298,7 +298,7 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
     for (auto &aOutput : aOutputs) {
       fdfSetProcessName(CTLRX_TF_TIFF_PROCESS);
       getAndSetPerc(-1, 0, nullptr);
-      fdfMakeQuickLook(aOutput->mName, theRequest.mSaturation);
+      fdfRasterQuickLook(aOutput->mName.c_str(), theRequest.mSaturation);
     }
   return 0;
 }

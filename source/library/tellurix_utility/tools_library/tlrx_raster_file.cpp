@@ -119,30 +119,17 @@ void storeText(CDescription &theHeader, const char *theName, const char *theText
     aField->setString(theText);
 }
 
-void swapBytes2(uint8_t *theData, int64_t theValues) {
-  for (int64_t i = 0; i < theValues; ++i) {
-    uint16_t aValue;
-    std::memcpy(&aValue, theData + 2 * i, 2);
-    aValue = __builtin_bswap16(aValue);
-    std::memcpy(theData + 2 * i, &aValue, 2);
-  }
-}
+uint16_t byteSwap(uint16_t theValue) { return __builtin_bswap16(theValue); }
+uint32_t byteSwap(uint32_t theValue) { return __builtin_bswap32(theValue); }
+uint64_t byteSwap(uint64_t theValue) { return __builtin_bswap64(theValue); }
 
-void swapBytes4(uint8_t *theData, int64_t theValues) {
+// Reverses the bytes of each of theValues values of type T, in place.
+template <typename T> void swapBytes(uint8_t *theData, int64_t theValues) {
   for (int64_t i = 0; i < theValues; ++i) {
-    uint32_t aValue;
-    std::memcpy(&aValue, theData + 4 * i, 4);
-    aValue = __builtin_bswap32(aValue);
-    std::memcpy(theData + 4 * i, &aValue, 4);
-  }
-}
-
-void swapBytes8(uint8_t *theData, int64_t theValues) {
-  for (int64_t i = 0; i < theValues; ++i) {
-    uint64_t aValue;
-    std::memcpy(&aValue, theData + 8 * i, 8);
-    aValue = __builtin_bswap64(aValue);
-    std::memcpy(theData + 8 * i, &aValue, 8);
+    T aValue;
+    std::memcpy(&aValue, theData + sizeof(T) * i, sizeof(T));
+    aValue = byteSwap(aValue);
+    std::memcpy(theData + sizeof(T) * i, &aValue, sizeof(T));
   }
 }
 
@@ -672,9 +659,9 @@ int64_t CRasterFile::lineBytes(int32_t theColStart, int32_t theColEnd) const {
 
 void CRasterFile::swapValues(uint8_t *theData, int64_t theValues) const {
   switch (mBytesPerPixel / mDataNbr) {
-  case 2: swapBytes2(theData, theValues); break;
-  case 4: swapBytes4(theData, theValues); break;
-  case 8: swapBytes8(theData, theValues); break;
+  case 2: swapBytes<uint16_t>(theData, theValues); break;
+  case 4: swapBytes<uint32_t>(theData, theValues); break;
+  case 8: swapBytes<uint64_t>(theData, theValues); break;
   default: break;
   }
 }
