@@ -34,7 +34,17 @@ double fdfGetDummyValueDouble();
 void fdfSetDummyValue(const char *theSetting);
 
 const std::string &fdfGetWorkingFilePath();
+// The file counts as seen when it exists at that moment.
 void fdfSetWorkingFilePath(const std::string &thePath);
+// Whether the working file existed at some time in this run (found or
+// created at start-up, or found later): only then are its absences retried
+// with growing pauses.
+bool fdfWorkingFileSeen();
+
+// theDir + thePrefix + theStamp + theSuffix, or with "_1", "_2", ... after
+// the stamp when that name is taken, so dated copies never overwrite.
+std::string fdfFreeDatedName(const std::string &theDir, const char *thePrefix, const std::string &theStamp,
+                             const char *theSuffix);
 
 // Formatted into a 25000-character buffer; the trace variant does nothing
 // while tracing is off. Both report whether the stream is still good.
@@ -51,8 +61,10 @@ void fdfCloseTellurixLog();
 void fdfStartProcess(const char *const *theArgv, int theArgc, const char *theName, const char *theParamText);
 void fdfEndBanner();
 
+// Raises 326400 when SIGTERM or SIGINT arrived since start-up.
+void fdfCheckInterruption();
 // Progress update in the working file; raises 326400 when the host asked
-// for an interruption (a value above 100 in the first line).
+// for an interruption (a value above 100 in the first line) or a signal did.
 void getAndSetPerc(int thePrevious, int theNew, const char *theText = nullptr);
 
 // Closing step of every run; ends the process after warnings or on error.

@@ -8,6 +8,7 @@
 
 constexpr int CTLRX_MAX_LEN_LIST_LINE = 10000;
 
+// False for a missing or empty name and for the token "NotOK" (no file).
 bool fdfExistFile(const char *theName);
 long long fdfGetFileSize(const char *theName);
 bool fdfRemoveFile(const char *theName);
@@ -34,6 +35,22 @@ std::vector<std::string> fdfReadLineList(const char *theFileName, bool theTrim);
 std::vector<std::string> fdfReadArgumentFile(const char *theArgument);
 
 std::string fdfIntToText(long theValue);
+
+// Numbers of headers, argument and parameter files are read whole: the
+// entire text, blanks around it allowed, is the number, so "30 junk",
+// "16e1" or "7.9" are no integer and "4294967303" does not wrap. False for
+// anything else; a real that overflows is refused, and so is one that is
+// not finite when theFinite (sizes, spacings, windows).
+bool fdfParseWholeInteger(const char *theText, int32_t &theValue);
+bool fdfParseWholeDouble(const char *theText, double &theValue, bool theFinite);
+
+// A regular file, or a link to one. Readers ask before they open, so a FIFO,
+// a device or a folder is refused instead of blocking or reading forever.
+bool fdfIsRegularFile(const char *theName);
+
+// Names of a list file: its trimmed lines up to the first "#" line, blank
+// lines skipped (a trailing empty line names no file).
+std::vector<std::string> fdfReadNameList(const char *theFileName);
 
 // No-data rule shared by the commands: both NaN, or within FLT_MIN of D.
 bool fdfIsNull(double theValue, double theNull);

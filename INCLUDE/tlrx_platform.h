@@ -46,3 +46,24 @@ void fdfRestoreStdStreams();
 // Splits at the last "/" or "\": directory (with its separator) and the rest.
 void fdfSplitPath(const std::string &thePath, std::string &theDir, std::string &theName, std::string &theExt);
 constexpr char CTLRX_PATH_SEPARATOR = '/';
+
+// Whether both names exist and are one file (same device and inode), however
+// they are spelled: links, relative parts and hard links resolved.
+bool fdfSameFile(const std::string &theFirst, const std::string &theSecond);
+int fdfProcessId();
+
+// SIGTERM and SIGINT only record that the operator asked to stop; the next
+// progress check raises the interruption. Installing clears a request.
+void fdfInstallInterruptionHandlers();
+// "SIGTERM" or "SIGINT" once one arrived, else nullptr.
+const char *fdfPendingInterruption();
+
+// Whether a process of that id is alive (or exists under another user).
+bool fdfProcessExists(int thePid);
+
+// Removes a file or a link itself, never a directory (EISDIR), and never
+// changes a mode: on Linux a file's own mode does not prevent its removal.
+// 0 or the errno of the failure.
+int fdfRemoveFileEntry(const char *theName);
+// Whether theName is a directory (or a link to one).
+bool fdfIsDirectory(const std::string &theName);

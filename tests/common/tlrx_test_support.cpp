@@ -3,6 +3,8 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
+#include <chrono>
+#include <csignal>
 #include <cstdlib>
 #include <fstream>
 #include <sstream>
@@ -80,15 +82,17 @@ static std::string tlrxQuote(const std::string &theText) {
   return aOut + "'";
 }
 
-STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &theArgs,
-                 const std::string &theWorkDir, const std::map<std::string, std::string> &theEnv) {
+// "cd DIR && exec env ... PROGRAM ARGS": the shell becomes the program, so
+// a started run's process id is the program's own.
+static std::string tlrxShellCommand(const std::string &theProgram, const std::vector<std::string> &theArgs,
+                                    const std::string &theWorkDir, const std::map<std::string, std::string> &theEnv) {
   std::map<std::string, std::string> aEnv = {{"TELLURIX_INIT_DIR", tlrxConfigDir()},
                                              {"TELLURIX_WORKING_DIR", theWorkDir},
                                              {"TELLURIX_BATCH_DIR", theWorkDir},
                                              {"TELLURIX_WORKING_FILE", ""}};
   for (const auto &aEntry : theEnv)
     aEnv[aEntry.first] = aEntry.second;
-  std::string aCommand = "cd " + tlrxQuote(theWorkDir) + " && env";
+  std::string aCommand = "cd " + tlrxQuote(theWorkDir) + " && exec env";
   // env takes its -u options before the assignments.
   for (const auto &aEntry : aEnv)
     if (aEntry.second.empty())
@@ -99,7 +103,16 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
   aCommand += " " + tlrxQuote(theProgram.find('/') == std::string::npos ? tlrxBinPath(theProgram) : theProgram);
   for (const std::string &aArg : theArgs)
     aCommand += " " + tlrxQuote(aArg);
-  aCommand += " </dev/null 2>&1";
+  return aCommand;
+}
+
+static int tlrxExitStatus(int theStatus) {
+  return WIFEXITED(theStatus) ? WEXITSTATUS(theStatus) : 128 + WTERMSIG(theStatus);
+}
+
+STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &theArgs,
+                 const std::string &theWorkDir, const std::map<std::string, std::string> &theEnv) {
+  const std::string aCommand = tlrxShellCommand(theProgram, theArgs, theWorkDir, theEnv) + " </dev/null 2>&1";
   STLRXRun aRun;
   FILE *aPipe = popen(aCommand.c_str(), "r");
   if (aPipe == nullptr)
@@ -108,9 +121,34 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
   size_t aRead;
   while ((aRead = fread(aBuffer, 1, sizeof aBuffer, aPipe)) > 0)
     aRun.mOutput.append(aBuffer, aRead);
-  int aStatus = pclose(aPipe);
-  aRun.mExitStatus = WIFEXITED(aStatus) ? WEXITSTATUS(aStatus) : 128 + WTERMSIG(aStatus);
+  aRun.mExitStatus = tlrxExitStatus(pclose(aPipe));
   return aRun;
+}
+
+int tlrxStart(const std::string &theProgram, const std::vector<std::string> &theArgs, const std::string &theWorkDir,
+              const std::map<std::string, std::string> &theEnv) {
+  const std::string aCommand =
+      tlrxShellCommand(theProgram, theArgs, theWorkDir, theEnv) + " </dev/null >/dev/null 2>&1";
+  const pid_t aPid = fork();
+  if (aPid == 0) {
+    execl("/bin/sh", "sh", "-c", aCommand.c_str(), static_cast<char *>(nullptr));
+    _exit(127);
+  }
+  return static_cast<int>(aPid);
+}
+
+int tlrxWait(int thePid, double theSeconds) {
+  const auto aDeadline = std::chrono::steady_clock::now() + std::chrono::duration<double>(theSeconds);
+  int aStatus = 0;
+  while (waitpid(thePid, &aStatus, WNOHANG) == 0) {
+    if (std::chrono::steady_clock::now() > aDeadline) {
+      kill(thePid, SIGKILL);
+      waitpid(thePid, &aStatus, 0);
+      return -1;
+    }
+    usleep(20000);
+  }
+  return tlrxExitStatus(aStatus);
 }
 
 STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,

@@ -208,5 +208,27 @@ TEST_F(CorrelationStepTest, ErrorsAndTheirCodes) {
   EXPECT_EQ(aCorrelate({a, b, file("missing"), o, "0", "3", "3"}), 261122);
   EXPECT_EQ(aCorrelate({a, b, file("wide"), o, "0", "3", "3"}), 652807);
   EXPECT_EQ(aCorrelate({a, file("tall"), a, o, "0", "3", "3"}), 652807);
+  // Number tokens are read whole; the dummy value of the normalisation is a
+  // parameter error, a window a window error, each naming its token.
+  struct SBadToken {
+    bool mNormalize;
+    std::vector<std::string> mArgs;
+    int32_t mCode;
+    const char *mMessage;
+  } const aBadTokens[] = {
+      {true, {a, b, n, "-9999x", "3", "3"}, 456960, "dummy value: not a number [-9999x]"},
+      {true, {a, b, n, "inf", "3", "3"}, 456960, "dummy value: not a number [inf]"},
+      {true, {a, b, n, "0", "5abc", "3"}, 456961, "window rows: not an integer [5abc]"},
+      {true, {a, b, n, "0", "3", "4294967299"}, 456961, "window columns: not an integer [4294967299]"},
+      {false, {a, b, n, o, "0", "3.5", "3"}, 456961, "window rows: not an integer [3.5]"},
+      {false, {a, b, n, o, "0", "3", "3 junk"}, 456961, "window columns: not an integer [3 junk]"},
+  };
+  for (const SBadToken &aBad : aBadTokens) {
+    EXPECT_EQ(raisedCode([&] { run(aBad.mNormalize ? normalize_images : quick_and_dirty, aBad.mArgs); }, &aMessage),
+              aBad.mCode)
+        << aBad.mMessage;
+    EXPECT_EQ(aMessage, aBad.mMessage);
+  }
+  EXPECT_FALSE(tlrxFileExists(n));
   EXPECT_FALSE(tlrxFileExists(o));
 }

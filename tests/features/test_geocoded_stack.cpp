@@ -6,7 +6,6 @@
 #include "tlrx_geocoded_stack.h"
 #include "tlrx_map_grid.h"
 #include "tlrx_platform.h"
-#include "tlrx_pending_files.h"
 #include "tlrx_temporal_grid.h"
 #include "tlrx_temporal_test_support.h"
 
@@ -282,47 +281,3 @@ TEST(MapGrid, UnionCountsWholeCellsDespiteRounding) {
   EXPECT_DOUBLE_EQ(fdfCellCentrePosition(3, 100, 10, 100, 20), 1.25);
 }
 
-TEST(PendingFiles, FailuresRemoveRegisteredFilesAndCompletedOnesStay) {
-  CTempDir aDir;
-  tlrxStartLibraryEnvironment(aDir.path());
-  // The error reports go to a working file that exists: no retry pauses.
-  tlrxWriteFile(aDir.file("Process.working"), "0\nhost\n");
-  const TLRXSleepFunction aOldSleep = fdfSetSleepFunction([](double) {});
-  const std::string aRaster = aDir.file("r"), aOther = aDir.file("x.txt");
-  auto aWrite = [&] {
-    for (const std::string &aName : {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther})
-      tlrxWriteFile(aName, "x");
-  };
-  // Throw mode: an exception leaving the guard's scope removes them.
-  aWrite();
-  try {
-    CPendingFiles aGuard;
-    aGuard.addRaster(aRaster);
-    aGuard.addFile(aOther);
-    TLRX_RAISE(261124, "test");
-  } catch (const CErrorExceptionManager &) {
-  }
-  for (const std::string &aName : {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther})
-    EXPECT_FALSE(tlrxFileExists(aName)) << aName;
-  // Normal end and forgotten files: kept.
-  aWrite();
-  {
-    CPendingFiles aGuard;
-    aGuard.addRaster(aRaster);
-    aGuard.forgetRaster(aRaster);
-  }
-  EXPECT_TRUE(tlrxFileExists(aRaster));
-  // Report-and-exit mode: the error hook removes them before the process ends.
-  {
-    CPendingFiles aGuard;
-    aGuard.addFile(aOther);
-    fdfWriteErrorFile(456960, "test", static_cast<const char *>(nullptr));
-    EXPECT_FALSE(tlrxFileExists(aOther));
-    aGuard.addRaster(aRaster);
-    fdfWriteErrorFile(CTLRX_WARNING_STATUS, "", static_cast<const char *>(nullptr));
-    EXPECT_TRUE(tlrxFileExists(aRaster));
-  }
-  fdfWriteErrorFile(456960, "test", static_cast<const char *>(nullptr));
-  EXPECT_TRUE(tlrxFileExists(aRaster));
-  fdfSetSleepFunction(aOldSleep);
-}

@@ -140,6 +140,19 @@ TEST_F(TextureStepTest, ErrorsAndTheirCodes) {
   EXPECT_EQ(aMessage, "");
   EXPECT_EQ(raisedCode([&] { run(::texture, {file("in"), file("o"), "0", "2", "5"}); }), 456961);
   EXPECT_EQ(raisedCode([&] { run(::texture, {file("in"), file("o"), "0", "5", "501"}); }), 456961);
+  // Window tokens are read whole: none of these is a window of 7.
+  const std::pair<const char *, const char *> aBadWindows[] = {
+      {"7abc", "window rows: not an integer [7abc]"},        {"7.9", "window rows: not an integer [7.9]"},
+      {"4294967303", "window rows: not an integer [4294967303]"}, {"", "window rows: not an integer []"},
+      {"7 7", "window rows: not an integer [7 7]"},
+  };
+  for (const auto &aBad : aBadWindows) {
+    EXPECT_EQ(raisedCode([&] { run(::texture, {file("in"), file("o"), "0", aBad.first, "3"}); }, &aMessage), 456961);
+    EXPECT_EQ(aMessage, aBad.second);
+  }
+  EXPECT_EQ(raisedCode([&] { run(::texture, {file("in"), file("o"), "0", " 3 ", "3x"}); }, &aMessage), 456961);
+  EXPECT_EQ(aMessage, "window columns: not an integer [3x]");
+  EXPECT_FALSE(tlrxFileExists(file("o")));
   EXPECT_EQ(raisedCode([&] { run(::texture, {file("none"), file("o"), "0", "3", "3"}); }, &aMessage), 261122);
   EXPECT_EQ(aMessage, file("none_hdr"));
   EXPECT_FALSE(tlrxFileExists(file("o")));

@@ -8,6 +8,7 @@
 
 #include <cmath>
 #include <limits>
+#include <sys/stat.h>
 
 namespace {
 
@@ -219,4 +220,64 @@ TEST_F(RatioTest, GeoTiffStepFollowsEveryRatioStep) {
   EXPECT_TRUE(aFirst < aSecond && aSecond < aThird && aThird < aFourth);
   EXPECT_NE(aTrace.find("aArgv[2] " + mDir.file("out_1_rto.tif")), std::string::npos);
   EXPECT_NE(aTrace.find("RATIO TOTAL TIME (s): "), std::string::npos);
+}
+
+// Folder names in UTF-8 (whose bytes once went through the Latin-1 folding,
+// 0x8C of "Č" turning into "<") and literal markers read back exactly.
+TEST_F(RatioTest, NonAsciiAndMarkerFoldersReadBackExactly) {
+  for (const std::string aFolder : {"\xC4\x8C" "echy", "\xE6\x97\xA5 ##amp&#x"}) {
+    ASSERT_EQ(mkdir(mDir.file(aFolder).c_str(), 0755), 0) << aFolder;
+    image(aFolder + "/a", {1, 2, 3, 4}, true, -1);
+    image(aFolder + "/b", {1, 2, 3, 4}, true, -1);
+    tlrxWriteFile(working(), "0\nhost\n");
+    const STLRXRun aRun = tlrxRunMain(arguments({aFolder + "/a", aFolder + "/b"}, aFolder + "/out"), mDir.path());
+    ASSERT_EQ(aRun.mExitStatus, 0) << aFolder << aRun.mOutput << error();
+    CDescription aHeader;
+    fdfReadStandardHeader(mDir.file(aFolder + "/out_rto").c_str(), aHeader);
+    const CDescriptionField &aFiles = aHeader.getField("RasterInfo.FilesList");
+    ASSERT_EQ(aFiles.getNumberOfElements(), 2);
+    EXPECT_EQ(std::string(aFiles.getString(0)), mDir.file(aFolder + "/a"));
+    EXPECT_EQ(std::string(aFiles.getString(1)), mDir.file(aFolder + "/b"));
+  }
+}
+
+// A list file ending in a blank line still lists two files: one pair, named
+// without a pair index.
+TEST_F(RatioTest, BlankLinesOfTheListNameNoFile) {
+  image("a", {1, 2, 3, 4}, true, -1);
+  image("b", {1, 2, 3, 4}, true, -1);
+  const std::string aCommand = arguments({"a", "b"}, "out");
+  tlrxWriteFile(mDir.file("list.txt"), "\n" + mDir.file("a") + "\n  \n" + mDir.file("b") + "\n\n");
+  const STLRXRun aRun = tlrxRunMain(aCommand, mDir.path());
+  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  EXPECT_TRUE(tlrxFileExists(mDir.file("out_rto")));
+  EXPECT_FALSE(tlrxFileExists(mDir.file("out_0_rto")));
+}
+
+// Number tokens are read whole: a bad decibel switch or saturation stops the
+// run with a parameter error naming it, before anything is written.
+TEST_F(RatioTest, BadNumberTokensAreParameterErrors) {
+  image("a", {1, 2, 3, 4}, true, -1);
+  image("b", {1, 2, 3, 4}, true, -1);
+  const struct {
+    const char *mDb;
+    const char *mSaturation;
+    const char *mMessage;
+  } aCases[] = {
+      {"1x", "0.3", "decibel switch: not an integer [1x]"},
+      {"1.0", "0.3", "decibel switch: not an integer [1.0]"},
+      {"0", "0.3x", "saturation: not a number [0.3x]"},
+      {"0", "nan", "saturation: not a number [nan]"},
+  };
+  for (const auto &aCase : aCases) {
+    arguments({"a", "b"}, "out");
+    tlrxWriteFile(mDir.file("args.txt"), "ratio arguments\n" + mDir.file("list.txt") + "\n" + mDir.file("out") +
+                                             "\n" + aCase.mDb + "\nunused\nOK\n" + aCase.mSaturation + "\n");
+    tlrxWriteFile(working(), "0\nhost\n");
+    const STLRXRun aRun = tlrxRunMain("main_ratio#" + mDir.file("args.txt"), mDir.path());
+    EXPECT_EQ(aRun.mExitStatus, 8) << aCase.mMessage;
+    EXPECT_NE(error().find("[EC :456960]"), std::string::npos) << error();
+    EXPECT_NE(error().find(aCase.mMessage), std::string::npos) << error();
+    EXPECT_FALSE(tlrxFileExists(mDir.file("out_rto")));
+  }
 }

@@ -406,7 +406,8 @@ TEST_F(TemporalFeaturesTest, BadInputsStopBeforeAnyResultAndLeaveNothingBehind) 
   } aCases[] = {
       {{"a", "geo"}, 5, "[EC :261124]", mDir.file("geo_hdr")},
       {{"geo", "b"}, 5, "[EC :261124]", mDir.file("b_hdr")},
-      {{"a", "missing"}, 5, "[EC :261124]", mDir.file("missing_hdr")},
+      // A missing input is reported as missing (it used to read "cannot be written").
+      {{"a", "missing"}, 5, "[EC :261122]", mDir.file("missing_hdr")},
       {{"a", "undated"}, 14, "[EC :848642]", "ACQUISITION TIME"},
       {{"baddate", "a"}, 14, "[EC :848642]", "ACQUISITION TIME"},
       {{"a", "nodata"}, 5, "[EC :261122]", mDir.file("nodata")},

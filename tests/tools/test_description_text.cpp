@@ -44,7 +44,7 @@ TEST_F(DescriptionTextTest, ReadsScalarsAndVectorsOfTheOldForm) {
                                  "Lines=1\n"
                                  " [ Sensor ]   ; leading blank and blanks inside the brackets\r\n"
                                  "Name=\"two words\"\r\n"
-                                 "Lines=\t-42 trailing words\n"
+                                 "Lines=\t-42 \n"
                                  "Gain=-nan\n"
                                  "Doppler={0.5 -1.25e-05   NaN\t3}\n"
                                  "Counts={1 2 3}\n"

@@ -379,8 +379,7 @@ TEST_F(DescriptionXmlTest, ValuesAreTakenInDocumentOrderAndNaNByText) {
                                    "  </VectorDouble></Doppler>\n"
                                    "  <Name></Name>\n"
                                    "  <Unknown>ignored</Unknown>\n"
-                                   "  <Lines>99999999999</Lines>\n"
-                                   "  <Gain>&#233;</Gain>\n"
+                                   "  <Lines> 7 </Lines>\n"
                                    " </Sensor>\n</HEADER_INFO>\n");
   CDescription aRead;
   declare(aRead);
@@ -391,8 +390,15 @@ TEST_F(DescriptionXmlTest, ValuesAreTakenInDocumentOrderAndNaNByText) {
   EXPECT_TRUE(std::isnan(aDoppler.getDouble(2)));
   EXPECT_EQ(aDoppler.getDouble(3), 2000.0);
   EXPECT_STREQ(aRead.getField("Sensor.Name").getString(), ""); // empty element: empty string
-  EXPECT_EQ(aRead.getField("Sensor.Lines").getInteger(), INT32_MAX);
-  EXPECT_EQ(aRead.getField("Sensor.Gain").getDouble(), 0.0);
+  EXPECT_EQ(aRead.getField("Sensor.Lines").getInteger(), 7);
+  // Numbers out of range or not numbers at all are refused, not saturated
+  // or read as 0.
+  for (const char *aBad : {"<Lines>99999999999</Lines>", "<Gain>&#233;</Gain>"}) {
+    tlrxWriteFile(path("bad.sml"), std::string("<HEADER_INFO><Sensor>") + aBad + "</Sensor></HEADER_INFO>\n");
+    std::string aMessage;
+    EXPECT_EQ(tlrxCodeOf([&] { aRead.readXML(path("bad.sml").c_str(), true); }, &aMessage), 848642) << aBad;
+    EXPECT_EQ(aMessage, aBad[1] == 'L' ? "Lines: not an integer: [99999999999]" : "Gain: not a number: [\xE9]");
+  }
 }
 
 // ------------------------------------------------------------ update mode
@@ -721,4 +727,59 @@ TEST_F(DescriptionXmlTest, ReadXmlSectionTakesTheNamedListEntry) {
   tlrxWriteFile(aFile, "<HEADER_INFO NumberOfElements=\"1\"><SECTION NAME=\"Sensor\"><Name>" +
                            std::string(CTLRX_XML_SECTION_MAX_LINE, 'n') + "</Name></SECTION></HEADER_INFO>");
   EXPECT_FALSE(fdfReadXMLSection(aSection, aFile.c_str(), false));
+}
+
+// Paths and names hold UTF-8 and literal markers: they read back byte for
+// byte, in scalars, vectors and matrices alike.
+TEST_F(DescriptionXmlTest, Utf8AndLiteralMarkersReadBackExactly) {
+  const char *const aTexts[] = {
+      "/data/\xC4\x8C" "echy/a_0_rto",          // "Č": its 0x8C once became "<"
+      "\xC3\xA9t\xC3\xA9 \xC2\xB0 \xE2\x82\xAC", // é, °, €
+      "\xE6\x97\xA5\xE6\x9C\xAC/\xF0\x9F\x8C\x8D", // CJK and a 4-byte sequence
+      "/tmp/##amp/x##lt##gt##quot##apos",        // literal markers
+      "a#b##c###d####BIG<",
+      "&amp; written as text",
+      "lone \x8C and \x85 bytes",               // a stray 0x8C once became "<"
+  };
+  for (const char *aText : aTexts) {
+    CDescription aDescription;
+    declare(aDescription);
+    aDescription.getField("Sensor.Name").setString(aText);
+    CDescriptionField &aLabels = aDescription.getField("Sensor.Labels");
+    aLabels.allocate(1, 2);
+    aLabels.setString(0, 0, aText);
+    aLabels.setString(0, 1, "plain");
+    ASSERT_TRUE(aDescription.writeXML(path("u.sml").c_str(), true, true));
+    CDescription aRead;
+    declare(aRead);
+    std::string aMessage;
+    ASSERT_EQ(tlrxCodeOf([&] { EXPECT_TRUE(aRead.readXML(path("u.sml").c_str(), true)); }, &aMessage), 0)
+        << aText << " " << aMessage;
+    EXPECT_STREQ(aRead.getField("Sensor.Name").getString(), aText);
+    EXPECT_STREQ(aRead.getField("Sensor.Labels").getString(0, 0), aText);
+    EXPECT_STREQ(aRead.getField("Sensor.Labels").getString(0, 1), "plain");
+  }
+}
+
+// A header that is not well-formed is not "missing": the reason, with the
+// parser's line, is kept for the caller's message.
+TEST_F(DescriptionXmlTest, ReadErrorTellsWhatHappened) {
+  CDescription aRead;
+  declare(aRead);
+  tlrxWriteFile(path("bad.sml"), "<HEADER_INFO>\n<Sensor>\n</Sens>\n</HEADER_INFO>\n");
+  EXPECT_FALSE(aRead.readFromFile(path("bad").c_str(), false));
+  EXPECT_EQ(aRead.getReadError(), "mismatched tag at line 3 of " + path("bad.sml"));
+  tlrxWriteFile(path("root.sml"), "<OTHER/>\n");
+  EXPECT_FALSE(aRead.readFromFile(path("root").c_str(), false));
+  EXPECT_EQ(aRead.getReadError(), "no root element HEADER_INFO in " + path("root.sml"));
+  tlrxWriteFile(path("text_hdr"), "[RasterInfo]\nNrOfLinesPerImage=3\n");
+  EXPECT_FALSE(aRead.readFromFile(path("text").c_str(), false));
+  EXPECT_EQ(aRead.getReadError(), "section Sensor not found in " + path("text_hdr"));
+  // A missing file keeps no reason (its name says it), a success clears it.
+  EXPECT_FALSE(aRead.readFromFile(path("none").c_str(), false));
+  EXPECT_EQ(aRead.getReadError(), "");
+  tlrxWriteFile(path("good_hdr"), "[Sensor]\nLines=2\n");
+  EXPECT_FALSE(aRead.readFromFile(path("bad").c_str(), false));
+  EXPECT_TRUE(aRead.readFromFile(path("good").c_str(), false));
+  EXPECT_EQ(aRead.getReadError(), "");
 }

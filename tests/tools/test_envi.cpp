@@ -12,6 +12,8 @@
 
 #include <gtest/gtest.h>
 
+#include <unistd.h>
+
 #include <cmath>
 #include <cstdlib>
 #include <sstream>
@@ -138,6 +140,19 @@ TEST_F(EnviHeader, EveryHeaderWriteAddsTheEnviHeader) {
   ASSERT_TRUE(fdfWriteStandardHeader(mDir.file("other_hdr").c_str(), aHeader));
   EXPECT_EQ(tlrxReadFile(mDir.file("other.hdr")), CTLRX_SMALL_FLOAT_TEXT);
   EXPECT_FALSE(tlrxFileExists(mDir.file("other_hdr.hdr")));
+}
+
+// A full disk is said as such: the code stays, the message names the cause.
+TEST_F(EnviHeader, FullDiskIsNamedInTheMessage) {
+  CDescription aHeader;
+  smallFloatRaster(aHeader);
+  const TLRXEnviHeaderWriter aEnvi = fdfSetEnviHeaderWriter(nullptr);
+  ASSERT_TRUE(fdfWriteStandardHeader(mDir.file("full").c_str(), aHeader));
+  fdfSetEnviHeaderWriter(aEnvi);
+  ASSERT_EQ(symlink("/dev/full", mDir.file("full.hdr").c_str()), 0);
+  std::string aMessage;
+  EXPECT_EQ(tlrxCodeOf([&] { fdfWriteRasterHeaderEnvi(mDir.file("full").c_str()); }, &aMessage), 261121);
+  EXPECT_EQ(aMessage, mDir.file("full.hdr") + ": cannot be written (No space left on device)");
 }
 
 TEST_F(EnviHeader, ExcludedNamesGetNoEnviHeaderAndATrace) {

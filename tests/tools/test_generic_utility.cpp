@@ -1,4 +1,5 @@
 // File helpers, companions, copies, list and argument files, text forms.
+#include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
@@ -11,6 +12,7 @@
 #include <cmath>
 #include <limits>
 #include <regex>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace {
@@ -34,14 +36,58 @@ template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullpt
 
 } // namespace
 
-TEST_F(UtilityTest, ExistFileRejectsEmptyAndNotOKNames) {
-  tlrxWriteFile(mDir.file("NotOK_file"), "x");
-  tlrxWriteFile(mDir.file("real"), "x");
+// Only the token "NotOK" stands for no file: a path that merely contains it
+// (a folder "NotOK_runs", a file "scene_NotOK") is an ordinary path.
+TEST_F(UtilityTest, ExistFileRejectsEmptyNamesAndTheNotOKToken) {
+  ASSERT_EQ(mkdir(mDir.file("NotOK_runs").c_str(), 0755), 0);
+  struct SCase {
+    std::string mName;
+    bool mExists;
+  } const aCases[] = {
+      {"", false},
+      {"NotOK", false},
+      {mDir.file("NotOK_file"), true},
+      {mDir.file("NotOK_runs/a"), true},
+      {mDir.file("scene_NotOK"), true},
+      {mDir.file("NotOK"), true},
+      {mDir.file("real"), true},
+      {mDir.file("absent"), false},
+  };
+  for (const SCase &aCase : aCases)
+    if (aCase.mExists)
+      tlrxWriteFile(aCase.mName, "x");
+  char aCurrent[4096];
+  ASSERT_NE(getcwd(aCurrent, sizeof aCurrent), nullptr);
+  ASSERT_EQ(chdir(mDir.path().c_str()), 0); // even a file of that name in the current folder
+  for (const SCase &aCase : aCases) {
+    EXPECT_EQ(fdfExistFile(aCase.mName.c_str()), aCase.mExists) << "[" << aCase.mName << "]";
+    EXPECT_EQ(fdfExistDescriptionFile(aCase.mName.c_str()), aCase.mExists) << "[" << aCase.mName << "]";
+  }
+  ASSERT_EQ(chdir(aCurrent), 0);
   EXPECT_FALSE(fdfExistFile(nullptr));
-  EXPECT_FALSE(fdfExistFile(""));
-  EXPECT_FALSE(fdfExistFile(mDir.file("NotOK_file").c_str()));
-  EXPECT_TRUE(fdfExistFile(mDir.file("real").c_str()));
   EXPECT_EQ(fdfGetFileSize(mDir.file("real").c_str()), 1);
+}
+
+// List files name one input per line: blank lines, a trailing one above
+// all, name no file. Argument files keep theirs (tokens keep positions).
+TEST_F(UtilityTest, NameListsSkipBlankLines) {
+  struct SCase {
+    const char *mContent;
+    std::vector<std::string> mNames;
+  } const aCases[] = {
+      {"a\nb\n", {"a", "b"}},
+      {"a\nb\n\n", {"a", "b"}},
+      {"a\r\n\r\nb\r\n\r\n", {"a", "b"}},
+      {"\n  \na\n   \nb\n#c\n\nd\n", {"a", "b"}},
+      {"  a  \nb", {"a", "b"}},
+      {"\n\n", {}},
+  };
+  for (const SCase &aCase : aCases) {
+    tlrxWriteFile(mDir.file("list.txt"), aCase.mContent);
+    EXPECT_EQ(fdfReadNameList(mDir.file("list.txt").c_str()), aCase.mNames) << "[" << aCase.mContent << "]";
+  }
+  tlrxWriteFile(mDir.file("args.txt"), "title\nlist\n\nroot\n\n");
+  EXPECT_EQ(fdfReadArgumentFile(mDir.file("args.txt").c_str()), std::vector<std::string>({"list", "", "root", ""}));
 }
 
 TEST_F(UtilityTest, DeleteRasterRemovesExistingCompanionsAndSkipsMissingOnes) {
@@ -178,6 +224,59 @@ TEST_F(UtilityTest, SpawnedDeleteHelperRemovesTheFileDetached) {
   EXPECT_FALSE(tlrxFileExists(aFile));
   fdfSetEnvVar("/no/such/dir/", "TELLURIX_EXE_DIR");
   EXPECT_NE(NTLRX_UTILITY_SpawnDeleteFile(aFile.c_str()), 0);
+}
+
+// The runtime's removal and the deferred-deletion helper treat every kind of
+// entry alike: a file or a link goes (the link itself, its target intact,
+// mode and all); a folder stays with its mode, and the helper says so.
+TEST_F(UtilityTest, RemovalTakesALinkItselfAndNeverAFolder) {
+  struct SCase {
+    const char *mKind;
+    bool mRemoved;
+  };
+  const SCase aCases[] = {{"read-only file", true}, {"link to a file", true}, {"link to a folder", true},
+                          {"dangling link", true},  {"folder", false}};
+  tlrxWriteFile(mDir.file("target"), "target");
+  ASSERT_EQ(chmod(mDir.file("target").c_str(), 0444), 0);
+  ASSERT_EQ(mkdir(mDir.file("target_dir").c_str(), 0750), 0);
+  ASSERT_EQ(chmod(mDir.file("target_dir").c_str(), 0750), 0);
+  for (const bool aByHelper : {false, true}) {
+    for (const SCase &aCase : aCases) {
+      const std::string aKind = aCase.mKind;
+      const std::string aEntry = mDir.file("entry");
+      if (aKind == "read-only file") {
+        tlrxWriteFile(aEntry, "x");
+        ASSERT_EQ(chmod(aEntry.c_str(), 0444), 0);
+      } else if (aKind == "link to a file") {
+        ASSERT_EQ(symlink(mDir.file("target").c_str(), aEntry.c_str()), 0);
+      } else if (aKind == "link to a folder") {
+        ASSERT_EQ(symlink(mDir.file("target_dir").c_str(), aEntry.c_str()), 0);
+      } else if (aKind == "dangling link") {
+        ASSERT_EQ(symlink(mDir.file("nowhere").c_str(), aEntry.c_str()), 0);
+      } else {
+        ASSERT_EQ(mkdir(aEntry.c_str(), 0750), 0);
+        ASSERT_EQ(chmod(aEntry.c_str(), 0750), 0);
+      }
+      if (aByHelper) {
+        const STLRXRun aRun = tlrxRun("main_delete_file", {aEntry}, mDir.path());
+        EXPECT_EQ(aRun.mExitStatus, aCase.mRemoved ? 0 : 1) << aKind;
+        EXPECT_EQ(aRun.mOutput, aCase.mRemoved ? "" : "main_delete_file: " + aEntry + ": Is a directory\n") << aKind;
+      } else {
+        EXPECT_EQ(fdfRemoveFile(aEntry.c_str()), aCase.mRemoved) << aKind;
+      }
+      struct stat aStat;
+      EXPECT_EQ(lstat(aEntry.c_str(), &aStat) == 0, !aCase.mRemoved) << aKind << " helper " << aByHelper;
+      if (!aCase.mRemoved) {
+        EXPECT_EQ(aStat.st_mode & 07777, 0750u) << aKind;
+        rmdir(aEntry.c_str());
+      }
+      ASSERT_EQ(stat(mDir.file("target").c_str(), &aStat), 0);
+      EXPECT_EQ(aStat.st_mode & 07777, 0444u) << aKind;
+      EXPECT_EQ(tlrxReadFile(mDir.file("target")), "target");
+      ASSERT_EQ(stat(mDir.file("target_dir").c_str(), &aStat), 0);
+      EXPECT_EQ(aStat.st_mode & 07777, 0750u) << aKind;
+    }
+  }
 }
 
 TEST_F(UtilityTest, DeletionListDeletesOrOnlyTracesAndEmpties) {

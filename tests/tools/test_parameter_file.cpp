@@ -232,3 +232,27 @@ TEST_F(ParameterFileTest, MissingOrUnwritableHeadersRaiseTheirFileErrors) {
   EXPECT_EQ(aCode, CTLRX_ERR_FILE_WRITE);
   EXPECT_EQ(aMessage, aNowhere);
 }
+
+// A header that exists but cannot be read keeps the code 261122, and its
+// message says why instead of suggesting the file could not be opened.
+TEST_F(ParameterFileTest, UnreadableHeadersSayWhyInTheMessage) {
+  struct SCase {
+    const char *mName;
+    std::string mContent;
+    std::string mMessage;
+  } const aCases[] = {
+      {"tag.sml", "<HEADER_INFO>\n<RasterInfo>\n</Raster>\n", "mismatched tag at line 3 of " + mDir.file("tag.sml")},
+      {"cut.sml", "<HEADER_INFO>\n<RasterInfo>\n", "no element found at line 3 of " + mDir.file("cut.sml")},
+      {"root.sml", "<OTHER>\n</OTHER>\n", "no root element HEADER_INFO in " + mDir.file("root.sml")},
+      {"text_hdr", "[Sensor]\n", "section EnvisatDescriptionRecord not found in " + mDir.file("text_hdr")},
+  };
+  for (const SCase &aCase : aCases) {
+    tlrxWriteFile(mDir.file(aCase.mName), aCase.mContent);
+    const std::string aRaster = mDir.file(std::string(aCase.mName).substr(0, std::string(aCase.mName).find_first_of("._")));
+    CDescription aHeader;
+    std::string aMessage;
+    EXPECT_EQ(codeOf([&] { fdfReadStandardHeader(aRaster.c_str(), aHeader); }, &aMessage), CTLRX_ERR_FILE_OPEN)
+        << aCase.mName;
+    EXPECT_EQ(aMessage, aCase.mMessage);
+  }
+}

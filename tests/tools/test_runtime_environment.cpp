@@ -7,10 +7,14 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
+#include <csignal>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <sys/stat.h>
+#include <unistd.h>
 
 namespace {
 
@@ -39,13 +43,35 @@ protected:
   }
 };
 
-int32_t codeOf(void (*theCall)()) {
+int32_t codeOf(void (*theCall)(), std::string *theMessage = nullptr) {
   try {
     theCall();
   } catch (const CErrorExceptionManager &aError) {
+    if (theMessage != nullptr)
+      *theMessage = aError.mMessage;
     return aError.mCode;
   }
   return 0;
+}
+
+mode_t currentUmask() {
+  const mode_t aMask = umask(0);
+  umask(aMask);
+  return aMask;
+}
+
+// Names in theDir that match prefix*suffix, sorted.
+std::vector<std::string> namesLike(const std::string &theDir, const std::string &thePrefix,
+                                   const std::string &theSuffix) {
+  std::vector<std::string> aNames;
+  for (const auto &aEntry : std::filesystem::directory_iterator(theDir)) {
+    const std::string aName = aEntry.path().filename().string();
+    if (aName.size() >= thePrefix.size() + theSuffix.size() && aName.compare(0, thePrefix.size(), thePrefix) == 0 &&
+        aName.compare(aName.size() - theSuffix.size(), theSuffix.size(), theSuffix) == 0)
+      aNames.push_back(aName);
+  }
+  std::sort(aNames.begin(), aNames.end());
+  return aNames;
 }
 
 } // namespace
@@ -169,16 +195,84 @@ TEST_F(EnvironmentTest, HostValueAbove100InterruptsTheRun) {
   EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 0, nullptr); }), 0);
 }
 
-TEST_F(EnvironmentTest, MissingWorkingFileIsWaitedForThenCreated) {
+TEST_F(EnvironmentTest, StartUpCreatesAMissingWorkingFileAndKeepsAPreparedOne) {
+  // SetUp started on a folder without a working file: nobody watches it.
+  EXPECT_EQ(tlrxReadFile(workingFile()), "0\n\n");
+  EXPECT_TRUE(fdfWorkingFileSeen());
+  tlrxWriteFile(workingFile(), "7\nhost\n");
+  tlrxStartLibraryEnvironment(mDir.path());
+  EXPECT_EQ(tlrxReadFile(workingFile()), "7\nhost\n");
+  EXPECT_TRUE(fdfWorkingFileSeen());
+}
+
+TEST_F(EnvironmentTest, StartUpTracesTheWorkingFileItCreated) {
+  std::remove(workingFile().c_str());
+  startWith({{12, "ACTIVE"}});
+  fdfCloseTrace();
+  const std::string aTrace = tlrxReadFile(mDir.file("Process.trace"));
+  EXPECT_NE(aTrace.find("fdfInitEnvironment - Not found the working file, created : " + workingFile() + "\n"),
+            std::string::npos)
+      << aTrace;
+  EXPECT_EQ(tlrxReadFile(workingFile()), "0\n\n");
+}
+
+TEST_F(EnvironmentTest, NeverSeenWorkingFileIsCreatedWithoutWaiting) {
+  const std::string aOther = mDir.file("other.working");
+  fdfSetWorkingFilePath(aOther);
+  EXPECT_FALSE(fdfWorkingFileSeen());
+  getAndSetPerc(-1, 3, "created");
+  EXPECT_TRUE(theSleeps.empty());
+  EXPECT_EQ(tlrxReadFile(aOther), "3\ncreated\n");
+  EXPECT_TRUE(fdfWorkingFileSeen());
+}
+
+// The working file existed (created at start-up) and went away during the run.
+TEST_F(EnvironmentTest, VanishedWorkingFileIsWaitedForThenCreated) {
+  ASSERT_EQ(std::remove(workingFile().c_str()), 0);
   getAndSetPerc(-1, 3, "created");
   EXPECT_EQ(theSleeps, std::vector<double>({0, 1, 2, 3, 4, 5, 6, 7, 8, 9}));
   EXPECT_EQ(tlrxReadFile(workingFile()), "3\ncreated\n");
 }
 
 TEST_F(EnvironmentTest, UncreatableWorkingFileRaisesInterruption) {
-  fdfSetWorkingFilePath(mDir.path() + "no_such_folder/Process.working");
-  EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 3, nullptr); }), 326400);
-  EXPECT_EQ(theSleeps.size(), 20u);
+  // A file that existed in a folder that went away is retried (10 checks, 10
+  // creations); one that never existed is tried once.
+  const std::string aFolder = mDir.file("batch");
+  for (const bool aExisted : {true, false}) {
+    ASSERT_EQ(mkdir(aFolder.c_str(), 0755), 0);
+    tlrxWriteFile(aFolder + "/Process.working", "1\nhost\n");
+    const std::string aPath = aFolder + (aExisted ? "/Process.working" : "/never.working");
+    fdfSetWorkingFilePath(aPath);
+    std::remove((aFolder + "/Process.working").c_str());
+    rmdir(aFolder.c_str());
+    theSleeps.clear();
+    std::string aMessage;
+    EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 3, nullptr); }, &aMessage), 326400) << aExisted;
+    EXPECT_EQ(aMessage, aPath);
+    EXPECT_EQ(theSleeps.size(), aExisted ? 20u : 0u) << aExisted;
+  }
+}
+
+TEST_F(EnvironmentTest, SignalStopsTheRunAtItsNextProgressCheck) {
+  const std::pair<int, const char *> aSignals[] = {{SIGTERM, "Interrupted by SIGTERM"},
+                                                   {SIGINT, "Interrupted by SIGINT"}};
+  for (const auto &aSignal : aSignals) {
+    tlrxStartLibraryEnvironment(mDir.path());
+    tlrxWriteFile(workingFile(), "5\nhost\n");
+    getAndSetPerc(5, 6, nullptr);
+    ASSERT_EQ(std::raise(aSignal.first), 0);
+    // The handler only noted it; the check comes with the next update, even
+    // one that leaves the percentage as it is.
+    EXPECT_EQ(tlrxReadFile(workingFile()), "6\nhost\n");
+    std::string aMessage;
+    EXPECT_EQ(codeOf([] { getAndSetPerc(6, 6, nullptr); }, &aMessage), 326400);
+    EXPECT_EQ(aMessage, aSignal.second);
+    EXPECT_EQ(codeOf([] { fdfCheckInterruption(); }), 326400);
+    EXPECT_EQ(tlrxReadFile(workingFile()), "6\nhost\n");
+  }
+  // A new start-up forgets an earlier request.
+  tlrxStartLibraryEnvironment(mDir.path());
+  EXPECT_EQ(codeOf([] { getAndSetPerc(6, 7, nullptr); }), 0);
 }
 
 TEST_F(EnvironmentTest, CleanEndRemovesTheWorkingFile) {
@@ -188,13 +282,68 @@ TEST_F(EnvironmentTest, CleanEndRemovesTheWorkingFile) {
 }
 
 TEST_F(EnvironmentTest, WorkingFileThatCannotBeRemovedRaises261120AfterThirtyAttempts) {
-  mkdir(workingFile().c_str(), 0755);
+  std::remove(workingFile().c_str()); // the one start-up created
+  ASSERT_EQ(mkdir(workingFile().c_str(), 0755), 0);
   tlrxWriteFile(workingFile() + "/keep", "x");
   EXPECT_EQ(codeOf([] { fdfEndProcess(0, false, false); }), 261120);
   EXPECT_EQ(theSleeps.size(), 30u);
   EXPECT_EQ(theSleeps[9], 0);
   EXPECT_EQ(theSleeps[10], 1);
   EXPECT_EQ(theSleeps[29], 2);
+  // Still a folder that can be entered: its mode was never touched.
+  struct stat aStat;
+  ASSERT_EQ(stat(workingFile().c_str(), &aStat), 0);
+  EXPECT_EQ(aStat.st_mode & 0777, 0755u & ~currentUmask());
+  EXPECT_EQ(tlrxReadFile(workingFile() + "/keep"), "x");
+}
+
+TEST(DatedCopies, NameTakesTheFirstFreeCounter) {
+  CTempDir aDir;
+  const std::string aStamp = "20260101093000";
+  EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process_", aStamp, "_log.txt"), aDir.file("Process_20260101093000_log.txt"));
+  tlrxWriteFile(aDir.file("Process_20260101093000_log.txt"), "first");
+  EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process_", aStamp, "_log.txt"),
+            aDir.file("Process_20260101093000_1_log.txt"));
+  tlrxWriteFile(aDir.file("Process_20260101093000_1_log.txt"), "second");
+  EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process_", aStamp, "_log.txt"),
+            aDir.file("Process_20260101093000_2_log.txt"));
+  // A dangling link takes its name too: a copy would write through it.
+  ASSERT_EQ(symlink(aDir.file("nowhere").c_str(), aDir.file("Process_20260101093000_trace.txt").c_str()), 0);
+  EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process_", aStamp, "_trace.txt"),
+            aDir.file("Process_20260101093000_1_trace.txt"));
+  tlrxWriteFile(aDir.file("Process20260101093000.trace"), "saved");
+  EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process", aStamp, ".trace"), aDir.file("Process20260101093000_1.trace"));
+}
+
+TEST_F(EnvironmentTest, LogsMovedAsideInOneSecondAreAllKept) {
+  for (const char aFill : {'x', 'y', 'z'}) {
+    tlrxWriteFile(mDir.file("Process.log"), std::string(1000001, aFill));
+    fdfEndProcess(0, false, false);
+  }
+  const std::vector<std::string> aCopies = namesLike(mDir.path(), "Process_", "_log.txt");
+  ASSERT_EQ(aCopies.size(), 3u);
+  std::string aFills;
+  for (const std::string &aCopy : aCopies) {
+    const std::string aText = tlrxReadFile(mDir.file(aCopy));
+    ASSERT_EQ(aText.size(), 1000001u) << aCopy;
+    aFills += aText[0];
+  }
+  std::sort(aFills.begin(), aFills.end());
+  EXPECT_EQ(aFills, "xyz");
+}
+
+TEST_F(EnvironmentTest, TraceCopiesOfFailedRunsAreAllKept) {
+  for (int i = 0; i < 3; ++i) {
+    tlrxWriteFile(mDir.file("Process.trace"), "trace " + std::to_string(i));
+    EXPECT_EXIT(fdfEndProcess(456963, false, false), ::testing::ExitedWithCode(8), "");
+  }
+  const std::vector<std::string> aCopies = namesLike(mDir.path(), "Process_", "_trace.txt");
+  ASSERT_EQ(aCopies.size(), 3u);
+  std::vector<std::string> aTexts;
+  for (const std::string &aCopy : aCopies)
+    aTexts.push_back(tlrxReadFile(mDir.file(aCopy)));
+  std::sort(aTexts.begin(), aTexts.end());
+  EXPECT_EQ(aTexts, std::vector<std::string>({"trace 0", "trace 1", "trace 2"}));
 }
 
 TEST_F(EnvironmentTest, LogAboveOneMillionBytesIsMovedAsideUnderALogName) {

@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
+#include <unistd.h>
 
 namespace {
 
@@ -200,20 +201,50 @@ TEST_F(ErrorsTest, WarningStatusIsMinusTwoAndShorterStatusLeavesNoTail) {
   EXPECT_EQ(tlrxReadLines(workingFile() + "_error")[0], "-1");
 }
 
-TEST_F(ErrorsTest, MissingWorkingFileFallsBackToTmpAfterTenAttempts) {
+TEST_F(ErrorsTest, MissingWorkingFileFallsBackToTmpWaitingOnlyForOneThatExisted) {
   static std::vector<double> theSleeps;
-  theSleeps.clear();
-  TLRXSleepFunction aOld = fdfSetSleepFunction([](double theSeconds) { theSleeps.push_back(theSeconds); });
-  fdfWriteErrorFile(326400, "stopped", static_cast<const char *>(nullptr));
-  fdfSetSleepFunction(aOld);
-  ASSERT_EQ(theSleeps.size(), 10u);
-  EXPECT_EQ(theSleeps.front(), 0);
-  EXPECT_EQ(theSleeps.back(), 9);
-  const std::vector<std::string> aTmp = tlrxReadLines(workingFile() + "_tmp");
-  ASSERT_GE(aTmp.size(), 3u);
-  EXPECT_EQ(aTmp[0], "PROCESSING INTERRUPTED");
-  EXPECT_EQ(aTmp[2], "stopped");
-  EXPECT_FALSE(tlrxFileExists(workingFile()));
+  struct SCase {
+    const char *mName;
+    bool mExisted;
+    std::vector<double> mSleeps;
+  };
+  const SCase aCases[] = {{"Process.working", true, {0, 1, 2, 3, 4, 5, 6, 7, 8, 9}}, {"never.working", false, {}}};
+  for (const SCase &aCase : aCases) {
+    const std::string aPath = mDir.file(aCase.mName);
+    fdfSetWorkingFilePath(aPath);
+    // Start-up created Process.working; it goes away during the run.
+    std::remove(aPath.c_str());
+    theSleeps.clear();
+    TLRXSleepFunction aOld = fdfSetSleepFunction([](double theSeconds) { theSleeps.push_back(theSeconds); });
+    fdfWriteErrorFile(326400, "stopped", static_cast<const char *>(nullptr));
+    fdfSetSleepFunction(aOld);
+    EXPECT_EQ(theSleeps, aCase.mSleeps) << aCase.mName;
+    const std::vector<std::string> aTmp = tlrxReadLines(aPath + "_tmp");
+    ASSERT_GE(aTmp.size(), 3u) << aCase.mName;
+    EXPECT_EQ(aTmp[0], "PROCESSING INTERRUPTED");
+    EXPECT_EQ(aTmp[1], " [EC :326400]");
+    EXPECT_EQ(aTmp[2], "stopped");
+    EXPECT_FALSE(tlrxFileExists(aPath));
+    EXPECT_EQ(tlrxReadLines(aPath + "_error")[3], "stopped");
+  }
+}
+
+// No batch or working folder known: the error file keeps the current
+// folder, where hosts look for it, and no "_tmp" is left there.
+TEST_F(ErrorsTest, WithoutAnyFolderOnlyTheErrorFileGoesToTheCurrentFolder) {
+  char aPrevious[4096];
+  ASSERT_NE(getcwd(aPrevious, sizeof aPrevious), nullptr);
+  ASSERT_EQ(chdir(mDir.path().c_str()), 0);
+  fdfSetWorkingFilePath("");
+  EXPECT_FALSE(fdfWriteErrorFile(783360, "TELLURIX_DUMMY_VALUE", static_cast<const char *>(nullptr)));
+  const bool aTmp = tlrxFileExists(mDir.file("_tmp"));
+  const std::vector<std::string> aError = tlrxReadLines(mDir.file("_error"));
+  ASSERT_EQ(chdir(aPrevious), 0);
+  EXPECT_FALSE(aTmp);
+  ASSERT_GE(aError.size(), 4u);
+  EXPECT_EQ(aError[0], "-1");
+  EXPECT_EQ(aError[2], " [EC :783360]");
+  EXPECT_EQ(aError[3], "TELLURIX_DUMMY_VALUE");
 }
 
 TEST_F(ErrorsTest, ErrorHookSeesTheCodeFirst) {

@@ -14,11 +14,14 @@
 #include <sstream>
 #include <string>
 #include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
 #include <vector>
 
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_geotiff_file.h"
 #include "tlrx_geotiff_georef.h"
 #include "tlrx_geotiff_stretch.h"
 #include "tlrx_geotiff_test_support.h"
@@ -799,6 +802,67 @@ TEST_F(GeoTiffTest, ProcessEndingOnAnErrorLeavesNoTemporaryTiff) {
   EXPECT_TRUE(tiffFiles().empty());
 }
 
+TEST(GeoTiffTemporaries, OwnerIsReadOnlyFromATemporaryOfThatTiff) {
+  const std::pair<const char *, int> aCases[] = {
+      {"q.tif.tlrxtmp_4242.aB3xYz", 4242},      {"q.tif.tlrxtmp_1.000000", 1},
+      {"q.tif.tlrxtmp_4242.aB3xY", 0},          {"q.tif.tlrxtmp_4242.aB3xYz7", 0},
+      {"q.tif.tlrxtmp_4242.aB-xYz", 0},         {"q.tif.tlrxtmp_.aB3xYz", 0},
+      {"q.tif.tlrxtmp_0.aB3xYz", 0},            {"q.tif.tlrxtmp_42a.aB3xYz", 0},
+      {"q.tif.tlrxtmp_99999999999.aB3xYz", 0}, {"q.tif.tlrxtmp_4242.aB3xYz.sml", 0},
+      {"r.tif.tlrxtmp_4242.aB3xYz", 0},         {"xq.tif.tlrxtmp_4242.aB3xYz", 0},
+      {"q.tif.aB3xYz", 0},                      {"q.tif", 0},
+  };
+  for (const auto &aCase : aCases)
+    EXPECT_EQ(fdfTiffTemporaryOwner("q.tif", aCase.first), aCase.second) << aCase.first;
+  EXPECT_EQ(fdfTiffTemporaryOwner("", ".tlrxtmp_4242.aB3xYz"), 0);
+}
+
+// A run killed while it wrote q.tif leaves its temporary; the next
+// conversion to q.tif removes it, and nothing that is not one.
+TEST_F(GeoTiffTest, StaleTemporariesOfTheTiffAreRemovedAndNothingElse) {
+  const pid_t aChild = fork();
+  if (aChild == 0)
+    _exit(0);
+  ASSERT_GT(aChild, 0);
+  ASSERT_EQ(waitpid(aChild, nullptr, 0), aChild);
+  const std::string aDead = std::to_string(aChild);
+  const std::string aStale = "q.tif.tlrxtmp_" + aDead + ".abc123";
+  const std::vector<std::string> aKept = {
+      "q.tif.tlrxtmp_1.abc123",                             // owner alive
+      "q.tif.tlrxtmp_" + std::to_string(getpid()) + ".abc124", // this process's own
+      "r.tif.tlrxtmp_" + aDead + ".abc123",                 // another TIFF's
+      "q.tif.tlrxtmp_" + aDead + ".abc12",                  // not such a name
+      "q.tif.abc123",                                       // could be anyone's
+  };
+  tlrxWriteFloatRaster(file("ok"), 9, 9, rampValues(9, 9), "AMPLITUDE");
+  tlrxWriteFile(file(aStale), "stale");
+  for (const std::string &aName : aKept)
+    tlrxWriteFile(file(aName), "keep");
+  tlrxWriteFile(file("target"), "target");
+  const std::string aLink = "q.tif.tlrxtmp_" + aDead + ".lnk123";
+  const std::string aFolder = "q.tif.tlrxtmp_" + aDead + ".dir123";
+  ASSERT_EQ(symlink(file("target").c_str(), file(aLink).c_str()), 0);
+  ASSERT_EQ(mkdir(file(aFolder).c_str(), 0755), 0);
+
+  ASSERT_EQ(convert("ok", "q.tif"), 0);
+  EXPECT_FALSE(tlrxFileExists(file(aStale)));
+  for (const std::string &aName : aKept)
+    EXPECT_EQ(tlrxReadFile(file(aName)), "keep") << aName;
+  struct stat aStat;
+  EXPECT_EQ(lstat(file(aLink).c_str(), &aStat), 0);
+  EXPECT_TRUE(S_ISLNK(aStat.st_mode));
+  EXPECT_EQ(tlrxReadFile(file("target")), "target");
+  EXPECT_TRUE(std::filesystem::is_directory(file(aFolder)));
+  EXPECT_TRUE(tlrxFileExists(file("q.tif")));
+}
+
+TEST_F(GeoTiffTest, TemporaryNamesItsTiffAndItsWriter) {
+  CGeoTiffFile aFile(file("t.tif"), 100);
+  const std::string aName = std::filesystem::path(aFile.temporaryName()).filename().string();
+  EXPECT_EQ(fdfTiffTemporaryOwner("t.tif", aName), fdfProcessId()) << aName;
+  EXPECT_EQ(std::filesystem::path(aFile.temporaryName()).parent_path(), std::filesystem::path(file("t.tif")).parent_path());
+}
+
 TEST_F(GeoTiffTest, ProgressReachesTheWritingPassAndInterruptionStops) {
   const std::vector<float> aValues = rampValues(40, 8);
   tlrxWriteFloatRaster(file("p"), 40, 8, aValues, "AMPLITUDE");
@@ -831,7 +895,29 @@ TEST_F(GeoTiffTest, ArgumentVectorEntry) {
   EXPECT_NEAR(aDefaults.mScale, 254 * kThird / centralThirdMean(aValues, 12, 20), 1e-9);
   const STLRXTiffImage aPlain = tlrxReadTiff(aOut);
 
-  std::vector<std::string> aArgs = {"geotiff", file("v"), file("w.tif"), "0", "2", "3", "not a number", "-1",
+  // Number arguments are read whole: each of these is refused, naming it.
+  const std::pair<std::vector<std::string>, const char *> aBadArguments[] = {
+      {{"0.3x"}, "geotiff argument 3 is not a finite number: [0.3x]"},
+      {{"inf"}, "geotiff argument 3 is not a finite number: [inf]"},
+      {{"0", "2x"}, "geotiff argument 4 is not an integer: [2x]"},
+      {{"0", "1", "4294967299"}, "geotiff argument 5 is not an integer: [4294967299]"},
+      {{"0", "1", "1", "not a number"}, "geotiff argument 6 is not a finite number: [not a number]"},
+      {{"0", "1", "1", "1", "1e999"}, "geotiff argument 7 is not a finite number: [1e999]"},
+  };
+  for (const auto &aBad : aBadArguments) {
+    std::vector<std::string> aArgs = {"geotiff", file("v"), file("bad.tif")};
+    aArgs.insert(aArgs.end(), aBad.first.begin(), aBad.first.end());
+    std::vector<char *> aArgv;
+    for (std::string &aArg : aArgs)
+      aArgv.push_back(aArg.data());
+    const auto aRefused = raised([&] { make_tiff(int(aArgv.size()), aArgv.data()); });
+    ASSERT_TRUE(aRefused.has_value()) << aBad.second;
+    EXPECT_EQ(aRefused->mCode, CTLRX_ERR_TIFF_ARGUMENTS);
+    EXPECT_STREQ(aRefused->mMessage, aBad.second);
+    EXPECT_FALSE(tlrxFileExists(file("bad.tif")));
+  }
+
+  std::vector<std::string> aArgs = {"geotiff", file("v"), file("w.tif"), "0", "2", "3", " 1 ", "-1",
                                     "ignored", "OK", "ok"};
   std::vector<char *> aArgv;
   for (std::string &aArg : aArgs)

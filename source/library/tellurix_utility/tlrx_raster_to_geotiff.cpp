@@ -8,6 +8,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_file.h"
+#include "tlrx_pending_files.h"
 #include "tlrx_geotiff_georef.h"
 #include "tlrx_geotiff_source.h"
 #include "tlrx_geotiff_stretch.h"
@@ -105,7 +106,7 @@ void loadInputHeader(const std::string &theInput, CDescription &theHeader) {
 void openInputRaster(const std::string &theInput, const CDescription &theHeader, CRasterFile &theRaster) {
   // A data file that cannot be read is this conversion's failure, reported
   // before the raster file would report it as its own.
-  FILE *aProbe = std::fopen(theInput.c_str(), "rb");
+  FILE *aProbe = fdfIsRegularFile(theInput.c_str()) ? std::fopen(theInput.c_str(), "rb") : nullptr;
   if (aProbe != nullptr) {
     std::fclose(aProbe);
     theRaster.open_read(theInput.c_str(), theHeader);
@@ -435,12 +436,16 @@ int32_t convert(const STiffRequest &theRequest) {
 
   storeTiffKeys(aHeader, aStretch, aGrid, aLut.get());
   const std::string aHeaderName = writeTiffHeader(aHeader, theRequest.mTiff);
+  // Both belong to the run: a run that fails later removes them with its
+  // other results.
+  fdfAddPendingFile(aHeaderName);
   try {
     aTiff.commit();
   } catch (...) {
     std::remove(aHeaderName.c_str()); // no header for a TIFF that is not there
     throw;
   }
+  fdfAddPendingFile(theRequest.mTiff);
   reportSummary(theRequest, aSample, aStretch);
   return 0;
 }
@@ -451,15 +456,21 @@ bool argumentGiven(int theArgc, char **theArgv, int thePosition) {
   return thePosition < theArgc && theArgv[thePosition] != nullptr;
 }
 
+// A given number argument is read whole: "2x" is refused, not taken as 2.
 int32_t integerArgument(int theArgc, char **theArgv, int thePosition, int32_t theDefault) {
-  int aValue = theDefault;
-  if (argumentGiven(theArgc, theArgv, thePosition) && std::sscanf(theArgv[thePosition], "%d", &aValue) != 1)
-    aValue = theDefault;
+  int32_t aValue = theDefault;
+  if (argumentGiven(theArgc, theArgv, thePosition) && !fdfParseWholeInteger(theArgv[thePosition], aValue))
+    TLRX_RAISE_F(CTLRX_ERR_TIFF_ARGUMENTS, "geotiff argument %d is not an integer: [%.200s]", thePosition,
+                 theArgv[thePosition]);
   return aValue;
 }
 
 double decimalArgument(int theArgc, char **theArgv, int thePosition, double theDefault) {
-  return argumentGiven(theArgc, theArgv, thePosition) ? std::strtod(theArgv[thePosition], nullptr) : theDefault;
+  double aValue = theDefault;
+  if (argumentGiven(theArgc, theArgv, thePosition) && !fdfParseWholeDouble(theArgv[thePosition], aValue, true))
+    TLRX_RAISE_F(CTLRX_ERR_TIFF_ARGUMENTS, "geotiff argument %d is not a finite number: [%.200s]", thePosition,
+                 theArgv[thePosition]);
+  return aValue;
 }
 
 bool okArgument(int theArgc, char **theArgv, int thePosition) {
@@ -510,10 +521,7 @@ int32_t make_tiff(int theArgc, char **theArgv) {
   const double aSaturation = decimalArgument(theArgc, theArgv, CTLRXGC_SAT_DEF_POS, CTLRX_TIFF_DEFAULT_SATURATION);
   const int32_t aColReduction = integerArgument(theArgc, theArgv, CTLRXGC_COLS_REDUCTION_POS, 1);
   const int32_t aRowReduction = integerArgument(theArgc, theArgv, CTLRXGC_ROWS_REDUCTION_POS, 1);
-  double aGain = 1.0;
-  if (argumentGiven(theArgc, theArgv, CTLRXGC_SCALE_IN_POS) &&
-      std::sscanf(theArgv[CTLRXGC_SCALE_IN_POS], "%lf", &aGain) != 1)
-    aGain = 1.0;
+  const double aGain = decimalArgument(theArgc, theArgv, CTLRXGC_SCALE_IN_POS, 1.0);
   const double aExponent = decimalArgument(theArgc, theArgv, CTLRXGC_EXPONENT_POS, 1.0);
   const bool aInvertCols = okArgument(theArgc, theArgv, CTLRXGC_COLS_INVERT_POS);
   const bool aInvertRows = okArgument(theArgc, theArgv, CTLRXGC_ROWS_INVERT_POS);

@@ -8,9 +8,11 @@
 #include "quick_and_dirty.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_to_geotiff.h"
+#include "tlrx_result_files.h"
 #include "tlrx_step_runner.h"
 
 #include <string>
@@ -54,9 +56,19 @@ int32_t fdfRunCorrelation(const char *theArguments) {
   if (aTokens.size() < CTLRX_CORR_TOKENS)
     return 456962;
   fdfTraceTokens(aTokens, CTLRX_CORR_TOKENS);
+  const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_CORR_TIFF]);
+  if (aTiff) // a bad saturation stops the run before anything is computed
+    fdfRealToken(aTokens[CTLRX_CORR_SATURATION].c_str(), "saturation", CTLRX_ERR_PARAMETER_FILE);
+  CRunFiles aFiles;
+  aFiles.addRead(theArguments);
+  aFiles.addInput(aTokens[CTLRX_CORR_INPUT1]);
+  aFiles.addInput(aTokens[CTLRX_CORR_INPUT2]);
+  aFiles.addResult(aTokens[CTLRX_CORR_ROOT] + theNormSuffix, false);
+  aFiles.addResult(aTokens[CTLRX_CORR_ROOT], aTiff);
+  aFiles.refuseClashes(456962);
   CStepRunner aRunner(fdfCorrelationSteps(fdfIsSwitchOn(aTokens[CTLRX_CORR_CLOSE])), "INT");
   std::vector<int> aPlan = {CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP};
-  if (fdfIsSwitchOn(aTokens[CTLRX_CORR_TIFF]))
+  if (aTiff)
     aPlan.push_back(CTLRX_CORR_TIFF_STEP);
   return aRunner.run(aPlan, [&](int, int theStep) { return fdfCorrelationArguments(aTokens, theStep); });
 }

@@ -11,6 +11,7 @@
 #include "tlrx_resampling_kernels.h"
 #include "tlrx_temporal_features.h"
 
+#include <algorithm>
 #include <exception>
 #include <string>
 
@@ -61,7 +62,13 @@ STemporalRequest fdfReadRequest(const CDescription &theParameters, const char *t
     fdfTraceMessage("Need at  least an input file: ");
     TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, theFile);
   }
+  aRequest.mParameterFile = theFile;
   aRequest.mRoot = theParameters.getFieldWithValue(fdfKey("out_root_file_name").c_str()).getString();
+  // An empty root would scatter "_mea" and the rest over the current folder.
+  if (aRequest.mRoot.empty()) {
+    fdfLogMessage("\nEmpty out_root_file_name: [%s]", theFile);
+    TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, fdfKey("out_root_file_name").c_str());
+  }
   const CDescriptionField *aInterpolation = fdfSetting(theParameters, "interp_type");
   bool aKnown = false;
   aRequest.mInterpolation =
@@ -73,6 +80,11 @@ STemporalRequest fdfReadRequest(const CDescription &theParameters, const char *t
   aRequest.mDecibels = fdfSwitch(theParameters, "out_db");
   for (int f = 0; f < CTLRX_TF_COUNT; ++f)
     aRequest.mOutputs[f] = fdfSwitch(theParameters, fdfTemporalOutput(f).mSwitch);
+  // A run that writes nothing is no success a host could rely on.
+  if (std::none_of(aRequest.mOutputs, aRequest.mOutputs + CTLRX_TF_COUNT, [](bool theOn) { return theOn; })) {
+    fdfLogMessage("\nNo output is switched on: [%s]", theFile);
+    TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, "MAIN_CMD: no output switch (mean ... date_min_before_max) is OK");
+  }
   aRequest.mMakeTiff = fdfSwitch(theParameters, "make_tiff");
   // Without a saturation the conversion takes its own default (0 selects it).
   const CDescriptionField *aSaturation = fdfSetting(theParameters, "saturation_default");

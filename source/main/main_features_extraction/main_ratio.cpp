@@ -9,6 +9,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_to_geotiff.h"
+#include "tlrx_result_files.h"
 #include "tlrx_step_runner.h"
 
 
@@ -29,13 +30,26 @@ int32_t fdfRunRatio(const char *theArguments) {
     return 456962;
   fdfTraceTokens(aTokens, CTLRX_RATIO_TOKENS);
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_RATIO_TIFF]);
-  const std::vector<std::string> aFiles = fdfReadLineList(aTokens[CTLRX_RATIO_LIST].c_str(), true);
+  // Bad numbers stop the run before any result is written.
+  fdfIntegerToken(aTokens[CTLRX_RATIO_DB].c_str(), "decibel switch", CTLRX_ERR_PARAMETER_FILE);
+  if (aTiff)
+    fdfRealToken(aTokens[CTLRX_RATIO_SATURATION].c_str(), "saturation", CTLRX_ERR_PARAMETER_FILE);
+  const std::vector<std::string> aFiles = fdfReadNameList(aTokens[CTLRX_RATIO_LIST].c_str());
   fdfTraceMessage("Number of FILES = %d\n", static_cast<int>(aFiles.size()));
   // Nothing to compute is not a success the host could mistake for results.
   if (aFiles.size() < 2) {
     fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aFiles.size()));
     TLRX_RAISE(456962, aTokens[CTLRX_RATIO_LIST].c_str());
   }
+  CRunFiles aRunFiles;
+  aRunFiles.addRead(theArguments);
+  aRunFiles.addRead(aTokens[CTLRX_RATIO_LIST]);
+  for (size_t k = 0; k < aFiles.size(); ++k) {
+    aRunFiles.addInput(aFiles[k]);
+    if (k + 1 < aFiles.size())
+      aRunFiles.addResult(fdfRatioPairName(aTokens[CTLRX_RATIO_ROOT], static_cast<int>(k), aFiles.size()), aTiff);
+  }
+  aRunFiles.refuseClashes(456962);
   int aPair = -1;
   return aRunner.run(fdfRatioPlan(aFiles.size(), aTiff), [&](int, int theStep) -> std::vector<std::string> {
     if (theStep == 0) {

@@ -11,6 +11,8 @@
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_to_geotiff.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
+#include "tlrx_standard_header.h"
 
 #include <algorithm>
 #include <cmath>
@@ -75,12 +77,6 @@ void fdfMakeDateHeader(CDescription &theHeader, const std::vector<STLRXDate> &th
     aGreen.setInteger(i, aG);
     aBlue.setInteger(i, aB);
   }
-}
-
-void fdfWriteMinMaxHeader(const std::string &theRaster, CDescription &theHeader) {
-  fdfRemoveFile(fdfHeaderFileName(theRaster).c_str());
-  fdfRemoveFile(fdfXmlHeaderFileName(fdfHeaderFileName(theRaster)).c_str());
-  fdfWriteResultHeader(theRaster, theHeader, 261124);
 }
 
 STLRXDate fdfReadInputDate(const std::string &theName) {
@@ -178,7 +174,10 @@ int32_t fdfRunMinMax(const char *theArguments) {
   if (aTokens.size() < CTLRX_MINMAX_TOKENS)
     TLRX_RAISE(456962, fdfJoin(aTokens).c_str());
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_MINMAX_TIFF]);
-  std::vector<std::string> aNames = fdfReadLineList(aTokens[CTLRX_MINMAX_LIST].c_str(), true);
+  // A bad saturation stops the run before any result is written.
+  const double aSaturation =
+      aTiff ? fdfRealToken(aTokens[CTLRX_MINMAX_SATURATION].c_str(), "saturation", CTLRX_ERR_PARAMETER_FILE) : 0.0;
+  std::vector<std::string> aNames = fdfReadNameList(aTokens[CTLRX_MINMAX_LIST].c_str());
   if (aNames.size() < 2) {
     fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aNames.size()));
     TLRX_RAISE(456962, aTokens[CTLRX_MINMAX_LIST].c_str());
@@ -186,20 +185,28 @@ int32_t fdfRunMinMax(const char *theArguments) {
   const int32_t aInputs = static_cast<int32_t>(aNames.size());
   const int32_t aBuffer = 4000 / (aInputs + 4);
 
-  CDescription aTemplate;
-  fdfLoadInputHeader(aNames[0], aTemplate);
+  CDescription aValueHeader;
+  fdfLoadInputHeader(aNames[0], aValueHeader);
   const std::vector<STLRXDate> aDates = fdfOrderChronologically(aNames);
 
   const std::string &aRoot = aTokens[CTLRX_MINMAX_ROOT];
   std::vector<std::string> aResults;
-  for (const char *aSuffix : theResultSuffixes)
+  CRunFiles aFiles;
+  aFiles.addRead(theArguments);
+  aFiles.addRead(aTokens[CTLRX_MINMAX_LIST]);
+  for (const char *aSuffix : theResultSuffixes) {
     aResults.push_back(aRoot + aSuffix);
-  fdfMakeValueHeader(aTemplate);
-  fdfWriteMinMaxHeader(aResults[0], aTemplate);
-  fdfWriteMinMaxHeader(aResults[1], aTemplate);
-  fdfMakeDateHeader(aTemplate, aDates);
-  fdfWriteMinMaxHeader(aResults[2], aTemplate);
-  fdfWriteMinMaxHeader(aResults[3], aTemplate);
+    aFiles.addResult(aResults.back(), aTiff);
+  }
+  for (const std::string &aName : aNames)
+    aFiles.addInput(aName);
+  aFiles.refuseClashes(456962);
+  fdfMakeValueHeader(aValueHeader);
+  CDescription aDateHeader;
+  fdfDeclareStandardHeader(aDateHeader);
+  aDateHeader = aValueHeader;
+  fdfMakeDateHeader(aDateHeader, aDates);
+  CDescription *const aHeaders[4] = {&aValueHeader, &aValueHeader, &aDateHeader, &aDateHeader};
 
   std::vector<std::unique_ptr<CRasterFile>> aIn;
   std::vector<double> aNulls;
@@ -215,12 +222,12 @@ int32_t fdfRunMinMax(const char *theArguments) {
   }
   const int32_t aLines = aIn[0]->getNrOfLinesPerImage();
   const int32_t aPixels = aIn[0]->getNrOfPixelsPerLine();
-  CRasterFile aOut[4];
+  std::vector<std::unique_ptr<CResultRaster>> aOut;
   for (int k = 0; k < 4; ++k) {
-    aOut[k].open_write(aResults[k].c_str());
-    aOut[k].setBuffer(aBuffer);
+    aOut.push_back(std::make_unique<CResultRaster>(aResults[k], *aHeaders[k]));
+    aOut[k]->file().setBuffer(aBuffer);
   }
-  const float aNull = static_cast<float>(aOut[0].getDummyVal());
+  const float aNull = static_cast<float>(aOut[0]->file().getDummyVal());
 
   std::vector<std::vector<float>> aRows(aInputs, std::vector<float>(aPixels));
   std::vector<float> aResultRows(4 * static_cast<size_t>(aPixels));
@@ -234,18 +241,18 @@ int32_t fdfRunMinMax(const char *theArguments) {
       aIn[i]->getLine(aRows[i].data(), l);
     fdfMinMaxLine(aRows, aNulls, aPixels, aNull, aValid, aLine);
     for (int k = 0; k < 4; ++k)
-      aOut[k].putLine(l, &aResultRows[k * static_cast<size_t>(aPixels)]);
+      aOut[k]->file().putLine(l, &aResultRows[k * static_cast<size_t>(aPixels)]);
   }
-  for (auto &aRaster : aOut)
-    aRaster.close();
   for (auto &aRaster : aIn)
     aRaster->close();
+  for (int k = 0; k < 4; ++k)
+    aOut[k]->commit(*aHeaders[k], 261124);
 
   if (aTiff)
     for (const std::string &aResult : aResults) {
       fdfSetProcessName("Generate tiff ...");
       getAndSetPerc(-1, 0, nullptr);
-      fdfRasterQuickLook(aResult.c_str(), std::atof(aTokens[CTLRX_MINMAX_SATURATION].c_str()));
+      fdfRasterQuickLook(aResult.c_str(), aSaturation);
     }
   return 0;
 }

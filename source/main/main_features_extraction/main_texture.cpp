@@ -5,9 +5,11 @@
 #include "texture.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_to_geotiff.h"
+#include "tlrx_result_files.h"
 #include "tlrx_step_runner.h"
 
 #include <string>
@@ -32,8 +34,16 @@ int32_t fdfRunTexture(const char *theArguments) {
   if (aTokens.size() < CTLRX_TEXTURE_TOKENS)
     return 456962;
   fdfTraceTokens(aTokens, CTLRX_TEXTURE_TOKENS);
+  const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_TEXTURE_TIFF]);
+  if (aTiff) // a bad saturation stops the run before the texture is computed
+    fdfRealToken(aTokens[CTLRX_TEXTURE_SATURATION].c_str(), "saturation", CTLRX_ERR_PARAMETER_FILE);
+  CRunFiles aFiles;
+  aFiles.addRead(theArguments);
+  aFiles.addInput(aTokens[CTLRX_TEXTURE_INPUT]);
+  aFiles.addResult(aTokens[CTLRX_TEXTURE_OUTPUT], aTiff);
+  aFiles.refuseClashes(456962);
   std::vector<int> aPlan = {CTLRX_TEXTURE_STEP};
-  if (fdfIsSwitchOn(aTokens[CTLRX_TEXTURE_TIFF]))
+  if (aTiff)
     aPlan.push_back(CTLRX_TEXTURE_TIFF_STEP);
   return aRunner.run(aPlan, [&](int, int theStep) -> std::vector<std::string> {
     const std::string &aOutput = aTokens[CTLRX_TEXTURE_OUTPUT];

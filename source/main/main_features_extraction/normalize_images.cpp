@@ -8,6 +8,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_step.h"
 #include "tlrx_window_sums.h"
@@ -21,9 +22,9 @@ int normalize_images(int argc, char **argv) {
     fdfTracePairStepUsage(argc, argv, false);
     TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, nullptr);
   }
-  const double aDummy = std::atof(argv[4]);
-  const int32_t aRows = std::atoi(argv[5]);
-  const int32_t aCols = std::atoi(argv[6]);
+  const double aDummy = fdfRealToken(argv[4], "dummy value", CTLRX_ERR_PARAMETER_FILE);
+  const int32_t aRows = fdfIntegerToken(argv[5], "window rows", CTLRX_ERR_WINDOW_SIZE);
+  const int32_t aCols = fdfIntegerToken(argv[6], "window columns", CTLRX_ERR_WINDOW_SIZE);
   fdfTraceMessage("  input file 1 name   : %s\n  input file 2 name   : %s\n  output image file name  : %s\n"
                   "  dummy value             :%g\n  rows number in texture window : %d\n"
                   "  cols number in texture window : %d\n",
@@ -40,8 +41,7 @@ int normalize_images(int argc, char **argv) {
   aSecond.open();
   CDescription aHeader;
   fdfMakeWindowResultHeader(aHeader, aFirst.header(), aDummy, nullptr);
-  CRasterFile aOutput;
-  aOutput.open_write(argv[3], aHeader);
+  CResultRaster aOutput(argv[3], aHeader);
 
   const int32_t aPixels = aFirst.pixels();
   CWindowRing aRing(aRows, aCols, aPixels, CTLRX_NORMALIZE_CHANNELS);
@@ -62,14 +62,13 @@ int normalize_images(int argc, char **argv) {
       },
       [&](int32_t theLine) {
         aComputed += fdfNormalizeLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());
-        aOutput.putLine(theLine, aLine.data());
+        aOutput.file().putLine(theLine, aLine.data());
       },
       &aProgress);
   aFirst.close();
   aSecond.close();
-  aOutput.close();
   fdfTraceSignificantCount(aDummy, aComputed);
   fdfTraceMessage("writing the output parameter file %s\n", argv[3]);
-  fdfWriteResultHeader(argv[3], aHeader, CTLRX_ERR_FILE_COPY);
+  aOutput.commit(aHeader, CTLRX_ERR_FILE_COPY);
   return 0;
 }

@@ -9,6 +9,7 @@
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_step.h"
 #include "tlrx_window_sums.h"
@@ -34,8 +35,8 @@ int quick_and_dirty(int argc, char **argv) {
     fdfTracePairStepUsage(argc, argv, true);
     TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, nullptr);
   }
-  const int32_t aRows = std::atoi(argv[6]);
-  const int32_t aCols = std::atoi(argv[7]);
+  const int32_t aRows = fdfIntegerToken(argv[6], "window rows", CTLRX_ERR_WINDOW_SIZE);
+  const int32_t aCols = fdfIntegerToken(argv[7], "window columns", CTLRX_ERR_WINDOW_SIZE);
   fdfTraceMessage("  input file 1 name   : %s\n  input file 2 name   : %s\n  Norm image file name  : %s\n"
                   "  output image file name  : %s\n  rows number in texture window : %d\n"
                   "  cols number in texture window : %d\n",
@@ -57,8 +58,7 @@ int quick_and_dirty(int argc, char **argv) {
   CDescription aHeader;
   fdfMakeWindowResultHeader(aHeader, aFirst.header(), fdfGetDummyValueDouble(), "COHERENCE");
   fdfStampPairInputs(aHeader, aFirst, aSecond);
-  CRasterFile aOutput;
-  aOutput.open_write(argv[4], aHeader);
+  CResultRaster aOutput(argv[4], aHeader);
 
   const int32_t aPixels = aFirst.pixels();
   CWindowRing aRing(aRows, aCols, aPixels, CTLRX_CORRELATION_CHANNELS);
@@ -79,17 +79,16 @@ int quick_and_dirty(int argc, char **argv) {
       },
       [&](int32_t theLine) {
         fdfCorrelationLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data(), aStats);
-        aOutput.putLine(theLine, aLine.data());
+        aOutput.file().putLine(theLine, aLine.data());
       },
       &aProgress);
   aFirst.close();
   aSecond.close();
   aNorm.close();
-  aOutput.close();
   fdfTraceCorrelationStats(aStats);
   fdfTraceSignificantCount(aNull, aStats.mComputed);
   fdfTraceMessage("writing the output parameter file %s\n", argv[4]);
-  fdfWriteResultHeader(argv[4], aHeader, CTLRX_ERR_FILE_COPY);
+  aOutput.commit(aHeader, CTLRX_ERR_FILE_COPY);
   return 0;
 }
 

@@ -9,6 +9,7 @@
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_window_step.h"
 
@@ -112,7 +113,7 @@ int ratio_images(int argc, char **argv) {
     TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, nullptr);
   }
   const std::string aOutput = fdfRatioOutputName(argv[3]);
-  const bool aDecibel = argc > 4 && std::atoi(argv[4]) != 0;
+  const bool aDecibel = argc > 4 && fdfIntegerToken(argv[4], "decibel switch", CTLRX_ERR_PARAMETER_FILE) != 0;
   if (argc > 4)
     fdfTraceMessage("  db == 1 if the values should be in db (default = 0)\n");
   fdfTraceMessage("  input file 1 name   : %s\n  input file 2 name   : %s\n  output image file name  : %s\n", argv[1],
@@ -133,8 +134,7 @@ int ratio_images(int argc, char **argv) {
   fdfMakeWindowResultHeader(aHeader, aFirst.header(), fdfGetDummyValueDouble(), "RATIO");
   fdfSetHeaderList(aHeader, "RasterInfo.FilesList", {argv[1], argv[2]});
   fdfStampPairInputs(aHeader, aFirst, aSecond);
-  CRasterFile aOut;
-  aOut.open_write(aOutput.c_str(), aHeader);
+  CResultRaster aOut(aOutput.c_str(), aHeader);
 
   const int32_t aLines = aFirst.lines();
   const int32_t aPixels = aFirst.pixels();
@@ -147,13 +147,12 @@ int ratio_images(int argc, char **argv) {
     aSecond.readFloatLine(aLine, aLine2.data());
     fdfRatioLine(aLine1.data(), aFirst.nullValue(), aLine2.data(), aSecond.nullValue(), aPixels, aDecibel, aNull,
                  aResult.data(), aHistogram);
-    aOut.putLine(aLine, aResult.data());
+    aOut.file().putLine(aLine, aResult.data());
   }
   aFirst.close();
   aSecond.close();
-  aOut.close();
   fdfTraceMessage("writing the output parameter file %s\n", aOutput.c_str());
-  fdfWriteResultHeader(aOutput, aHeader, CTLRX_ERR_FILE_COPY);
+  aOut.commit(aHeader, CTLRX_ERR_FILE_COPY);
   // The printed "0.01" line has no class of its own and shows 0.
   for (int i = 0, aClass = 0; i < CTLRX_RATIO_HISTOGRAM_CLASSES; ++i)
     fdfTraceMessage("%s%lld\n", theHistogramLabels[i], i == 3 ? 0LL : aHistogram[aClass++]);

@@ -8,6 +8,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_step.h"
 #include "tlrx_window_sums.h"
@@ -35,8 +36,8 @@ int texture(int argc, char **argv) {
     fdfTraceTextureUsage(argc > 0 ? argv[0] : "texture");
     TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, nullptr);
   }
-  const int32_t aRows = std::atoi(argv[4]);
-  const int32_t aCols = std::atoi(argv[5]);
+  const int32_t aRows = fdfIntegerToken(argv[4], "window rows", CTLRX_ERR_WINDOW_SIZE);
+  const int32_t aCols = fdfIntegerToken(argv[5], "window columns", CTLRX_ERR_WINDOW_SIZE);
   fdfTraceMessage("  input image file name   : %s\n  output image file name  : %s\n"
                   "  rows number in texture window : %d\n  cols number in texture window : %d\n",
                   argv[1], argv[2], aRows, aCols);
@@ -48,8 +49,7 @@ int texture(int argc, char **argv) {
   const float aNull = fdfGetDummyValue();
   CDescription aHeader;
   fdfMakeWindowResultHeader(aHeader, aInput.header(), fdfGetDummyValueDouble(), "NUMBER");
-  CRasterFile aOutput;
-  aOutput.open_write(argv[2], aHeader);
+  CResultRaster aOutput(argv[2], aHeader);
 
   const int32_t aPixels = aInput.pixels();
   CWindowRing aRing(aRows, aCols, aPixels, CTLRX_TEXTURE_CHANNELS);
@@ -66,12 +66,11 @@ int texture(int argc, char **argv) {
       },
       [&](int32_t theLine) {
         fdfTextureLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());
-        aOutput.putLine(theLine, aLine.data());
+        aOutput.file().putLine(theLine, aLine.data());
       },
       &aProgress);
   aInput.close();
-  aOutput.close();
   fdfTraceMessage("writing the output parameter file %s\n", argv[2]);
-  fdfWriteResultHeader(argv[2], aHeader, CTLRX_ERR_FILE_COPY);
+  aOutput.commit(aHeader, CTLRX_ERR_FILE_COPY);
   return 0;
 }

@@ -1,6 +1,7 @@
 // The outermost guard of a command driver: a raised error passes through;
 // any other exception escaping the driver is reported as 913920 with the
-// current process name (the running step) as message.
+// current process name (the running step) as message. The results the
+// driver writes are kept only when it succeeds.
 #pragma once
 
 #include <cstdint>

@@ -52,6 +52,20 @@ double fdfHeaderNullValue(const CDescription &theHeader) {
   return aField != nullptr && aField->holdsValue() ? aField->getDouble() : 0.0;
 }
 
+int32_t fdfIntegerToken(const char *theToken, const char *theWhat, int32_t theCode) {
+  int32_t aValue = 0;
+  if (!fdfParseWholeInteger(theToken, aValue))
+    TLRX_RAISE_F(theCode, "%s: not an integer [%.200s]", theWhat, theToken != nullptr ? theToken : "");
+  return aValue;
+}
+
+double fdfRealToken(const char *theToken, const char *theWhat, int32_t theCode) {
+  double aValue = 0.0;
+  if (!fdfParseWholeDouble(theToken, aValue, true))
+    TLRX_RAISE_F(theCode, "%s: not a number [%.200s]", theWhat, theToken != nullptr ? theToken : "");
+  return aValue;
+}
+
 int32_t fdfHeaderInteger(const CDescription &theHeader, const char *theKey) {
   return theHeader.getField(theKey).getInteger();
 }

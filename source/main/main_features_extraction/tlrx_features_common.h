@@ -17,6 +17,12 @@ std::vector<std::string> fdfStartArgumentCommand(const char *theArguments, const
 // " argv[i] = token" for the first theCount tokens, to the trace.
 void fdfTraceTokens(const std::vector<std::string> &theTokens, size_t theCount);
 
+// Number tokens of the drivers and step programs, read whole (a window of
+// "7abc" or "7.9" is not 7; a real must be finite). Anything else raises
+// theCode with "theWhat: not an integer [token]" ("not a number" for reals).
+int32_t fdfIntegerToken(const char *theToken, const char *theWhat, int32_t theCode);
+double fdfRealToken(const char *theToken, const char *theWhat, int32_t theCode);
+
 // Reads the standard header of raster theRaster (its name + "_hdr", the
 // ".sml" form first). A missing header traces "Error: missing parameter
 // file " and raises 261122 with the header name.

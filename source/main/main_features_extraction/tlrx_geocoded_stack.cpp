@@ -84,7 +84,7 @@ void CGeocodedImageStack::release() {
 bool CGeocodedImageStack::initialise(const char *theListFile, const char *theGridHeader, const char *theInterpType,
                                      int32_t theWindow, int32_t theClip) {
   release();
-  const std::vector<std::string> aNames = fdfReadLineList(theListFile, true);
+  const std::vector<std::string> aNames = fdfReadNameList(theListFile);
   if (aNames.empty()) {
     fdfTraceMessage("Geocoded stack: no input in %s\n", theListFile);
     return false;

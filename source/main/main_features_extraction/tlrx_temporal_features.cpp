@@ -1,8 +1,9 @@
 // The feature worker. Set-up: grid header, temporal order, input sources,
 // output headers; then one pass over the output lines, each pixel's series
 // reduced by CTemporalSeries; then the outputs are closed and converted.
-// The grid header and the list file are temporary; outputs count as pending
-// (removed on failure) until all of them are complete.
+// The grid header and the list file are temporaries of the run in the
+// working folder; outputs are written under temporary names and moved into
+// place once complete, and the whole run's results go if any step fails.
 #include "tlrx_temporal_features.h"
 
 #include "main_search_min_max_value.h"
@@ -15,7 +16,9 @@
 #include "tlrx_geocoded_stack.h"
 #include "tlrx_raster_to_geotiff.h"
 #include "tlrx_pending_files.h"
+#include "tlrx_platform.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_temporal_grid.h"
 
@@ -84,15 +87,15 @@ private:
 // Geocoded inputs, resampled onto the grid by the stack.
 class CGeocodedRows : public CInputRows {
 public:
-  CGeocodedRows(const std::vector<std::string> &theNames, const std::string &theRoot,
+  CGeocodedRows(const std::vector<std::string> &theNames, const std::string &theGrid,
                 const std::string &theInterpolation, CPendingFiles &thePending) {
-    const std::string aList = theRoot + ".txt";
+    const std::string aList = theGrid + ".txt";
     writeList(aList, theNames, thePending);
-    const bool aReady = mStack.initialise(aList.c_str(), theRoot.c_str(), theInterpolation.c_str(), 1, 0);
+    const bool aReady = mStack.initialise(aList.c_str(), theGrid.c_str(), theInterpolation.c_str(), 1, 0);
     fdfRemoveFile(aList.c_str());
     thePending.forgetFile(aList);
     if (!aReady) {
-      const std::string aHeader = fdfHeaderFileName(theRoot);
+      const std::string aHeader = fdfHeaderFileName(theGrid);
       fdfTraceMessage("Error: missing parameter file %s\n", aHeader.c_str());
       TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aHeader.c_str());
     }
@@ -125,11 +128,12 @@ private:
   CGeocodedImageStack mStack;
 };
 
-// One open output with its line buffer.
+// One open output with its header and line buffer.
 struct SOpenOutput {
   int mFeature = 0;
   std::string mName;
-  CRasterFile mFile;
+  CDescription mHeader;
+  std::unique_ptr<CResultRaster> mFile;
   std::vector<float> mValues;
   std::vector<int32_t> mDates;
 };
@@ -142,15 +146,18 @@ struct SOpenOutput {
 // The raster file reports its own open failures; this command reports an
 // output it cannot create as a missing file, before anything is written.
 void fdfCheckCreatable(const std::string &theName) {
-  FILE *aFile = std::fopen(theName.c_str(), "wb");
+  if (fdfIsDirectory(theName))
+    fdfRaiseMissing(theName);
+  const std::string aPart = fdfPartName(theName);
+  fdfAddPendingFile(aPart);
+  FILE *aFile = std::fopen(aPart.c_str(), "wb");
   if (aFile == nullptr)
     fdfRaiseMissing(theName);
   std::fclose(aFile);
 }
 
-void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, const std::string &theReference,
-                   CPendingFiles &thePending) {
-  CDescription aHeader;
+void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, const std::string &theReference) {
+  CDescription &aHeader = theOutput.mHeader;
   fdfDeclareStandardHeader(aHeader);
   aHeader = theGridHeader;
   if (theOutputs[theOutput.mFeature].mDate) {
@@ -159,10 +166,7 @@ void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, co
     fdfStampOtherInfo(aHeader, CTLRX_TF_REFERENCE_KEY, theReference.c_str());
   }
   fdfCheckCreatable(theOutput.mName);
-  thePending.addRaster(theOutput.mName);
-  theOutput.mFile.open_write(theOutput.mName.c_str(), aHeader);
-  if (!fdfWriteStandardHeader(theOutput.mName.c_str(), aHeader, false))
-    fdfRaiseMissing(fdfHeaderFileName(theOutput.mName));
+  theOutput.mFile = std::make_unique<CResultRaster>(theOutput.mName, aHeader);
 }
 
 // Days of the inputs, ordered in time with their names, and the trace of
@@ -202,7 +206,7 @@ namespace {
 // header written beside it.
 std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest &theRequest,
                                                          const CDescription &theGridHeader, int32_t thePixels,
-                                                         const std::string &theReference, CPendingFiles &thePending) {
+                                                         const std::string &theReference) {
   std::vector<std::unique_ptr<SOpenOutput>> aOutputs;
   for (int f = 0; f < CTLRX_TF_COUNT; ++f) {
     if (!theRequest.mOutputs[f])
@@ -214,7 +218,7 @@ std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest 
       aOutput->mDates.assign(thePixels, CTLRX_TF_NO_DATE);
     else
       aOutput->mValues.assign(thePixels, 0.0f);
-    fdfOpenOutput(*aOutput, theGridHeader, theReference, thePending);
+    fdfOpenOutput(*aOutput, theGridHeader, theReference);
     aOutputs.push_back(std::move(aOutput));
   }
   return aOutputs;
@@ -238,9 +242,26 @@ void fdfWriteFeatureLines(CInputRows &theSource, CTemporalSeries &theSeries, int
     theSource.read(l, aRows.data());
     theSeries.line(aRows.data(), thePixels, aOutputLines);
     for (auto &aOutput : theOpen)
-      aOutput->mFile.putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
+      aOutput->mFile->file().putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
                                                         : static_cast<const void *>(aOutput->mDates.data()));
   }
+}
+
+} // namespace
+
+namespace {
+
+// Refuses, before anything is written, an output that would land on an input
+// or on the parameter file.
+void fdfRefuseClashes(const STemporalRequest &theRequest) {
+  CRunFiles aFiles;
+  aFiles.addRead(theRequest.mParameterFile);
+  for (const std::string &aInput : theRequest.mInputs)
+    aFiles.addInput(aInput);
+  for (int f = 0; f < CTLRX_TF_COUNT; ++f)
+    if (theRequest.mOutputs[f])
+      aFiles.addResult(theRequest.mRoot + theOutputs[f].mSuffix, theRequest.mMakeTiff);
+  aFiles.refuseClashes(CTLRX_ERR_PARAMETER_FILE);
 }
 
 } // namespace
@@ -251,11 +272,13 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   getAndSetPerc(-1, 0, nullptr);
   if (theRequest.mInputs.empty())
     TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, theRequest.mRoot.c_str());
-  const std::string &aRoot = theRequest.mRoot;
-  CPendingFiles aPending;
+  fdfRefuseClashes(theRequest);
+  CPendingFiles aRun;
 
-  const STemporalGridInfo aGridInfo = fdfBuildTemporalGrid(theRequest.mInputs, aRoot);
-  aPending.addHeaders(aRoot);
+  // The common grid's header lives under a name of this run only.
+  const std::string aGrid = fdfRunTemporaryName("tlrx_temporal_grid");
+  aRun.addHeaders(aGrid);
+  const STemporalGridInfo aGridInfo = fdfBuildTemporalGrid(theRequest.mInputs, aGrid);
 
   STemporalSettings aSettings;
   aSettings.mNormalize = theRequest.mNormalize;
@@ -272,33 +295,36 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   const std::string aReference = fdfReferenceDateText(aNames[0]);
 
   CDescription aGridHeader;
-  fdfReadStandardHeader(aRoot.c_str(), aGridHeader);
+  fdfReadStandardHeader(aGrid.c_str(), aGridHeader);
   const int32_t aLines = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfLinesPerImage");
   const int32_t aPixels = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfPixelsPerLine");
   aSettings.mNull = fdfHeaderNullValue(aGridHeader);
 
   std::unique_ptr<CInputRows> aSource;
   if (aGridInfo.mGeocoded)
-    aSource = std::make_unique<CGeocodedRows>(aNames, aRoot, theRequest.mInterpolation, aPending);
+    aSource = std::make_unique<CGeocodedRows>(aNames, aGrid, theRequest.mInterpolation, aRun);
   else
     aSource = std::make_unique<CDirectRows>(aNames, aPixels);
-  fdfRemoveHeaderFiles(aRoot);
-  aPending.forgetAll();
+  fdfRemoveHeaderFiles(aGrid);
+  aRun.forgetAll();
 
-  std::vector<std::unique_ptr<SOpenOutput>> aOutputs =
-      fdfOpenOutputs(theRequest, aGridHeader, aPixels, aReference, aPending);
+  std::vector<std::unique_ptr<SOpenOutput>> aOutputs = fdfOpenOutputs(theRequest, aGridHeader, aPixels, aReference);
   CTemporalSeries aSeries(aSettings, aDays, aSource->nulls());
   fdfWriteFeatureLines(*aSource, aSeries, aLines, aPixels, aNames.size(), aOutputs);
   aSource.reset();
 
-  for (auto &aOutput : aOutputs)
-    aOutput->mFile.close();
-  aPending.forgetAll();
+  std::vector<std::string> aWritten;
+  for (auto &aOutput : aOutputs) {
+    aOutput->mFile->commit(aOutput->mHeader, CTLRX_ERR_FILE_OPEN);
+    aWritten.push_back(aOutput->mName);
+  }
+  aOutputs.clear();
   if (theRequest.mMakeTiff)
-    for (auto &aOutput : aOutputs) {
+    for (const std::string &aName : aWritten) {
       fdfSetProcessName(CTLRX_TF_TIFF_PROCESS);
       getAndSetPerc(-1, 0, nullptr);
-      fdfRasterQuickLook(aOutput->mName.c_str(), theRequest.mSaturation);
+      fdfRasterQuickLook(aName.c_str(), theRequest.mSaturation);
     }
+  aRun.forgetAll();
   return 0;
 }

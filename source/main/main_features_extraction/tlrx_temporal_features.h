@@ -23,6 +23,7 @@ const STemporalOutput &fdfTemporalOutput(int theFeature);
 constexpr const char *CTLRX_TF_REFERENCE_KEY = "REFERENCE TIME OF MULTITEMPORAL : ";
 
 struct STemporalRequest {
+  std::string mParameterFile;       // read, never written
   std::vector<std::string> mInputs; // any order
   std::string mRoot;                // output root R
   std::string mInterpolation;       // kernel of geocoded inputs

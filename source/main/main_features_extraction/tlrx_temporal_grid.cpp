@@ -5,6 +5,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_map_grid.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
@@ -49,13 +50,18 @@ void fdfMakeGridHeader(CDescription &theHeader, int32_t theLines, int32_t thePix
 void fdfReadTemporalInputHeader(const std::string &theName, CDescription &theHeader) {
   fdfDeclareStandardHeader(theHeader);
   const std::string aHeader = fdfHeaderFileName(theName);
+  // A missing input is reported as missing, not as a header that failed.
+  if (!fdfExistFile(fdfXmlHeaderFileName(aHeader).c_str()) && !fdfExistFile(aHeader.c_str())) {
+    fdfTraceMessage("Error: missing parameter file %s\n", aHeader.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aHeader.c_str());
+  }
   if (!theHeader.readFromFile(aHeader.c_str(), false)) {
     fdfTraceMessage("Error while reading parameter file %s\n", aHeader.c_str());
     TLRX_RAISE(CTLRX_ERR_FILE_WRITE, aHeader.c_str());
   }
 }
 
-STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs, const std::string &theRoot) {
+STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs, const std::string &theGrid) {
   STemporalGridInfo aInfo;
   CDescription aGridHeader;
   std::vector<SMapGrid> aGrids;
@@ -85,7 +91,7 @@ STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs
   if (aInfo.mGeocoded) {
     SMapGrid aUnion;
     if (!fdfUnionMapGrid(aGrids, aUnion)) {
-      const std::string aName = fdfHeaderFileName(theRoot);
+      const std::string aName = fdfHeaderFileName(theGrid);
       fdfTraceMessage("Error: the union of the input extents is not a usable grid %s\n", aName.c_str());
       TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName.c_str());
     }
@@ -96,8 +102,8 @@ STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs
                     aUnion.mEast0, aUnion.mNorth0, aUnion.mEastStep, aUnion.mNorthStep);
   }
   fdfMakeGridHeader(aGridHeader, aLines, aPixels);
-  if (!fdfWriteStandardHeader(theRoot.c_str(), aGridHeader, false)) {
-    const std::string aName = fdfHeaderFileName(theRoot);
+  if (!fdfWriteStandardHeader(theGrid.c_str(), aGridHeader, false)) {
+    const std::string aName = fdfHeaderFileName(theGrid);
     fdfTraceMessage("Error: missing parameter file %s\n", aName.c_str());
     TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aName.c_str());
   }

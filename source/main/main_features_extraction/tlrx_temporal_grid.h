@@ -17,15 +17,17 @@ struct STemporalGridInfo {
   int32_t mLargestPixels = 0; // largest pixel count of the inputs
 };
 
-// Reads the standard header of input theName. An unreadable header traces
-// "Error while reading parameter file " and raises 261124 with its name.
+// Reads the standard header of input theName. A missing header traces
+// "Error: missing parameter file " and raises 261122; an unreadable one
+// traces "Error while reading parameter file " and raises 261124; both name
+// the header.
 void fdfReadTemporalInputHeader(const std::string &theName, CDescription &theHeader);
 
 // Reads every input header (as listed; unreadable, or without a usable size
 // or registration: 261124 with the header name), checks that all inputs are
 // geocoded or none (261124 with the first differing header), and writes the
-// grid header theRoot + "_hdr" (failure: 261122). The grid header is a copy
+// grid header theGrid + "_hdr" (failure: 261122). The grid header is a copy
 // of the first input's header with the grid's size and registration, FLOAT
 // cells of "NUMBER" units, no calibration or rescaling, and the plain record
 // layout that the results are written with.
-STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs, const std::string &theRoot);
+STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs, const std::string &theGrid);

@@ -4,6 +4,7 @@
 
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_xml_element_tree.h"
 
 #include <cstdio>
@@ -33,7 +34,7 @@ std::string_view fdfTrimLine(std::string_view theLine) {
 bool fdfSplitFileAroundBlock(const char *theFile, size_t theMaxLine, CSectionBlockFinder &theFinder,
                              STLRXSplitFile &theSplit) {
   theSplit = STLRXSplitFile();
-  CFilePtr aFile(std::fopen(theFile, "rb"));
+  CFilePtr aFile(fdfIsRegularFile(theFile) ? std::fopen(theFile, "rb") : nullptr);
   if (!aFile) {
     fdfTraceMessage("\ncannot read %s\n", theFile);
     return false;

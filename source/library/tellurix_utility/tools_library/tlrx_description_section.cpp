@@ -4,6 +4,7 @@
 
 #include <array>
 #include <climits>
+#include <cmath>
 #include <cstring>
 #include <sstream>
 
@@ -135,7 +136,9 @@ SKeyTypeCode parseKeyTypeCode(const std::string &theCode) {
 
 using CFileHandle = std::unique_ptr<FILE, int (*)(FILE *)>;
 
-CFileHandle openForReading(const char *thePath) { return CFileHandle(std::fopen(thePath, "rb"), &std::fclose); }
+CFileHandle openForReading(const char *thePath) {
+  return CFileHandle(fdfIsRegularFile(thePath) ? std::fopen(thePath, "rb") : nullptr, &std::fclose);
+}
 
 bool endsWith(const std::string &theText, const char *theSuffix) {
   const size_t aLen = std::strlen(theSuffix);
@@ -229,8 +232,33 @@ long fdfReadTextLine(FILE *theFile, char *theBuffer, size_t theCapacity) {
   return aAny ? static_cast<long>(aLen) : -1;
 }
 
+bool fdfSetNumberFromText(CDescriptionField &theField, int32_t theRow, int32_t theCol, const char *theText) {
+  const int32_t aType = theField.getValueType();
+  if (aType != CTLRX_DS_INTEGER && aType != CTLRX_DS_DOUBLE)
+    return false;
+  const char *aText = theText != nullptr ? theText : "";
+  int32_t aInteger = 0;
+  double aDouble = 0.0;
+  if (aType == CTLRX_DS_INTEGER && fdfParseWholeInteger(aText, aInteger)) {
+    theField.setInteger(theRow, theCol, aInteger);
+    return true;
+  }
+  // Stored headers hold "-NaN", "nan(0x...)" and the like.
+  if (aType == CTLRX_DS_DOUBLE && (std::strstr(aText, "NaN") != nullptr || std::strstr(aText, "nan") != nullptr)) {
+    theField.setDouble(theRow, theCol, std::nan(""));
+    return true;
+  }
+  if (aType == CTLRX_DS_DOUBLE && fdfParseWholeDouble(aText, aDouble, false)) {
+    theField.setDouble(theRow, theCol, aDouble);
+    return true;
+  }
+  theField.dump();
+  TLRX_RAISE_F(CTLRX_ERR_DS_FIELD_MISSING, "%s: not %s: [%.200s]", theField.getName(),
+               aType == CTLRX_DS_INTEGER ? "an integer" : "a number", aText);
+}
+
 bool fdfExistDescriptionFile(const char *thePath) {
-  if (thePath == nullptr || thePath[0] == '\0' || std::strstr(thePath, "NotOK") != nullptr) {
+  if (thePath == nullptr || thePath[0] == '\0' || std::strcmp(thePath, "NotOK") == 0) {
     return false;
   }
   return fdfExistFile(thePath);

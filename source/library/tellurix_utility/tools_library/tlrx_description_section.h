@@ -84,8 +84,16 @@ int fdfScratchBuffersInUse();
 // bytes stored, or -1 at end of file.
 long fdfReadTextLine(FILE *theFile, char *theBuffer, size_t theCapacity);
 
-// Existence test of description files: an empty path and any path containing
-// "NotOK" count as absent.
+// A number cell from the text of a header or parameter file: a double is
+// NaN when the text contains "NaN" or "nan", otherwise the text must be the
+// number whole, as must an integer's. A text that is not dumps the field
+// and raises 848642 naming the field and the text. False for a field that
+// holds neither integers nor doubles (nothing is set).
+class CDescriptionField;
+bool fdfSetNumberFromText(CDescriptionField &theField, int32_t theRow, int32_t theCol, const char *theText);
+
+// Existence test of description files: an empty path and the token "NotOK"
+// count as absent.
 bool fdfExistDescriptionFile(const char *thePath);
 // The same, and a missing path ending in "_hdr" is also tried with ".sml" in
 // place of "_hdr".
@@ -306,8 +314,13 @@ public:
   bool writeToFile(const char *theName, bool theAlsoText, bool theRaise);
   bool readXML(const char *theFileName, bool theRaiseIfMissing);
   bool writeXML(const char *theFileName, bool theFresh, bool theRaise);
+  // Why the last readFromFile or readXML failed: the parser's error with its
+  // line, a missing root or section, a file that is not a regular file.
+  // Empty after a success and for a missing file (its name says it all).
+  const std::string &getReadError() const { return mReadError; }
 
 private:
   std::vector<std::unique_ptr<CDescriptionSection>> mSections;
   std::string mRootTag;
+  std::string mReadError;
 };

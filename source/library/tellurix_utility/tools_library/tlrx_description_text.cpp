@@ -5,6 +5,7 @@
 #include "tlrx_description_file_lines.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_xml_element_tree.h"
 
 #include <climits>
@@ -192,7 +193,8 @@ private:
   }
 
   // The value of a scalar line: a double-quoted text for strings (up to the
-  // last double quote), otherwise the first token.
+  // last double quote) or their first token; a number is the whole rest of
+  // the line, so that "30 junk" is refused rather than read as 30.
   std::string_view scalarToken(const CDescriptionField &theField, std::string_view theValue) {
     const size_t aBegin = theValue.find_first_not_of(" \t");
     if (aBegin == std::string_view::npos)
@@ -202,6 +204,8 @@ private:
       const size_t aClose = theValue.rfind('"');
       return aClose > 0 ? theValue.substr(1, aClose - 1) : theValue.substr(1);
     }
+    if (theField.getValueType() != CTLRX_DS_STRING)
+      return theValue;
     return firstToken(theValue, " \t");
   }
 
@@ -209,19 +213,9 @@ private:
     mToken.assign(theToken);
     switch (theField.getValueType()) {
     case CTLRX_DS_STRING: theField.setString(theRow, theCol, mToken.c_str()); break;
-    case CTLRX_DS_DOUBLE:
-      theField.setDouble(theRow, theCol,
-                         mToken.find("NaN") != std::string::npos || mToken.find("nan") != std::string::npos
-                             ? std::nan("")
-                             : std::strtod(mToken.c_str(), nullptr));
-      break;
-    case CTLRX_DS_INTEGER: {
-      const long aValue = std::strtol(mToken.c_str(), nullptr, 10);
-      theField.setInteger(theRow, theCol,
-                          static_cast<int32_t>(aValue < INT32_MIN ? INT32_MIN : aValue > INT32_MAX ? INT32_MAX : aValue));
-      break;
-    }
-    default: unusable(theField);
+    default:
+      if (!fdfSetNumberFromText(theField, theRow, theCol, mToken.c_str()))
+        unusable(theField);
     }
   }
 
@@ -388,7 +382,7 @@ private:
 } // namespace
 
 bool fdfReadTextSection(CDescriptionSection &theSection, const char *theFile) {
-  CFilePtr aFile(theFile != nullptr ? std::fopen(theFile, "rb") : nullptr);
+  CFilePtr aFile(fdfIsRegularFile(theFile) ? std::fopen(theFile, "rb") : nullptr);
   if (!aFile)
     return false;
   CScratchBuffer aBuffer(CTLRX_TEXT_FORM_MAX_LINE + 3);

@@ -7,6 +7,7 @@
 #include "tlrx_description_text.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_xml_element_tree.h"
 
 #include <cerrno>
@@ -394,15 +395,9 @@ private:
     }
     if (!theElement.hasText())
       missing(theField);
-    const char *aText = theElement.getText().c_str();
-    if (aType == CTLRX_DS_DOUBLE) {
-      const bool aNaN = std::strstr(aText, "NaN") != nullptr || std::strstr(aText, "nan") != nullptr;
-      theField.setDouble(theRow, theCol, aNaN ? std::nan("") : std::strtod(aText, nullptr));
-    } else if (aType == CTLRX_DS_INTEGER) {
-      const long aValue = std::strtol(aText, nullptr, 10);
-      theField.setInteger(theRow, theCol,
-                          static_cast<int32_t>(aValue < INT32_MIN ? INT32_MIN : aValue > INT32_MAX ? INT32_MAX : aValue));
-    } else {
+    mText.clear();
+    fdfRestoreXmlText(theElement.getText().data(), theElement.getText().size(), mText);
+    if (!fdfSetNumberFromText(theField, theRow, theCol, mText.c_str())) {
       if (isVerbose())
         fdfTraceMessage("Data Type ID :%d\n", aType);
       unusable(theField);
@@ -526,7 +521,7 @@ void setNumber(const CDescription &theDescription, const char *theKey, double th
 }
 
 bool startsWithXml(const char *theFile) {
-  FILE *aFile = std::fopen(theFile, "rb");
+  FILE *aFile = fdfIsRegularFile(theFile) ? std::fopen(theFile, "rb") : nullptr;
   if (aFile == nullptr)
     return false;
   int aChar = 0;
@@ -537,12 +532,14 @@ bool startsWithXml(const char *theFile) {
   return aChar == '<';
 }
 
-bool readTextForm(CDescription &theDescription, const char *theFile, bool theMustExist) {
+// The failing section's name goes to theMissing.
+bool readTextForm(CDescription &theDescription, const char *theFile, bool theMustExist, std::string &theMissing) {
   theDescription.clearValues();
   for (int32_t i = 0; i < theDescription.getSectionCount(); ++i) {
     CDescriptionSection *aSection = theDescription.getSection(i);
     if (fdfReadTextSection(*aSection, theFile))
       continue;
+    theMissing = aSection->getName();
     fdfTraceMessage(" Not Found : %s\n", aSection->getName());
     if (theMustExist) {
       theDescription.print(true);
@@ -703,7 +700,9 @@ bool CDescription::readXML(const char *theFileName, bool theRaiseIfMissing) {
   const bool aParsed = aTree.parseFile(theFileName, CTLRX_XML_MAX_LINE);
   if (isVerbose())
     fdfTraceMessage("after ftlrx_xml_parser : %s\n", theFileName);
+  mReadError.clear();
   if (!aParsed) {
+    mReadError = aTree.getErrorText();
     if (theRaiseIfMissing)
       TLRX_RAISE(CTLRX_ERR_XML_PARSE, theFileName);
     return false;
@@ -712,6 +711,7 @@ bool CDescription::readXML(const char *theFileName, bool theRaiseIfMissing) {
   const CXmlElement *aRoot = aTree.getRoot();
   if (aRoot == nullptr || aRoot->getName() != mRootTag) {
     fdfTraceMessage("NOT FOUND this->mInitialTag : %s\n", mRootTag.c_str());
+    mReadError = "no root element " + mRootTag + " in " + theFileName;
     return false;
   }
   CSectionMapper aMapper(theFileName);
@@ -719,6 +719,8 @@ bool CDescription::readXML(const char *theFileName, bool theRaiseIfMissing) {
     CDescriptionSection &aSection = *getSection(i);
     const CXmlElement *aElement = aRoot->findChild(aSection.getName());
     if (aElement != nullptr && !aMapper.map(*aElement, aSection)) {
+      mReadError = std::string("counts of section ") + aSection.getName() + " disagree with its elements in " +
+                   theFileName;
       if (theRaiseIfMissing)
         TLRX_RAISE(CTLRX_ERR_XML_PARSE, theFileName);
       return false;
@@ -767,13 +769,20 @@ bool fdfReadXMLSection(CDescriptionSection &theSection, const char *theFile, boo
 bool CDescription::readFromFile(const char *theName, bool theMustExist) {
   const std::string aHeader = fdfHeaderFileName(theName != nullptr ? theName : "");
   const std::string aXml = fdfXmlHeaderFileName(aHeader);
+  mReadError.clear();
   bool aRead = false;
   if (fdfExistDescriptionFile(aXml.c_str())) {
     aRead = readXML(aXml.c_str(), false);
   } else if (fdfExistDescriptionFile(aHeader.c_str())) {
     // "_hdr" files hold either form.
+    std::string aMissing;
     aRead = (startsWithXml(aHeader.c_str()) && readXML(aHeader.c_str(), false)) ||
-            readTextForm(*this, aHeader.c_str(), theMustExist);
+            readTextForm(*this, aHeader.c_str(), theMustExist, aMissing);
+    if (aRead)
+      mReadError.clear();
+    else if (mReadError.empty())
+      mReadError = fdfIsRegularFile(aHeader.c_str()) ? "section " + aMissing + " not found in " + aHeader
+                                                      : aHeader + " is not a regular file";
   } else {
     if (isVerbose())
       fdfTraceMessage(" Not Found\n");

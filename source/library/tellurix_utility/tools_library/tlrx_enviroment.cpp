@@ -8,6 +8,7 @@
 #include "tlrx_platform.h"
 #include "tlrx_time_man_utility.h"
 
+#include <cerrno>
 #include <cmath>
 #include <cstdarg>
 #include <cstdio>
@@ -17,6 +18,7 @@
 #include <fcntl.h>
 #include <limits>
 #include <memory>
+#include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
 #include <vector>
@@ -30,6 +32,9 @@ std::vector<std::string> theDeferredDeletions;
 char theProcessName[CTLRX_MAX_LEN_PROCESS_NAME + 1] = " -";
 std::string theBanner;
 std::string theWorkingFilePath;
+// The working file existed at some time in this run (the host's, or the one
+// start-up created); only then are its absences waited out.
+bool theWorkingFileSeen = false;
 float theDummyValue = 0.0f;
 double theDummyValueDouble = 0.0;
 bool theTracing = false;
@@ -54,6 +59,30 @@ std::string fdfWithSeparator(const char *theDir) {
   if (aDir.empty() || (aDir.back() != '/' && aDir.back() != '\\'))
     aDir += CTLRX_PATH_SEPARATOR;
   return aDir;
+}
+
+// Working file of the batch folder theBatchDir ("" when none is known).
+std::string fdfWorkingFileIn(const std::string &theBatchDir) {
+  if (theBatchDir.empty())
+    return std::string();
+  const char *aName = std::getenv("TELLURIX_WORKING_FILE");
+  return theBatchDir + (aName != nullptr ? aName : "Process.working");
+}
+
+// Before the configuration is read, only the process environment can say
+// where the host looks for the status files.
+std::string fdfWorkingFileFromEnvironment() {
+  for (const char *aVariable : {"TELLURIX_BATCH_DIR", "TELLURIX_WORKING_DIR"})
+    if (const char *aDir = std::getenv(aVariable))
+      if (aDir[0] != '\0')
+        return fdfWorkingFileIn(fdfWithSeparator(aDir));
+  return std::string();
+}
+
+// Taken also by a dangling link, which a copy would write through.
+bool fdfNameTaken(const std::string &theName) {
+  struct stat aStat;
+  return lstat(theName.c_str(), &aStat) == 0;
 }
 
 bool fdfVWrite(FILE *theStream, const char *theFormat, va_list theArgs) {
@@ -226,7 +255,20 @@ void fdfSetDummyValue(const char *theSetting) {
 }
 
 const std::string &fdfGetWorkingFilePath() { return theWorkingFilePath; }
-void fdfSetWorkingFilePath(const std::string &thePath) { theWorkingFilePath = thePath; }
+void fdfSetWorkingFilePath(const std::string &thePath) {
+  theWorkingFilePath = thePath;
+  theWorkingFileSeen = fdfNameTaken(thePath);
+}
+
+bool fdfWorkingFileSeen() { return theWorkingFileSeen; }
+
+std::string fdfFreeDatedName(const std::string &theDir, const char *thePrefix, const std::string &theStamp,
+                             const char *theSuffix) {
+  std::string aName = theDir + thePrefix + theStamp + theSuffix;
+  for (int aCount = 1; fdfNameTaken(aName); ++aCount)
+    aName = theDir + thePrefix + theStamp + "_" + std::to_string(aCount) + theSuffix;
+  return aName;
+}
 
 bool fdfLogMessage(const char *theFormat, ...) {
   va_list aArgs;
@@ -276,7 +318,8 @@ void fdfCloseTrace() {
   if (!fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR"))
     return;
   if (fdfExistFile((aDir + "Process.trace_save").c_str())) {
-    fdfCopyFile((aDir + "Process.trace").c_str(), (aDir + "Process" + fdfGetTimeStamp() + ".trace").c_str(), true);
+    fdfCopyFile((aDir + "Process.trace").c_str(), fdfFreeDatedName(aDir, "Process", fdfGetTimeStamp(), ".trace").c_str(),
+                true);
     fdfSleep(1);
   }
 }
@@ -302,8 +345,33 @@ void fdfCloseTellurixLog() {
   theLog = nullptr;
 }
 
+namespace {
+
+// Nobody prepared the working file (a person at a terminal, a rerun after a
+// success removed it), so nobody watches it: create it now instead of
+// waiting for it at every progress update.
+void fdfPrepareWorkingFile() {
+  const int aFd = open(theWorkingFilePath.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
+  if (aFd < 0) {
+    if (errno == EEXIST)
+      theWorkingFileSeen = true;
+    else
+      fdfTraceMessage("fdfInitEnvironment - Not found the working file, cannot create : %s\n", theWorkingFilePath.c_str());
+    return;
+  }
+  const char aStatus[] = "0\n\n";
+  const bool aWritten = write(aFd, aStatus, sizeof aStatus - 1) == static_cast<ssize_t>(sizeof aStatus - 1);
+  close(aFd);
+  theWorkingFileSeen = aWritten;
+  fdfTraceMessage("fdfInitEnvironment - Not found the working file, created : %s\n", theWorkingFilePath.c_str());
+}
+
+} // namespace
+
 bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   theTracing = false;
+  if (theFullSet)
+    fdfInstallInterruptionHandlers();
   fdfSetReportAndExit(true);
   fdfReserveStdDescriptors();
   fdfSetBanner(theBanner);
@@ -319,7 +387,10 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   theEnvironment->reserve(50);
   theDeferredDeletions.clear();
   theDeferredDeletions.reserve(110);
-  theWorkingFilePath.clear();
+  // Provisional until the configuration is read: a failing start-up then
+  // reports beside the host's working file, not in the current folder.
+  theWorkingFilePath = fdfWorkingFileFromEnvironment();
+  theWorkingFileSeen = false;
 
   std::string aWorkingDir;
   if (const char *aEnv = std::getenv("TELLURIX_WORKING_DIR"))
@@ -332,8 +403,7 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   } else {
     fdfSetEnvVar(fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR").c_str(), "TELLURIX_BATCH_DIR");
   }
-  const char *aWorkingFile = std::getenv("TELLURIX_WORKING_FILE");
-  theWorkingFilePath = fdfGetRequiredEnvVar("TELLURIX_BATCH_DIR") + (aWorkingFile != nullptr ? aWorkingFile : "Process.working");
+  theWorkingFilePath = fdfWorkingFileIn(fdfGetRequiredEnvVar("TELLURIX_BATCH_DIR"));
   fdfSetDummyValue(fdfGetRequiredEnvVar("TELLURIX_DUMMY_VALUE").c_str());
   if (const char *aGcp = std::getenv("TELLURIX_GCP_DATABASE_DIR"))
     fdfSetEnvVar(fdfWithSeparator(aGcp).c_str(), "TELLURIX_GCP_DATABASE_DIR");
@@ -354,6 +424,7 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   // Without its log the host would not see how the run ended.
   if (!fdfOpenTellurixLog())
     TLRX_RAISE(CTLRX_ERR_FILE_OPEN, (fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + "Process.log").c_str());
+  fdfPrepareWorkingFile();
   return true;
 }
 
@@ -380,18 +451,25 @@ void fdfTraceStreamState(int theAttempt, const std::string &thePath, FILE *theFi
   fdfTraceMessage("%d File %s attempt open : %s\n", theAttempt, thePath.c_str(), aState.c_str());
 }
 
+// Retries with growing pauses are for a working file that existed and is
+// away for a moment; one that never existed is not waited for.
+int fdfWorkingFileAttempts(int theAttempts) { return theWorkingFileSeen ? theAttempts : 1; }
+
 // Creates a missing working file with the new percentage and text.
 void fdfCreateWorkingFile(const std::string &thePath, int theNew, const char *theText) {
   fdfTraceMessage("getAndSetPerc - Not found the file : %s\n", thePath.c_str());
-  for (int aAttempt = 0; aAttempt < 10; ++aAttempt) {
+  const int aAttempts = fdfWorkingFileAttempts(10);
+  for (int aAttempt = 0; aAttempt < aAttempts; ++aAttempt) {
     FILE *aFile = std::fopen(thePath.c_str(), "w");
     if (aFile != nullptr) {
       std::fprintf(aFile, "%i\n%s\n", theNew, theText != nullptr ? theText : "");
       std::fclose(aFile);
+      theWorkingFileSeen = true;
       return;
     }
     fdfTraceMessage("%d getAndSetPerc - Not found the file : %s  attempt create : \n", aAttempt, thePath.c_str());
-    fdfSleep(aAttempt);
+    if (aAttempts > 1)
+      fdfSleep(aAttempt);
   }
   fdfTraceMessage(" File ERROR %s not found\n", thePath.c_str());
   TLRX_RAISE(CTLRX_ERR_INTERRUPTED, thePath.c_str());
@@ -409,18 +487,32 @@ FILE *fdfOpenWorkingFile(const std::string &thePath) {
 }
 
 bool fdfWaitForWorkingFile(const std::string &thePath) {
-  for (int aCheck = 0; aCheck < 10; ++aCheck) {
-    if (fdfExistFile(thePath.c_str()))
+  const int aChecks = fdfWorkingFileAttempts(10);
+  for (int aCheck = 0; aCheck < aChecks; ++aCheck) {
+    if (fdfExistFile(thePath.c_str())) {
+      theWorkingFileSeen = true;
       return true;
+    }
     fdfTraceMessage("%d] getAndSetPerc - Not found the file : %s\n", aCheck, thePath.c_str());
-    fdfSleep(aCheck);
+    if (aChecks > 1)
+      fdfSleep(aCheck);
   }
   return false;
 }
 
 } // namespace
 
+void fdfCheckInterruption() {
+  const char *aSignal = fdfPendingInterruption();
+  if (aSignal == nullptr)
+    return;
+  fdfTraceMessage("\n EXECUTION INTERRUPTED BY OPERATOR\n");
+  TLRX_RAISE_F(CTLRX_ERR_INTERRUPTED, "Interrupted by %s", aSignal);
+}
+
 void getAndSetPerc(int thePrevious, int theNew, const char *theText) {
+  // A signal costs one test of a flag, so every call checks it.
+  fdfCheckInterruption();
   if (theNew == thePrevious || theNew >= 100)
     return;
   const std::string &aPath = theWorkingFilePath;
@@ -466,7 +558,7 @@ void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   }
   const std::string aTrace = aDir + "Process.trace";
   if (theCode != 0 && !aDir.empty() && fdfExistFile(aTrace.c_str()))
-    fdfCopyFile(aTrace.c_str(), (aDir + "Process_" + fdfGetTimeStamp() + "_trace.txt").c_str(), true);
+    fdfCopyFile(aTrace.c_str(), fdfFreeDatedName(aDir, "Process_", fdfGetTimeStamp(), "_trace.txt").c_str(), true);
   if (theCode == 0 && fdfExistFile(theWorkingFilePath.c_str())) {
     if (fdfGetWarningCount() > 0) {
       fdfWriteErrorFile(CTLRX_WARNING_STATUS, "", static_cast<const char *>(nullptr));
@@ -482,8 +574,10 @@ void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   }
   const std::string aLog = aDir + "Process.log";
   if (!aDir.empty() && fdfExistFile(aLog.c_str()) && fdfGetFileSize(aLog.c_str()) > CTLRX_MAX_LOG_SIZE) {
-    fdfCopyFile(aLog.c_str(), (aDir + "Process_" + fdfGetTimeStamp() + "_log.txt").c_str(), true);
-    fdfRemoveFile(aLog.c_str());
+    // Renamed, not copied and removed: a failed copy would lose the history.
+    const std::string aAside = fdfFreeDatedName(aDir, "Process_", fdfGetTimeStamp(), "_log.txt");
+    if (std::rename(aLog.c_str(), aAside.c_str()) != 0)
+      fdfTraceMessage("fdfEndProcess - cannot move %s aside : %s\n", aLog.c_str(), std::strerror(errno));
   }
   if (fdfGetWarningCount() > 0)
     fdfExitProcess(CTLRX_WARNING_STATUS);

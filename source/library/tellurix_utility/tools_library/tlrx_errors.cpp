@@ -325,13 +325,20 @@ std::string fdfReadWorkingLine(FILE *theFile) {
 // file beside it when the working file cannot be opened.
 bool fdfWriteWorkingStatus(int32_t theCode, const std::string &theBlock) {
   const std::string &aPath = fdfGetWorkingFilePath();
+  // No batch or working folder known: a "_tmp" would land in whatever
+  // folder the run was started from.
+  if (aPath.empty())
+    return false;
+  // Only a working file that existed is waited for; nobody watches one
+  // that never did.
+  const int aAttempts = fdfWorkingFileSeen() ? 10 : 1;
   FILE *aFile = nullptr;
-  // An empty path (start-up failed before it was known) can never open.
-  for (int aAttempt = 0; !aPath.empty() && aAttempt < 10; ++aAttempt) {
+  for (int aAttempt = 0; aAttempt < aAttempts; ++aAttempt) {
     aFile = std::fopen(aPath.c_str(), "r+");
     if (aFile != nullptr)
       break;
-    fdfSleep(aAttempt);
+    if (aAttempts > 1)
+      fdfSleep(aAttempt);
   }
   if (aFile == nullptr)
     return fdfWriteWholeFile(aPath + "_tmp", theBlock);

@@ -5,9 +5,13 @@
 #include "tlrx_errors.h"
 #include "tlrx_platform.h"
 
+#include <algorithm>
+#include <cctype>
 #include <cerrno>
+#include <climits>
 #include <cmath>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
 #include <memory>
@@ -93,7 +97,7 @@ void fdfNewHandler() { fdfAllocationFailure(0); }
 } // namespace
 
 bool fdfExistFile(const char *theName) {
-  if (theName == nullptr || theName[0] == '\0' || std::strstr(theName, "NotOK") != nullptr)
+  if (theName == nullptr || theName[0] == '\0' || std::strcmp(theName, "NotOK") == 0)
     return false;
   struct stat aStat;
   return stat(theName, &aStat) == 0;
@@ -106,12 +110,8 @@ long long fdfGetFileSize(const char *theName) {
   return static_cast<long long>(aStat.st_size);
 }
 
-bool fdfRemoveFile(const char *theName) {
-  if (theName == nullptr || theName[0] == '\0')
-    return false;
-  chmod(theName, S_IRUSR | S_IWUSR);
-  return unlink(theName) == 0;
-}
+// A link goes, not its target; a directory stays, mode and all.
+bool fdfRemoveFile(const char *theName) { return fdfRemoveFileEntry(theName) == 0; }
 
 bool fdfDeleteRaster(const char *theName, bool theWithCompanions, bool theDeleteFile) {
   bool aRemoved = false;
@@ -214,6 +214,8 @@ std::string fdfFindListFile(const char *theFileName) {
 
 std::vector<std::string> fdfReadLineList(const char *theFileName, bool theTrim) {
   const std::string aPath = fdfFindListFile(theFileName);
+  if (!fdfIsRegularFile(aPath.c_str()))
+    TLRX_RAISE_F(CTLRX_ERR_FILE_OPEN, "%s is not a regular file", aPath.c_str());
   std::unique_ptr<FILE, int (*)(FILE *)> aFile(std::fopen(aPath.c_str(), "r"), std::fclose);
   if (!aFile)
     TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aPath.c_str());
@@ -250,6 +252,12 @@ std::vector<std::string> fdfReadArgumentFile(const char *theArgument) {
   return aLines;
 }
 
+std::vector<std::string> fdfReadNameList(const char *theFileName) {
+  std::vector<std::string> aNames = fdfReadLineList(theFileName, true);
+  aNames.erase(std::remove(aNames.begin(), aNames.end(), std::string()), aNames.end());
+  return aNames;
+}
+
 std::string fdfIntToText(long theValue) {
   char aText[32];
   if (theValue <= 32000)
@@ -267,3 +275,63 @@ bool fdfIsNull(double theValue, double theNull) {
 }
 
 bool fdfIsSwitchOn(const std::string &theText) { return theText == "OK"; }
+
+namespace {
+
+bool fdfIsNumberBlank(char theChar) { return theChar == ' ' || theChar == '\t' || theChar == '\r' || theChar == '\n'; }
+
+const char *fdfSkipNumberBlanks(const char *theText) {
+  while (fdfIsNumberBlank(*theText))
+    ++theText;
+  return theText;
+}
+
+// The conversion stopped at theEnd: it read something and only blanks follow.
+bool fdfReadToTheEnd(const char *theStart, const char *theEnd) {
+  return theEnd != theStart && *fdfSkipNumberBlanks(theEnd) == '\0';
+}
+
+} // namespace
+
+bool fdfParseWholeInteger(const char *theText, int32_t &theValue) {
+  if (theText == nullptr)
+    return false;
+  const char *aStart = fdfSkipNumberBlanks(theText);
+  // strtoll would skip other white space and accept nothing at all.
+  if (!std::isdigit(static_cast<unsigned char>(*aStart)) && *aStart != '+' && *aStart != '-')
+    return false;
+  char *aEnd = nullptr;
+  const int aSavedError = errno;
+  errno = 0;
+  const long long aValue = std::strtoll(aStart, &aEnd, 10);
+  const bool aRange = errno != ERANGE && aValue >= INT32_MIN && aValue <= INT32_MAX;
+  errno = aSavedError;
+  if (!aRange || !fdfReadToTheEnd(aStart, aEnd))
+    return false;
+  theValue = static_cast<int32_t>(aValue);
+  return true;
+}
+
+bool fdfParseWholeDouble(const char *theText, double &theValue, bool theFinite) {
+  if (theText == nullptr)
+    return false;
+  const char *aStart = fdfSkipNumberBlanks(theText);
+  if (*aStart == '\0' || std::isspace(static_cast<unsigned char>(*aStart)))
+    return false;
+  char *aEnd = nullptr;
+  const int aSavedError = errno;
+  errno = 0;
+  const double aValue = std::strtod(aStart, &aEnd);
+  // ERANGE also flags an underflow to a tiny value, which is kept.
+  const bool aOverflow = errno == ERANGE && std::isinf(aValue);
+  errno = aSavedError;
+  if (aOverflow || !fdfReadToTheEnd(aStart, aEnd) || (theFinite && !std::isfinite(aValue)))
+    return false;
+  theValue = aValue;
+  return true;
+}
+
+bool fdfIsRegularFile(const char *theName) {
+  struct stat aStat;
+  return theName != nullptr && stat(theName, &aStat) == 0 && S_ISREG(aStat.st_mode);
+}

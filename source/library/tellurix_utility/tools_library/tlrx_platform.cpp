@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <chrono>
 #include <climits>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -13,6 +14,7 @@
 #include <fstream>
 #include <iostream>
 #include <spawn.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <thread>
 #include <unistd.h>
@@ -209,4 +211,62 @@ void fdfSplitPath(const std::string &thePath, std::string &theDir, std::string &
   const size_t aDot = aRest.rfind('.');
   theName = aDot == std::string::npos ? aRest : aRest.substr(0, aDot);
   theExt = aDot == std::string::npos ? std::string() : aRest.substr(aDot);
+}
+
+bool fdfSameFile(const std::string &theFirst, const std::string &theSecond) {
+  struct stat aFirst, aSecond;
+  if (stat(theFirst.c_str(), &aFirst) != 0 || stat(theSecond.c_str(), &aSecond) != 0)
+    return false;
+  return aFirst.st_dev == aSecond.st_dev && aFirst.st_ino == aSecond.st_ino;
+}
+
+int fdfProcessId() { return static_cast<int>(getpid()); }
+
+namespace {
+
+volatile std::sig_atomic_t theInterruptionSignal = 0;
+
+void fdfOnInterruption(int theSignal) { theInterruptionSignal = theSignal; }
+
+} // namespace
+
+void fdfInstallInterruptionHandlers() {
+  theInterruptionSignal = 0;
+  struct sigaction aAction {};
+  aAction.sa_handler = fdfOnInterruption;
+  sigemptyset(&aAction.sa_mask);
+  // Interrupted reads and writes resume; the run stops at its next check.
+  aAction.sa_flags = SA_RESTART;
+  sigaction(SIGTERM, &aAction, nullptr);
+  sigaction(SIGINT, &aAction, nullptr);
+}
+
+const char *fdfPendingInterruption() {
+  switch (theInterruptionSignal) {
+  case 0: return nullptr;
+  case SIGINT: return "SIGINT";
+  default: return "SIGTERM";
+  }
+}
+
+bool fdfProcessExists(int thePid) {
+  if (thePid <= 0)
+    return true; // not one process: never taken for a dead one
+  return kill(static_cast<pid_t>(thePid), 0) == 0 || errno == EPERM;
+}
+
+int fdfRemoveFileEntry(const char *theName) {
+  if (theName == nullptr || theName[0] == '\0')
+    return ENOENT;
+  struct stat aStat;
+  if (lstat(theName, &aStat) != 0)
+    return errno;
+  if (S_ISDIR(aStat.st_mode))
+    return EISDIR;
+  return unlink(theName) == 0 ? 0 : errno;
+}
+
+bool fdfIsDirectory(const std::string &theName) {
+  struct stat aStatus;
+  return stat(theName.c_str(), &aStatus) == 0 && S_ISDIR(aStatus.st_mode);
 }

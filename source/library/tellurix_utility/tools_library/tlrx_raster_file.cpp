@@ -14,6 +14,7 @@
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_standard_header.h"
 
 static_assert(sizeof(off_t) >= 8, "raster files need 64-bit offsets");
@@ -373,13 +374,13 @@ void CRasterFile::validateLayout(const CRasterFileParam &theParam, int32_t theMo
 void CRasterFile::openStream(const char *theFileName, int32_t theMode) {
   FILE *aFile = nullptr;
   if (theMode == CTLRX_RF_OPEN_READ) {
-    aFile = std::fopen(theFileName, "rb");
-    struct stat aStat;
-    if (aFile != nullptr && (fstat(fileno(aFile), &aStat) != 0 || S_ISDIR(aStat.st_mode))) {
-      std::fclose(aFile);
-      aFile = nullptr;
-      errno = EISDIR;
+    // A FIFO would block the open and a device would never end: data files
+    // are regular files (or links to them), asked before the open.
+    if (fdfExistFile(theFileName) && !fdfIsRegularFile(theFileName)) {
+      fdfTraceMessage("Error: %s is not a regular file\n", theFileName);
+      TLRX_RAISE_F(CTLRX_ERR_RF_OPEN, "%s is not a regular file", theFileName);
     }
+    aFile = std::fopen(theFileName, "rb");
   } else if (theMode == CTLRX_RF_OPEN_WRITE) {
     fdfTraceMessage("************** CTLRX_RF_OPEN_WRITE : %s\n", theFileName);
     aFile = std::fopen(theFileName, "wb");

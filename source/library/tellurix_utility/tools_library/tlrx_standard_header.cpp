@@ -69,7 +69,9 @@ void fdfReadStandardHeader(const char *theName, CDescription &theDescription) {
   }
   if (!theDescription.readFromFile(aHeader.c_str(), false)) {
     fdfTraceMessage("Error: missing parameter file %s\n", aHeader.c_str());
-    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aHeader.c_str());
+    // The code says "cannot be opened"; the message says what happened.
+    const std::string &aReason = theDescription.getReadError();
+    TLRX_RAISE(CTLRX_ERR_FILE_OPEN, aReason.empty() ? aHeader.c_str() : aReason.c_str());
   }
 }
 

@@ -4,6 +4,7 @@
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
 
 #include <cstdio>
 #include <cstring>
@@ -23,6 +24,10 @@ const SEntity CTLRX_XML_ENTITIES[] = {
     {"&quot;", "##quot", '"'}, {"&apos;", "##apos", '\''}, {"&amp;", "##amp", '&'},
     {"&lt;", "##lt", '<'},     {"&gt;", "##gt", '>'},
 };
+// A literal '#' gets a marker too, so that "##amp" written in a value is
+// not taken for a marker when restored.
+constexpr char CTLRX_HASH_MARKER[] = "##hash";
+constexpr size_t CTLRX_HASH_MARKER_LEN = sizeof(CTLRX_HASH_MARKER) - 1;
 
 constexpr char CTLRX_BIG_MARKER[] = "####BIG";
 constexpr size_t CTLRX_BIG_MARKER_LEN = sizeof(CTLRX_BIG_MARKER) - 1;
@@ -68,10 +73,13 @@ size_t utf8SequenceLength(const unsigned char *theText, size_t theRemaining) {
   return aLength;
 }
 
+// Byte 0x8C would become the markup character '<' behind the marker: it
+// passes as it is (the parser takes any byte).
 void appendHighByte(unsigned char theByte, std::string &theOut) {
-  if (theByte >= CTLRX_BIG_FIRST && theByte <= CTLRX_BIG_LAST) {
+  const char aShifted = static_cast<char>(theByte - CTLRX_BIG_SHIFT);
+  if (theByte >= CTLRX_BIG_FIRST && theByte <= CTLRX_BIG_LAST && aShifted != '<') {
     theOut.append(CTLRX_BIG_MARKER, CTLRX_BIG_MARKER_LEN);
-    theOut.push_back(static_cast<char>(theByte - CTLRX_BIG_SHIFT));
+    theOut.push_back(aShifted);
   } else {
     theOut.push_back(static_cast<char>(theByte));
   }
@@ -156,7 +164,9 @@ private:
     for (int i = 0; theAttributes[i] != nullptr && theAttributes[i + 1] != nullptr; i += 2) {
       auto &aAttribute = aElement.mAttributes.emplace_back();
       appendLatin1(theAttributes[i], aAttribute.first);
-      appendLatin1(theAttributes[i + 1], aAttribute.second);
+      mValue.clear();
+      appendLatin1(theAttributes[i + 1], mValue);
+      fdfRestoreXmlText(mValue.data(), mValue.size(), aAttribute.second);
     }
     if (!mOpen.empty()) {
       CXmlElement *aParent = mOpen.back();
@@ -169,6 +179,7 @@ private:
 
   CXmlElementTree &mTree;
   std::vector<CXmlElement *> mOpen; // open elements, innermost last
+  std::string mValue;               // attribute value before restoring
 };
 
 const char *CXmlElement::getAttribute(const char *theName) const {
@@ -193,6 +204,12 @@ void CXmlElementTree::clear() {
 bool CXmlElementTree::parseFile(const char *theFileName, size_t theMaxLineLength) {
   clear();
   char aMessage[CTLRX_MAX_LEN_FILE + 256];
+  if (theFileName != nullptr && fdfExistFile(theFileName) && !fdfIsRegularFile(theFileName)) {
+    std::snprintf(aMessage, sizeof aMessage, "%s is not a regular file", theFileName);
+    mErrorText = aMessage;
+    fdfTraceMessage("\n%s\n", aMessage);
+    return false;
+  }
   CFilePtr aFile(theFileName != nullptr ? std::fopen(theFileName, "rb") : nullptr);
   if (!aFile) {
     std::snprintf(aMessage, sizeof aMessage, "cannot open %s", theFileName != nullptr ? theFileName : "(none)");
@@ -307,15 +324,19 @@ void fdfPreprocessXmlLine(const char *theLine, size_t theLength, std::string &th
         theOut.push_back('&');
         ++i;
       }
+    } else if (aByte == '#' && (i == 0 || theLine[i - 1] != '&')) { // "&#" starts a character reference
+      theOut.append(CTLRX_HASH_MARKER, CTLRX_HASH_MARKER_LEN);
+      ++i;
     } else if (aByte < 0x80) {
       size_t aEnd = i + 1; // plain ASCII runs are copied in one go
-      while (aEnd < theLength && aText[aEnd] < 0x80 && aText[aEnd] != '&')
+      while (aEnd < theLength && aText[aEnd] < 0x80 && aText[aEnd] != '&' && aText[aEnd] != '#')
         ++aEnd;
       theOut.append(theLine + i, aEnd - i);
       i = aEnd;
     } else if (const size_t aSequence = utf8SequenceLength(aText + i, theLength - i); aSequence > 0) {
-      for (size_t j = 0; j < aSequence; ++j)
-        appendHighByte(aText[i + j], theOut);
+      // UTF-8 passes as it is: a continuation byte turned into a marker
+      // could end in '<' (0x8C) and break the line for the parser.
+      theOut.append(theLine + i, aSequence);
       i += aSequence;
     } else {
       const char aLetter = foldLatin1(aByte);
@@ -340,6 +361,12 @@ void fdfRestoreXmlText(const char *theText, size_t theLength, std::string &theOu
         const auto aCode = static_cast<unsigned char>(theText[i + CTLRX_BIG_MARKER_LEN]);
         theOut.push_back(static_cast<char>(static_cast<unsigned char>(aCode + CTLRX_BIG_SHIFT)));
         i += CTLRX_BIG_MARKER_LEN + 1;
+        continue;
+      }
+      if (theLength - i >= CTLRX_HASH_MARKER_LEN &&
+          std::memcmp(theText + i, CTLRX_HASH_MARKER, CTLRX_HASH_MARKER_LEN) == 0) {
+        theOut.push_back('#');
+        i += CTLRX_HASH_MARKER_LEN;
         continue;
       }
       bool aRestored = false;

@@ -2,9 +2,10 @@
 // with expat. Header, parameter and schema files all go through here.
 //
 // Lines are pre-processed before expat sees them: the five entity references
-// reach the tree unresolved (as "##amp" and the like) and bytes 128 to 164 as
-// "####BIG" plus one character, so that string values can be restored byte
-// for byte (fdfRestoreXmlText); a few Latin-1 letters are folded to ASCII.
+// reach the tree unresolved (as "##amp" and the like), a literal "#" as
+// "##hash", and stray bytes 128 to 164 as "####BIG" plus one character, so
+// that string values can be restored byte for byte (fdfRestoreXmlText); a
+// few Latin-1 letters are folded to ASCII. UTF-8 text is never folded.
 // The parser reads the file as ISO-8859-1, so any byte sequence is accepted
 // and the tree holds the file's own bytes (UTF-8 text passes unchanged).
 #pragma once
@@ -84,13 +85,15 @@ long fdfReadRawLine(FILE *theFile, char *theBuffer, size_t theCapacity, bool &th
 
 // Line pre-processing before the parser (appends to theOut):
 // "&quot;" "&apos;" "&amp;" "&lt;" "&gt;" -> "##quot" "##apos" "##amp" "##lt" "##gt";
-// bytes 128..164 -> "####BIG" followed by the byte minus 80;
-// bytes 0xE9 0xF1 0xFC 0xB0 0xF6 -> "e" "n" "u" "d" "o" unless they belong
-// to a well-formed UTF-8 sequence.
+// a literal "#" (not the one of a character reference "&#") -> "##hash";
+// well-formed UTF-8 sequences pass unchanged; of the other bytes,
+// 128..164 -> "####BIG" followed by the byte minus 80 (but 0x8C, which
+// would give "<", passes), and 0xE9 0xF1 0xFC 0xB0 0xF6 -> "e" "n" "u" "d" "o".
 void fdfPreprocessXmlLine(const char *theLine, size_t theLength, std::string &theOut);
 
-// Inverse of the pre-processing for a value text: the "##" markers become
-// their characters again and "####BIG" x becomes the byte x + 80.
+// Inverse of the pre-processing for a value or attribute text: the "##"
+// markers become their characters again and "####BIG" x becomes the byte
+// x + 80.
 void fdfRestoreXmlText(const char *theText, size_t theLength, std::string &theOut);
 std::string fdfRestoreXmlText(const std::string &theText);
 

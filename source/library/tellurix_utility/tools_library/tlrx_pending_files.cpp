@@ -1,0 +1,110 @@
+#include "tlrx_pending_files.h"
+
+#include "tlrx_description_xml.h"
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+
+#include <algorithm>
+#include <exception>
+
+namespace {
+
+// The innermost guard alive; each guard knows the one it is nested in.
+CPendingFiles *theInnermostGuard = nullptr;
+
+std::vector<std::string> fdfRasterFiles(const std::string &theName) {
+  std::vector<std::string> aFiles = fdfHeaderFiles(theName);
+  aFiles.insert(aFiles.begin(), theName);
+  return aFiles;
+}
+
+} // namespace
+
+std::vector<std::string> fdfHeaderFiles(const std::string &theName) {
+  const std::string aHeader = fdfHeaderFileName(theName);
+  return {aHeader, fdfXmlHeaderFileName(aHeader), theName + ".hdr"};
+}
+
+CPendingFiles::CPendingFiles() : mEnclosing(theInnermostGuard), mUncaught(std::uncaught_exceptions()) {
+  theInnermostGuard = this;
+  fdfSetErrorHook(&CPendingFiles::onError);
+}
+
+CPendingFiles::~CPendingFiles() {
+  // Guards end in reverse order of their start; keep the chain whole anyway.
+  if (theInnermostGuard == this) {
+    theInnermostGuard = mEnclosing;
+  } else {
+    for (CPendingFiles *aGuard = theInnermostGuard; aGuard != nullptr; aGuard = aGuard->mEnclosing)
+      if (aGuard->mEnclosing == this)
+        aGuard->mEnclosing = mEnclosing;
+  }
+  if (theInnermostGuard == nullptr)
+    fdfSetErrorHook(nullptr);
+  if (std::uncaught_exceptions() > mUncaught)
+    removeAll();
+}
+
+void CPendingFiles::addFile(const std::string &theName) {
+  if (std::find(mFiles.begin(), mFiles.end(), theName) == mFiles.end())
+    mFiles.push_back(theName);
+}
+
+void CPendingFiles::addRaster(const std::string &theName) {
+  for (const std::string &aFile : fdfRasterFiles(theName))
+    addFile(aFile);
+}
+
+void CPendingFiles::addHeaders(const std::string &theName) {
+  for (const std::string &aFile : fdfHeaderFiles(theName))
+    addFile(aFile);
+}
+
+void CPendingFiles::forgetFile(const std::string &theName) {
+  mFiles.erase(std::remove(mFiles.begin(), mFiles.end(), theName), mFiles.end());
+}
+
+void CPendingFiles::forgetRaster(const std::string &theName) {
+  for (const std::string &aFile : fdfRasterFiles(theName))
+    forgetFile(aFile);
+}
+
+CPendingFiles *CPendingFiles::outermost() {
+  CPendingFiles *aGuard = theInnermostGuard;
+  while (aGuard != nullptr && aGuard->mEnclosing != nullptr)
+    aGuard = aGuard->mEnclosing;
+  return aGuard;
+}
+
+void CPendingFiles::handOver() {
+  CPendingFiles *aRun = outermost();
+  if (aRun != this)
+    for (const std::string &aFile : mFiles)
+      aRun->addFile(aFile);
+  mFiles.clear();
+}
+
+void CPendingFiles::removeAll() {
+  for (const std::string &aFile : mFiles)
+    if (fdfExistFile(aFile.c_str()))
+      fdfRemoveFile(aFile.c_str());
+  mFiles.clear();
+}
+
+void CPendingFiles::onError(int32_t theCode) {
+  if (theCode == 0 || theCode == CTLRX_WARNING_STATUS)
+    return;
+  for (CPendingFiles *aGuard = theInnermostGuard; aGuard != nullptr; aGuard = aGuard->mEnclosing)
+    aGuard->removeAll();
+}
+
+void fdfAddPendingFile(const std::string &theName) {
+  if (CPendingFiles *aRun = CPendingFiles::outermost())
+    aRun->addFile(theName);
+}
+
+void fdfRemoveHeaderFiles(const std::string &theName) {
+  for (const std::string &aFile : fdfHeaderFiles(theName))
+    if (fdfExistFile(aFile.c_str()))
+      fdfRemoveFile(aFile.c_str());
+}

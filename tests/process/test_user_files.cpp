@@ -1,0 +1,236 @@
+// A run never destroys a file it was only meant to read, and a run that
+// fails leaves no result that claims to be complete. Each command is run the
+// way a careless user would: results named like inputs (directly, through a
+// link, through a relative path), reruns over good results, failures late in
+// the run. The folder is compared file by file before and after.
+#include "tlrx_temporal_test_support.h"
+#include "tlrx_test_support.h"
+
+#include <gtest/gtest.h>
+
+#include <dirent.h>
+#include <unistd.h>
+
+#include <functional>
+#include <map>
+
+namespace {
+
+using CFolderSnapshot = std::map<std::string, std::string>;
+
+class UserFilesTest : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override {
+    tlrxStartLibraryEnvironment(mDir.path());
+    tlrxWriteFile(working(), "0\nhost\n");
+  }
+  std::string file(const std::string &theName) const { return mDir.file(theName); }
+  std::string working() const { return file("Process.working"); }
+  std::string error() const { return tlrxReadFile(working() + "_error"); }
+
+  // A dated image of theLines lines of the values.
+  void image(const std::string &theName, const std::vector<double> &theValues, int theDay, int theLines = 1) {
+    STLRXTestRaster aRaster;
+    aRaster.mLines = theLines;
+    aRaster.mPixels = static_cast<int>(theValues.size()) / theLines;
+    aRaster.mValues = theValues;
+    aRaster.mAcquisitionTime = (theDay < 10 ? "0" : "") + std::to_string(theDay) + "-JAN-2010 00:00:00.000000";
+    tlrxWriteTestRaster(file(theName), aRaster);
+  }
+  void stack(int theLines = 2) {
+    image("a", std::vector<double>(4 * theLines, 1.0), 1, theLines);
+    image("b", std::vector<double>(4 * theLines, 2.0), 2, theLines);
+    image("c", std::vector<double>(4 * theLines, 4.0), 3, theLines);
+  }
+
+  // Every file of the folder but the status, argument and list files, with
+  // its content.
+  CFolderSnapshot snapshot() const {
+    CFolderSnapshot aFiles;
+    DIR *aDir = opendir(mDir.path().c_str());
+    while (const dirent *aEntry = readdir(aDir)) {
+      const std::string aName = aEntry->d_name;
+      if (aName != "." && aName != ".." && aName.rfind("Process", 0) != 0 && aName.rfind("args", 0) != 0 &&
+          aName != "list.txt")
+        aFiles[aName] = tlrxReadFile(file(aName));
+    }
+    closedir(aDir);
+    return aFiles;
+  }
+
+  STLRXRun runArguments(const std::string &theCommand, const std::vector<std::string> &theTokens) {
+    std::string aText = "arguments\n";
+    for (const std::string &aToken : theTokens)
+      aText += aToken + "\n";
+    tlrxWriteFile(file("args.txt"), aText);
+    return tlrxRunMain(theCommand + file("args.txt"), mDir.path());
+  }
+  void list(const std::vector<std::string> &theNames) {
+    std::string aText;
+    for (const std::string &aName : theNames)
+      aText += file(aName) + "\n";
+    tlrxWriteFile(file("list.txt"), aText);
+  }
+  STLRXRun ratio(const std::string &theRoot, const std::string &theTiff = "NO") {
+    return runArguments("main_ratio#", {file("list.txt"), file(theRoot), "0", "x", theTiff, "0"});
+  }
+  STLRXRun minMax(const std::string &theRoot, const std::string &theTiff = "NO") {
+    return runArguments("main_min_and_max#",
+                        {file("list.txt"), file(theRoot), "1", "2", "3", "4", "5", theTiff, "0"});
+  }
+  STLRXRun texture(const std::string &theInput, const std::string &theOutput) {
+    return runArguments("main_texture#", {file(theInput), theOutput, "0", "3", "3", "x", "NO", "0"});
+  }
+  STLRXRun correlation(const std::string &theRoot) {
+    return runArguments("main_correlation#",
+                        {file("a"), file("b"), theRoot, "0", "3", "3", "3", "3", "OK", "NO", "0"});
+  }
+  STLRXRun temporal(const std::vector<std::string> &theInputs, const std::string &theRoot,
+                    const std::vector<std::pair<std::string, std::string>> &theSettings = {{"mean", "OK"}}) {
+    STLRXTemporalParameters aParameters;
+    for (const std::string &aInput : theInputs)
+      aParameters.mInputs.push_back(file(aInput));
+    aParameters.mRoot = theRoot.empty() ? "" : file(theRoot);
+    aParameters.mSettings = theSettings;
+    tlrxWriteFile(file("args.xml"), tlrxTemporalParameterText(aParameters));
+    return tlrxRunMain("main_temporal_feature_extraction#" + file("args.xml"), mDir.path());
+  }
+
+  void expectRefused(const STLRXRun &theRun, int theStatus, int theCode, const std::string &theNamed) const {
+    EXPECT_EQ(theRun.mExitStatus, theStatus) << theRun.mOutput;
+    const std::string aError = error();
+    EXPECT_NE(aError.find("[EC :" + std::to_string(theCode) + "]"), std::string::npos) << aError;
+    EXPECT_NE(aError.find(theNamed), std::string::npos) << aError;
+  }
+};
+
+} // namespace
+
+TEST_F(UserFilesTest, ResultsNamedLikeInputsAreRefusedBeforeAnythingIsWritten) {
+  stack();
+  // Inputs that the results of each case would land on.
+  image("q_rto", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
+  image("z_max", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
+  image("w_mea", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
+  ASSERT_EQ(symlink(file("a").c_str(), file("link_to_a").c_str()), 0);
+  ASSERT_EQ(symlink(file("a.sml").c_str(), file("u.sml").c_str()), 0);
+  ASSERT_EQ(link(file("a").c_str(), file("hard_a").c_str()), 0);
+  const std::string aRelative = "../" + mDir.path().substr(mDir.path().rfind('/', mDir.path().size() - 2) + 1) + "a";
+  const struct {
+    const char *mCase;
+    std::function<STLRXRun()> mRun;
+    int mStatus, mCode;
+    std::string mNamed;
+  } aCases[] = {
+      {"texture onto its input", [&] { return texture("a", file("a")); }, 8, 456962, file("a")},
+      {"texture through a link", [&] { return texture("a", file("link_to_a")); }, 8, 456962, "link_to_a"},
+      {"texture through a hard link", [&] { return texture("a", file("hard_a")); }, 8, 456962, "hard_a"},
+      {"texture through a relative path", [&] { return texture("a", aRelative); }, 8, 456962, aRelative},
+      {"texture header onto an input header", [&] { return texture("a", file("u")); }, 8, 456962, "u.sml"},
+      {"texture named like a header", [&] { return texture("a", file("t.sml")); }, 8, 456962, "t.sml"},
+      {"correlation onto input 2", [&] { return correlation(file("b")); }, 8, 456962, file("b")},
+      {"ratio pair onto an input", [&] { list({"a", "q_rto"}); return ratio("q"); }, 8, 456962, "q_rto"},
+      {"min and max onto an input", [&] { list({"a", "z_max"}); return minMax("z"); }, 8, 456962, "z_max"},
+      {"temporal mean onto an input", [&] { return temporal({"w_mea", "b"}, "w"); }, 8, 456960, "w_mea"},
+  };
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCase);
+    const CFolderSnapshot aBefore = snapshot();
+    expectRefused(aCase.mRun(), aCase.mStatus, aCase.mCode, aCase.mNamed);
+    const CFolderSnapshot aAfter = snapshot();
+    EXPECT_TRUE(aAfter == aBefore) << "files changed, added or removed";
+  }
+}
+
+TEST_F(UserFilesTest, TemporalTemporariesNeverTakeTheNamesOfUserFiles) {
+  stack();
+  // A root beside the user's "results.txt" and "results.hdr", and a root
+  // equal to an input's name: its headers are the user's too.
+  tlrxWriteFile(file("results.txt"), "notes");
+  tlrxWriteFile(file("results.hdr"), "ENVI of something else");
+  const CFolderSnapshot aBefore = snapshot();
+  for (const char *aRoot : {"results", "a"}) {
+    SCOPED_TRACE(aRoot);
+    const STLRXRun aRun = temporal({"a", "b", "c"}, aRoot);
+    ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+  }
+  CFolderSnapshot aAfter = snapshot();
+  for (const char *aResult : {"results_mea", "a_mea"}) {
+    EXPECT_EQ(tlrxReadTestRaster(file(aResult)), std::vector<double>(8, static_cast<float>(7.0 / 3.0))) << aResult;
+    for (const char *aSuffix : {"", ".sml", ".hdr"})
+      EXPECT_EQ(aAfter.erase(std::string(aResult) + aSuffix), 1u) << aResult << aSuffix;
+  }
+  EXPECT_TRUE(aAfter == aBefore) << "only the results are new; nothing else changed";
+}
+
+TEST_F(UserFilesTest, FailedRunsLeaveNoResultThatLooksComplete) {
+  stack();
+  image("short", {1, 1, 1, 1}, 9, 1);
+  list({"a", "b"});
+  ASSERT_EQ(minMax("good", "OK").mExitStatus, 0) << error();
+  ASSERT_EQ(ratio("good").mExitStatus, 0) << error();
+  const CFolderSnapshot aBefore = snapshot();
+  const struct {
+    const char *mCase;
+    std::function<STLRXRun()> mRun;
+    int mStatus, mCode;
+  } aCases[] = {
+      // A rerun over a good result that fails on its inputs keeps the old
+      // result as it was: values, dates and headers.
+      {"min and max rerun over a good result", [&] { list({"a", "short"}); return minMax("good", "OK"); }, 11, 652803},
+      // The first pair is written, the second fails: neither stays.
+      {"ratio fails at its second pair", [&] { list({"a", "b", "short"}); return ratio("new"); }, 11, 652807},
+      // One input: the standard deviation holds no valid sample, so its
+      // quick-look fails after every raster is written.
+      {"temporal quick-look fails", [&] {
+         return temporal({"a"}, "one", {{"mean", "OK"}, {"std", "OK"}, {"make_tiff", "OK"}});
+       }, 3, 130564},
+  };
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCase);
+    const STLRXRun aRun = aCase.mRun();
+    EXPECT_EQ(aRun.mExitStatus, aCase.mStatus) << aRun.mOutput;
+    EXPECT_NE(error().find("[EC :" + std::to_string(aCase.mCode) + "]"), std::string::npos) << error();
+    EXPECT_TRUE(snapshot() == aBefore) << "a result or a temporary was left or changed";
+  }
+}
+
+TEST_F(UserFilesTest, HostInterruptionRemovesPartialResultsAndTemporaries) {
+  stack(64);
+  tlrxWriteFile(working(), "101\nhost\n");
+  const CFolderSnapshot aBefore = snapshot();
+  list({"a", "b", "c"});
+  const STLRXRun aMinMax = minMax("out");
+  EXPECT_EQ(aMinMax.mExitStatus, 6) << aMinMax.mOutput;
+  tlrxWriteFile(working(), "101\nhost\n");
+  const STLRXRun aTemporal = temporal({"a", "b", "c"}, "out");
+  EXPECT_EQ(aTemporal.mExitStatus, 6) << aTemporal.mOutput;
+  EXPECT_TRUE(snapshot() == aBefore) << "a partial result or a temporary was left";
+}
+
+TEST_F(UserFilesTest, TemporalRunsThatWouldWriteNothingAreRefused) {
+  stack();
+  const struct {
+    const char *mCase;
+    std::string mRoot;
+    std::vector<std::pair<std::string, std::string>> mSettings;
+    std::string mNamed;
+  } aCases[] = {
+      {"every output off", "none", {{"mean", "NotOK"}, {"make_tiff", "OK"}}, "no output switch"},
+      {"empty root", "", {{"out_root_file_name", ""}, {"mean", "OK"}}, "MAIN_CMD.out_root_file_name"},
+  };
+  const CFolderSnapshot aBefore = snapshot();
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCase);
+    expectRefused(temporal({"a", "b"}, aCase.mRoot, aCase.mSettings), 8, 456960, aCase.mNamed);
+    EXPECT_TRUE(snapshot() == aBefore);
+  }
+  // Nothing landed in the current folder either (the runs start in the
+  // test folder, so a stray "_mea" would have shown above).
+}
+
+TEST_F(UserFilesTest, MissingTemporalInputIsReportedAsMissing) {
+  stack();
+  expectRefused(temporal({"a", "absent"}, "out"), 5, 261122, "absent.sml");
+}
