@@ -36,6 +36,15 @@ std::vector<std::string> fdfReadArgumentFile(const char *theArgument);
 
 std::string fdfIntToText(long theValue);
 
+// Temporaries of a run are named theFinalBase + theTag + the writer's pid,
+// followed by "." and theRandomChars letters or digits when theRandomChars
+// is not 0. The pid when theName (no folder) is such a temporary, else 0.
+int fdfTemporaryOwner(const std::string &theFinalBase, const char *theTag, int theRandomChars,
+                      const std::string &theName);
+// A run that was killed leaves its temporaries behind; the next run writing
+// theFinalName removes those of ended processes (regular files only).
+void fdfRemoveStaleTemporaries(const std::string &theFinalName, const char *theTag, int theRandomChars);
+
 // Numbers of headers, argument and parameter files are read whole: the
 // entire text, blanks around it allowed, is the number, so "30 junk",
 // "16e1" or "7.9" are no integer and "4294967303" does not wrap. False for

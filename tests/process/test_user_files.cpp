@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 
 #include <dirent.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <functional>
@@ -233,4 +234,24 @@ TEST_F(UserFilesTest, TemporalRunsThatWouldWriteNothingAreRefused) {
 TEST_F(UserFilesTest, MissingTemporalInputIsReportedAsMissing) {
   stack();
   expectRefused(temporal({"a", "absent"}, "out"), 5, 261122, "absent.sml");
+}
+
+TEST_F(UserFilesTest, PartsLeftByKilledRunsGoWithTheNextRunOfThatResult) {
+  stack();
+  list({"a", "b"});
+  // The pid of a process that has ended, one that is alive, and names that
+  // only look like parts.
+  const pid_t aEnded = fork();
+  if (aEnded == 0)
+    _exit(0);
+  waitpid(aEnded, nullptr, 0);
+  const std::string aStale = "out_min.part-" + std::to_string(aEnded);
+  const std::string aAlive = "out_min.part-" + std::to_string(getpid());
+  for (const std::string &aName : {aStale, aAlive, std::string("out_min.part-12x"), std::string("out_max.part-1.sml")})
+    tlrxWriteFile(file(aName), "partial");
+  ASSERT_EQ(minMax("out").mExitStatus, 0) << error();
+  EXPECT_FALSE(tlrxFileExists(file(aStale)));
+  for (const char *aName : {"out_min.part-12x", "out_max.part-1.sml"})
+    EXPECT_TRUE(tlrxFileExists(file(aName))) << aName;
+  EXPECT_TRUE(tlrxFileExists(file(aAlive)));
 }

@@ -22,6 +22,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_geotiff_file.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_geotiff_georef.h"
 #include "tlrx_geotiff_stretch.h"
 #include "tlrx_geotiff_test_support.h"
@@ -813,8 +814,11 @@ TEST(GeoTiffTemporaries, OwnerIsReadOnlyFromATemporaryOfThatTiff) {
       {"q.tif.aB3xYz", 0},                      {"q.tif", 0},
   };
   for (const auto &aCase : aCases)
-    EXPECT_EQ(fdfTiffTemporaryOwner("q.tif", aCase.first), aCase.second) << aCase.first;
-  EXPECT_EQ(fdfTiffTemporaryOwner("", ".tlrxtmp_4242.aB3xYz"), 0);
+    EXPECT_EQ(fdfTemporaryOwner("q.tif", CTLRX_TIFF_TEMPORARY_TAG, 6, aCase.first), aCase.second) << aCase.first;
+  EXPECT_EQ(fdfTemporaryOwner("", CTLRX_TIFF_TEMPORARY_TAG, 6, ".tlrxtmp_4242.aB3xYz"), 0);
+  // Raster parts end at the pid.
+  EXPECT_EQ(fdfTemporaryOwner("r", ".part-", 0, "r.part-77"), 77);
+  EXPECT_EQ(fdfTemporaryOwner("r", ".part-", 0, "r.part-77.sml"), 0);
 }
 
 // A run killed while it wrote q.tif leaves its temporary; the next
@@ -859,7 +863,7 @@ TEST_F(GeoTiffTest, StaleTemporariesOfTheTiffAreRemovedAndNothingElse) {
 TEST_F(GeoTiffTest, TemporaryNamesItsTiffAndItsWriter) {
   CGeoTiffFile aFile(file("t.tif"), 100);
   const std::string aName = std::filesystem::path(aFile.temporaryName()).filename().string();
-  EXPECT_EQ(fdfTiffTemporaryOwner("t.tif", aName), fdfProcessId()) << aName;
+  EXPECT_EQ(fdfTemporaryOwner("t.tif", CTLRX_TIFF_TEMPORARY_TAG, 6, aName), fdfProcessId()) << aName;
   EXPECT_EQ(std::filesystem::path(aFile.temporaryName()).parent_path(), std::filesystem::path(file("t.tif")).parent_path());
 }
 

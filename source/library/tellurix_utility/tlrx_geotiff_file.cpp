@@ -3,6 +3,7 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
 #include "tlrx_platform.h"
 #include "tlrx_raster_to_geotiff.h"
 
@@ -11,13 +12,11 @@
 #include <geotiff/xtiffio.h>
 
 #include <algorithm>
-#include <cctype>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <memory>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -72,24 +71,6 @@ mode_t newFileMode() {
   return 0666 & ~aMask;
 }
 
-// A temporary of a run that was killed (no exit handler ran) stays behind;
-// the next conversion to the same TIFF removes it once its owner is gone.
-void removeStaleTemporaries(const std::string &theFinalName) {
-  std::string aDir, aName, aExt;
-  fdfSplitPath(theFinalName, aDir, aName, aExt);
-  std::error_code aError;
-  std::filesystem::directory_iterator aEntry(aDir.empty() ? "." : aDir, aError), aEnd;
-  for (; !aError && aEntry != aEnd; aEntry.increment(aError)) {
-    const int aOwner = fdfTiffTemporaryOwner(aName + aExt, aEntry->path().filename().string());
-    if (aOwner == 0 || aOwner == fdfProcessId() || fdfProcessExists(aOwner))
-      continue;
-    std::error_code aStatusError;
-    if (!aEntry->is_symlink(aStatusError) && aEntry->is_regular_file(aStatusError) &&
-        fdfRemoveFileEntry(aEntry->path().c_str()) == 0)
-      fdfTraceMessage("Removed the temporary TIFF of an ended run %s\n", aEntry->path().c_str());
-  }
-}
-
 struct SGtifFree {
   void operator()(GTIF *theGtif) const { GTIFFree(theGtif); }
 };
@@ -108,27 +89,6 @@ bool setGeoKey(GTIF *theGtif, const STLRXGeoKey &theKey) {
 
 const char *fdfLastTiffError() { return sLastTiffError; }
 
-int fdfTiffTemporaryOwner(const std::string &theFinalBase, const std::string &theName) {
-  const std::string aPrefix = theFinalBase + CTLRX_TIFF_TEMPORARY_TAG;
-  if (theFinalBase.empty() || theName.compare(0, aPrefix.size(), aPrefix) != 0)
-    return 0;
-  size_t aPos = aPrefix.size();
-  long long aPid = 0;
-  for (; aPos < theName.size() && std::isdigit(static_cast<unsigned char>(theName[aPos])); ++aPos) {
-    aPid = aPid * 10 + (theName[aPos] - '0');
-    if (aPid > INT32_MAX)
-      return 0;
-  }
-  // Then "." and the six characters mkstemp chose, nothing else.
-  const size_t aRandom = aPos + 1;
-  if (aPid == 0 || aPos >= theName.size() || theName[aPos] != '.' || theName.size() != aRandom + 6)
-    return 0;
-  for (size_t i = aRandom; i < theName.size(); ++i)
-    if (!std::isalnum(static_cast<unsigned char>(theName[i])))
-      return 0;
-  return static_cast<int>(aPid);
-}
-
 CGeoTiffFile::CHandlerScope::CHandlerScope()
     : mPreviousError(TIFFSetErrorHandler(captureTiffError)), mPreviousWarning(TIFFSetWarningHandler(traceTiffWarning)) {
   sLastTiffError[0] = '\0';
@@ -140,7 +100,7 @@ CGeoTiffFile::CHandlerScope::~CHandlerScope() {
 }
 
 CGeoTiffFile::CGeoTiffFile(const std::string &theFinalName, uint64_t theImageBytes) : mFinalName(theFinalName) {
-  removeStaleTemporaries(theFinalName);
+  fdfRemoveStaleTemporaries(theFinalName, CTLRX_TIFF_TEMPORARY_TAG, 6);
   const std::string aPattern =
       theFinalName + CTLRX_TIFF_TEMPORARY_TAG + std::to_string(fdfProcessId()) + ".XXXXXX";
   std::vector<char> aTemplate(aPattern.c_str(), aPattern.c_str() + aPattern.size() + 1);

@@ -84,6 +84,3 @@ const char *fdfLastTiffError();
 // Temporaries are named "<final name>.tlrxtmp_<pid>.XXXXXX", so each one
 // names its TIFF and the process that writes it.
 constexpr const char *CTLRX_TIFF_TEMPORARY_TAG = ".tlrxtmp_";
-// The writer's pid when theName (no folder) is such a temporary of the TIFF
-// named theFinalBase (no folder), else 0.
-int fdfTiffTemporaryOwner(const std::string &theFinalBase, const std::string &theName);

@@ -49,7 +49,13 @@ std::string fdfRunTemporaryName(const char *theStem) {
   return fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + theStem + "_" + std::to_string(fdfProcessId());
 }
 
-std::string fdfPartName(const std::string &theName) { return theName + ".part-" + std::to_string(fdfProcessId()); }
+namespace {
+
+constexpr const char *CTLRX_PART_TAG = ".part-";
+
+} // namespace
+
+std::string fdfPartName(const std::string &theName) { return theName + CTLRX_PART_TAG + std::to_string(fdfProcessId()); }
 
 CResultRaster::CResultRaster(const std::string &theName, const CDescription &theHeader)
     : mName(theName), mTemporary(fdfPartName(theName)) {
@@ -58,6 +64,7 @@ CResultRaster::CResultRaster(const std::string &theName, const CDescription &the
     fdfTraceMessage("Error: cannot open the file: %s  (a directory)\n", mName.c_str());
     TLRX_RAISE(CTLRX_ERR_RF_WRITE, mName.c_str());
   }
+  fdfRemoveStaleTemporaries(mName, CTLRX_PART_TAG, 0);
   mPending.addFile(mTemporary);
   mRaster.open_write(mTemporary.c_str(), theHeader);
 }

@@ -13,6 +13,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <fcntl.h>
 #include <memory>
 #include <new>
@@ -256,6 +257,48 @@ std::vector<std::string> fdfReadNameList(const char *theFileName) {
   std::vector<std::string> aNames = fdfReadLineList(theFileName, true);
   aNames.erase(std::remove(aNames.begin(), aNames.end(), std::string()), aNames.end());
   return aNames;
+}
+
+int fdfTemporaryOwner(const std::string &theFinalBase, const char *theTag, int theRandomChars,
+                      const std::string &theName) {
+  const std::string aPrefix = theFinalBase + theTag;
+  if (theFinalBase.empty() || theName.compare(0, aPrefix.size(), aPrefix) != 0)
+    return 0;
+  size_t aPos = aPrefix.size();
+  long long aPid = 0;
+  for (; aPos < theName.size() && std::isdigit(static_cast<unsigned char>(theName[aPos])); ++aPos) {
+    aPid = aPid * 10 + (theName[aPos] - '0');
+    if (aPid > INT32_MAX)
+      return 0;
+  }
+  if (aPid == 0)
+    return 0;
+  if (theRandomChars == 0)
+    return aPos == theName.size() ? static_cast<int>(aPid) : 0;
+  // Then "." and the characters mkstemp chose, nothing else.
+  const size_t aRandom = aPos + 1;
+  if (aPos >= theName.size() || theName[aPos] != '.' || theName.size() != aRandom + theRandomChars)
+    return 0;
+  for (size_t i = aRandom; i < theName.size(); ++i)
+    if (!std::isalnum(static_cast<unsigned char>(theName[i])))
+      return 0;
+  return static_cast<int>(aPid);
+}
+
+void fdfRemoveStaleTemporaries(const std::string &theFinalName, const char *theTag, int theRandomChars) {
+  std::string aDir, aName, aExt;
+  fdfSplitPath(theFinalName, aDir, aName, aExt);
+  std::error_code aError;
+  std::filesystem::directory_iterator aEntry(aDir.empty() ? "." : aDir, aError), aEnd;
+  for (; !aError && aEntry != aEnd; aEntry.increment(aError)) {
+    const int aOwner = fdfTemporaryOwner(aName + aExt, theTag, theRandomChars, aEntry->path().filename().string());
+    if (aOwner == 0 || aOwner == fdfProcessId() || fdfProcessExists(aOwner))
+      continue;
+    std::error_code aStatusError;
+    if (!aEntry->is_symlink(aStatusError) && aEntry->is_regular_file(aStatusError) &&
+        fdfRemoveFileEntry(aEntry->path().c_str()) == 0)
+      fdfTraceMessage("Removed the temporary of an ended run %s\n", aEntry->path().c_str());
+  }
 }
 
 std::string fdfIntToText(long theValue) {
