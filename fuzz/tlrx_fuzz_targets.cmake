@@ -2,7 +2,7 @@
 # only) and a replay program with a plain main that runs the inputs of
 # fuzz/corpus/<name>/ (and any files or folders given), so that a crash kept
 # there becomes a regression test. Included by fuzz/ and by tests/. Targets
-# link the tools and utility libraries.
+# link the GeoTIFF library and the ones it uses.
 set(TLRX_FUZZ_DIR ${CMAKE_CURRENT_LIST_DIR})
 file(GLOB TLRX_FUZZ_SOURCES CONFIGURE_DEPENDS ${TLRX_FUZZ_DIR}/fuzz_*.cpp)
 
@@ -16,11 +16,11 @@ function(tlrx_add_fuzz_targets theWithFuzzer theTestPrefix)
     add_executable(${aName}_replay ${aSource} ${TLRX_FUZZ_DIR}/tlrx_fuzz_support.cpp
                    ${TLRX_FUZZ_DIR}/tlrx_fuzz_replay_main.cpp)
     target_include_directories(${aName}_replay PRIVATE ${TLRX_FUZZ_DIR})
-    target_link_libraries(${aName}_replay PRIVATE tlrx_tools tlrx_utility)
+    target_link_libraries(${aName}_replay PRIVATE tlrx_geotiff)
     if(theWithFuzzer)
       add_executable(${aName} ${aSource} ${TLRX_FUZZ_DIR}/tlrx_fuzz_support.cpp)
       target_include_directories(${aName} PRIVATE ${TLRX_FUZZ_DIR})
-      target_link_libraries(${aName} PRIVATE tlrx_tools tlrx_utility)
+      target_link_libraries(${aName} PRIVATE tlrx_geotiff)
       target_link_options(${aName} PRIVATE -fsanitize=fuzzer)
     endif()
     if(theTestPrefix AND EXISTS ${TLRX_FUZZ_DIR}/corpus/${aName})

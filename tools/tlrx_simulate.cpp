@@ -6,6 +6,7 @@
 // message on standard error and exit status 1; a bad command line gives its
 // message, the usage line and exit status 2. The runtime is started without
 // its log and trace, so a run leaves nothing behind but the requested files.
+#include "tlrx_envi_util.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
@@ -78,6 +79,7 @@ int main(int argc, char **argv) {
   try {
     // Start-up itself runs in report-and-exit mode; everything after throws.
     fdfInitEnvironment(false, "tlrx_simulate (Tellurix scene simulator)");
+    fdfInstallEnviHeaderWriter();
     fdfSetReportAndExit(false);
     fdfSetProcessName("tlrx_simulate");
     loadCatalogues();

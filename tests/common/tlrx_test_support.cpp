@@ -1,5 +1,7 @@
 #include "tlrx_test_support.h"
 
+#include "tlrx_envi_util.h"
+
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
@@ -62,6 +64,7 @@ void tlrxStartLibraryEnvironment(const std::string &theWorkDir) {
   setenv("TELLURIX_BATCH_DIR", theWorkDir.c_str(), 1);
   unsetenv("TELLURIX_WORKING_FILE");
   fdfInitEnvironment(true, "Tellurix test banner");
+  fdfInstallEnviHeaderWriter();
   fdfSetReportAndExit(false);
 }
 

@@ -1,5 +1,5 @@
 // One line of ratios against the direct formula, and the histogram classes.
-#include "ratio_images.h"
+#include "tlrx_ratio_line.h"
 
 #include <gtest/gtest.h>
 

@@ -3,6 +3,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_reference.h"
+#include "tlrx_window_step.h"
 #include "tlrx_window_sums.h"
 
 #include <gtest/gtest.h>

@@ -3,9 +3,9 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_geotiff_codes.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_platform.h"
-#include "tlrx_raster_to_geotiff.h"
 
 #include <geotiff/geotiff.h>
 #include <geotiff/geotiffio.h>

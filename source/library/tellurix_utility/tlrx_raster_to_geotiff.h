@@ -18,14 +18,7 @@
 
 #include <cstdint>
 
-// Codes raised by the conversion (primary class 2, raster and quick-look output).
-constexpr int32_t CTLRX_ERR_TIFF_ARGUMENTS = 130560;     // 2, -1 argument vector without raster and TIFF names
-constexpr int32_t CTLRX_ERR_TIFF_HEADER_MISSING = 130562; // 2, 1 input header cannot be read
-constexpr int32_t CTLRX_ERR_TIFF_RASTER_OPEN = 130563;   // 2, 2 input raster cannot be opened
-constexpr int32_t CTLRX_ERR_TIFF_EMPTY_SAMPLE = 130564;  // 2, 3 no valid value in the statistics sample
-constexpr int32_t CTLRX_ERR_TIFF_CREATE = 130565;        // 2, 4 TIFF cannot be created, written or renamed
-constexpr int32_t CTLRX_ERR_TIFF_HEADER_WRITE = 130566;  // 2, 5 TIFF header cannot be written
-constexpr int32_t CTLRX_ERR_TIFF_HISTOGRAM = 130567;     // 2, 6 histogram of the sample cannot be built
+#include "tlrx_geotiff_codes.h"
 
 // Positions in the argument vector of make_tiff.
 constexpr int CTLRXGC_INPUT_POS = 1;

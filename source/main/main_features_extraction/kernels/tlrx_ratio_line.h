@@ -1,14 +1,11 @@
-// Step program: the ratio of two co-registered images, linear or in decibels.
+// One line of the ratio of two co-registered images (see tlrx_ratio_line.cpp).
 #pragma once
 
 #include <cstdint>
 
-// argv[1] input 1, argv[2] input 2, argv[3] output name, argv[4] optional
-// decibel switch (non-zero integer). Returns 0 on success.
-int ratio_images(int argc, char **argv);
-
-// Printed lines of the ratio histogram.
+// Printed lines of the ratio histogram; 12 of them count.
 constexpr int CTLRX_RATIO_HISTOGRAM_CLASSES = 13;
+constexpr int CTLRX_RATIO_COUNTED_CLASSES = 12;
 // One line of ratios: theNull where an input is no data or the divisor is
 // not above the smallest normal float; theHistogram (12 counting classes:
 // below -10, -1, -0.1, 0.1, 1, ..., 1000000, then "Other") counts the output.

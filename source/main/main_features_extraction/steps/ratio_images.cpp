@@ -9,6 +9,7 @@
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_ratio_line.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_window_step.h"
@@ -24,29 +25,13 @@
 
 namespace {
 
-constexpr double CTLRX_EPS = 1.1754943508222875e-38;
 constexpr const char *CTLRX_RATIO_SUFFIX = "_rto";
 
-// Counting classes: below each limit in turn, then "Other".
-constexpr int CTLRX_RATIO_COUNTED_CLASSES = 12;
-const double theHistogramLimits[CTLRX_RATIO_COUNTED_CLASSES - 1] = {-10, -1, -0.1, 0.1, 1, 10, 100, 1000, 10000, 100000, 1000000};
 // Printed classes; "Less than 0.01 " has no counting test and stays 0.
 const char *const theHistogramLabels[CTLRX_RATIO_HISTOGRAM_CLASSES] = {
     "Less than -10 ",  "Less than - 1 ",   "Less than -0.1 ",   "Less than 0.01 ", "Less than 0.1 ",
     "Less than 1 ",    "Less than 10 ",    "Less than 100 ",    "Less than 1000 ", "Less than 10000 ",
     "Less than 100000 ", "Less than 1000000 ", "Other "};
-
-using CFloatLimits = std::array<float, CTLRX_RATIO_COUNTED_CLASSES - 1>;
-
-CFloatLimits fdfFloatLimits() {
-  CFloatLimits aLimits;
-  for (size_t k = 0; k < aLimits.size(); ++k) {
-    aLimits[k] = static_cast<float>(theHistogramLimits[k]);
-    if (static_cast<double>(aLimits[k]) < theHistogramLimits[k])
-      aLimits[k] = std::nextafter(aLimits[k], std::numeric_limits<float>::infinity());
-  }
-  return aLimits;
-}
 
 std::string fdfRatioOutputName(const char *theName) {
   std::string aName(theName);
@@ -65,46 +50,6 @@ void fdfTraceUsage(const char *theProgram) {
 }
 
 } // namespace
-
-// Whether v is a valid cell against null D: not NaN-with-NaN, not within
-// the smallest normal float of D.
-inline bool fdfValidCell(double theValue, double theNull, bool theNullIsNaN) {
-  return theNullIsNaN ? theValue == theValue
-                      : !(theValue >= theNull - CTLRX_EPS && theValue <= theNull + CTLRX_EPS);
-}
-
-void fdfRatioLine(const float *theA, double theNullA, const float *theB, double theNullB, int32_t thePixels,
-                  bool theDecibel, float theNull, float *theOut, long long *theHistogram) {
-  const bool aNaNA = std::isnan(theNullA);
-  const bool aNaNB = std::isnan(theNullB);
-  // Branch-free so the compiler vectorises it: invalid pairs divide by 1.
-  for (int32_t i = 0; i < thePixels; ++i) {
-    const double aA = theA[i];
-    const double aB = theB[i];
-    const bool aValid = fdfValidCell(aA, theNullA, aNaNA) & fdfValidCell(aB, theNullB, aNaNB) & !(aB <= CTLRX_EPS);
-    const double aRatio = aA / (aValid ? aB : 1.0);
-    theOut[i] = aValid ? static_cast<float>(aRatio) : theNull;
-  }
-  if (theDecibel)
-    for (int32_t i = 0; i < thePixels; ++i) {
-      const double aA = theA[i];
-      const double aB = theB[i];
-      if (fdfValidCell(aA, theNullA, aNaNA) && fdfValidCell(aB, theNullB, aNaNB) && !(aB <= CTLRX_EPS))
-        theOut[i] = static_cast<float>(10.0 * std::log10(aA / aB));
-    }
-  // The class is the number of limits not above the value ("Other" for NaN),
-  // found with float compares against the limits rounded up to floats, which
-  // gives the same answer as comparing the stored float with each limit.
-  static const CFloatLimits theFloatLimits = fdfFloatLimits();
-  for (int32_t i = 0; i < thePixels; ++i) {
-    const float aValue = theOut[i];
-    int aClass = 0;
-#pragma GCC unroll 11
-    for (size_t k = 0; k < theFloatLimits.size(); ++k)
-      aClass += aValue >= theFloatLimits[k];
-    ++theHistogram[aValue != aValue ? CTLRX_RATIO_COUNTED_CLASSES - 1 : aClass];
-  }
-}
 
 int ratio_images(int argc, char **argv) {
   fdfTraceMessage("RATIO ");

@@ -19,6 +19,12 @@ const char *fdfHeaderText(const CDescription &theHeader, const char *theKey) {
 
 } // namespace
 
+void fdfCheckWindowSize(int32_t theRows, int32_t theCols) {
+  for (int32_t aSize : {theRows, theCols})
+    if (aSize < CTLRX_WINDOW_MIN_SIZE || aSize > CTLRX_WINDOW_MAX_SIZE)
+      TLRX_RAISE(CTLRX_ERR_WINDOW_SIZE, nullptr);
+}
+
 bool fdfDeliversIntensity(const CDescription &theHeader) {
   return std::strcmp(fdfHeaderText(theHeader, "RasterInfo.DataUnits"), "POWER") == 0 ||
          fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType")));

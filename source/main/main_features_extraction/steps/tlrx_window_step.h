@@ -13,6 +13,13 @@
 
 // Codes of the window steps beside those of the raster file.
 constexpr int32_t CTLRX_ERR_SIZE_MISMATCH = 652807; // 10, 6
+// Window rows or columns outside CTLRX_WINDOW_MIN_SIZE .. CTLRX_WINDOW_MAX_SIZE.
+constexpr int32_t CTLRX_ERR_WINDOW_SIZE = 456961; // 7, 0
+constexpr int32_t CTLRX_WINDOW_MIN_SIZE = 3;
+constexpr int32_t CTLRX_WINDOW_MAX_SIZE = 500;
+
+// Raises CTLRX_ERR_WINDOW_SIZE (no message) unless both sizes lie in 3 .. 500.
+void fdfCheckWindowSize(int32_t theRows, int32_t theCols);
 
 // Whether the line read delivers intensities for a raster of this header:
 // "DataUnits" "POWER", or a complex cell type (whose cells are read as

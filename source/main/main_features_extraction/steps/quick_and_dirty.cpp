@@ -81,7 +81,7 @@ int quick_and_dirty(int argc, char **argv) {
         fdfCorrelationLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data(), aStats);
         aOutput.file().putLine(theLine, aLine.data());
       },
-      &aProgress);
+      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
   aFirst.close();
   aSecond.close();
   aNorm.close();

@@ -6,6 +6,7 @@
 #include "main_ratio.h"
 #include "main_search_min_max_value.h"
 #include "main_texture.h"
+#include "tlrx_envi_util.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
@@ -56,6 +57,8 @@ int main_features_extraction(const char *theLine) {
   theCommandLine = theLine != nullptr ? theLine : "";
   try {
     fdfInitEnvironment(true, fdfProductBanner());
+    // Every header written from now on gets its ENVI header beside it.
+    fdfInstallEnviHeaderWriter();
     const size_t aTrailer = theCommandLine.find(theTrailerMarker);
     if (aTrailer != std::string::npos)
       theCommandLine.erase(aTrailer);

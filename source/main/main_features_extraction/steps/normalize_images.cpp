@@ -64,7 +64,7 @@ int normalize_images(int argc, char **argv) {
         aComputed += fdfNormalizeLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());
         aOutput.file().putLine(theLine, aLine.data());
       },
-      &aProgress);
+      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
   aFirst.close();
   aSecond.close();
   fdfTraceSignificantCount(aDummy, aComputed);

@@ -2,7 +2,6 @@
 // trace, banners, progress protocol with the host and the closing step.
 #include "tlrx_enviroment.h"
 
-#include "tlrx_envi_util.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_platform.h"
@@ -407,8 +406,6 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   fdfSetDummyValue(fdfGetRequiredEnvVar("TELLURIX_DUMMY_VALUE").c_str());
   if (const char *aGcp = std::getenv("TELLURIX_GCP_DATABASE_DIR"))
     fdfSetEnvVar(fdfWithSeparator(aGcp).c_str(), "TELLURIX_GCP_DATABASE_DIR");
-  // Every header written from now on gets its ENVI header beside it.
-  fdfInstallEnviHeaderWriter();
 
   if (!theFullSet)
     return true;

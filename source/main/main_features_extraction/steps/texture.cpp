@@ -68,7 +68,7 @@ int texture(int argc, char **argv) {
         fdfTextureLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data());
         aOutput.file().putLine(theLine, aLine.data());
       },
-      &aProgress);
+      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
   aInput.close();
   fdfTraceMessage("writing the output parameter file %s\n", argv[2]);
   aOutput.commit(aHeader, CTLRX_ERR_FILE_COPY);

@@ -6,7 +6,7 @@
 // place once complete, and the whole run's results go if any step fails.
 #include "tlrx_temporal_features.h"
 
-#include "main_search_min_max_value.h"
+#include "tlrx_acquisition_dates.h"
 #include "tlrx_description_section.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"

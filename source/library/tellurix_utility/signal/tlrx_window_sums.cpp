@@ -1,16 +1,6 @@
 #include "tlrx_window_sums.h"
 
-#include "tlrx_enviroment.h"
-#include "tlrx_errors.h"
-#include "tlrx_features_common.h"
-
 #include <algorithm>
-
-void fdfCheckWindowSize(int32_t theRows, int32_t theCols) {
-  for (int32_t aSize : {theRows, theCols})
-    if (aSize < CTLRX_WINDOW_MIN_SIZE || aSize > CTLRX_WINDOW_MAX_SIZE)
-      TLRX_RAISE(CTLRX_ERR_WINDOW_SIZE, nullptr);
-}
 
 // Sum over the window [j - h, j + h] clipped to [0, P - 1]: the first window
 // holds columns 0 .. min(h, P - 1); then column j + h enters while it exists
@@ -78,13 +68,13 @@ void CWindowRing::subtractLine(int32_t theLine) {
 // line l + hr - R leaves and line l + hr enters. Both map to the same slot,
 // so the leaving line is subtracted before the entering one is loaded.
 void fdfRunWindowSchedule(CWindowRing &theRing, int32_t theLines, const TLRXWindowLoad &theLoad,
-                          const TLRXWindowEmit &theEmit, CLineProgress *theProgress) {
+                          const TLRXWindowEmit &theEmit, const TLRXWindowProgress &theProgress) {
   const int32_t aHalf = theRing.halfRows();
   const int32_t aRows = theRing.rows();
   int32_t aNextLoad = 0;
   for (int32_t l = 0; l < theLines; ++l) {
-    if (theProgress != nullptr)
-      theProgress->update(l, theLines);
+    if (theProgress)
+      theProgress(l, theLines);
     const int32_t aLeaving = l + aHalf - aRows;
     if (aLeaving >= 0)
       theRing.subtractLine(aLeaving);

@@ -23,16 +23,6 @@
 #include <functional>
 #include <vector>
 
-class CLineProgress;
-
-constexpr int32_t CTLRX_WINDOW_MIN_SIZE = 3;
-constexpr int32_t CTLRX_WINDOW_MAX_SIZE = 500;
-// Window rows or columns outside CTLRX_WINDOW_MIN_SIZE .. CTLRX_WINDOW_MAX_SIZE.
-constexpr int32_t CTLRX_ERR_WINDOW_SIZE = 456961; // 7, 0
-
-// Raises CTLRX_ERR_WINDOW_SIZE (no message) unless both sizes lie in 3 .. 500.
-void fdfCheckWindowSize(int32_t theRows, int32_t theCols);
-
 // Row-window sum of one line: theSums[j] = sum of theTerms[k] for k in
 // max(0, j - theHalf) .. min(thePixels - 1, j + theHalf). Running sum: one
 // term enters and one leaves per column, so the cost does not depend on
@@ -84,12 +74,13 @@ private:
 using TLRXWindowLoad = std::function<void(int32_t theLine)>;
 // Produces output line theLine from the accumulators and its centre flags.
 using TLRXWindowEmit = std::function<void(int32_t theLine)>;
+// Told output line theLine of theLines is next (progress, interruption).
+using TLRXWindowProgress = std::function<void(int32_t theLine, int32_t theLines)>;
 
 // The line schedule: for output line l = 0 .. theLines - 1, the line that
 // left the window (l + hr - R) is subtracted, the lines that entered it (up to
 // min(theLines - 1, l + hr)) are loaded into the slot just freed and added,
 // and line l is emitted. Every input line is loaded once, in order. Progress
-// (when given) is sent before each output line; the host's interruption ends
-// the run there.
+// (when given) is told before each output line.
 void fdfRunWindowSchedule(CWindowRing &theRing, int32_t theLines, const TLRXWindowLoad &theLoad,
-                          const TLRXWindowEmit &theEmit, CLineProgress *theProgress);
+                          const TLRXWindowEmit &theEmit, const TLRXWindowProgress &theProgress = nullptr);

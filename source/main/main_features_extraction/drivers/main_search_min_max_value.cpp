@@ -3,12 +3,14 @@
 // every result (value N, date class 0); ties keep the earlier date.
 #include "main_search_min_max_value.h"
 
+#include "tlrx_acquisition_dates.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
+#include "tlrx_min_max_line.h"
 #include "tlrx_raster_to_geotiff.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
@@ -79,95 +81,6 @@ void fdfMakeDateHeader(CDescription &theHeader, const std::vector<STLRXDate> &th
   }
 }
 
-STLRXDate fdfReadInputDate(const std::string &theName) {
-  CDescription aHeader;
-  fdfLoadInputHeader(theName, aHeader);
-  std::string aText;
-  if (!fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aText)) {
-    fdfLogMessage("Not found the field %s in %s\n\n", CTLRX_ACQUISITION_TIME_KEY, theName.c_str());
-    TLRX_RAISE(CTLRX_ERR_DS_FIELD_MISSING, CTLRX_ACQUISITION_TIME_KEY);
-  }
-  STLRXDate aDate;
-  // A date that cannot be read would put the image at a wrong place in time.
-  if (!fdfParseAcquisitionDate(aText, aDate)) {
-    fdfLogMessage("Invalid value [%s] of the field %s in %s\n\n", aText.c_str(), CTLRX_ACQUISITION_TIME_KEY,
-                  theName.c_str());
-    TLRX_RAISE(CTLRX_ERR_DS_FIELD_MISSING, CTLRX_ACQUISITION_TIME_KEY);
-  }
-  fdfTraceMessage("%s DATE = %s\n", theName.c_str(), aText.c_str());
-  return aDate;
-}
-
-// Per-pixel state of the pass.
-struct SMinMax {
-  float *mMin, *mMax, *mMinDate, *mMaxDate;
-};
-
-// theCondition ? theYes : theNo on the bits, which the compiler vectorises
-// where a floating-point selection would stay a branch.
-inline float fdfSelect(bool theCondition, float theYes, float theNo) {
-  uint32_t aYes, aNo;
-  std::memcpy(&aYes, &theYes, sizeof aYes);
-  std::memcpy(&aNo, &theNo, sizeof aNo);
-  const uint32_t aMask = 0u - static_cast<uint32_t>(theCondition);
-  const uint32_t aBits = (aYes & aMask) | (aNo & ~aMask);
-  float aResult;
-  std::memcpy(&aResult, &aBits, sizeof aResult);
-  return aResult;
-}
-
-// Validity of one input line against its null value (same rule as fdfIsNull).
-void fdfValidCells(const float *__restrict theRow, double theNull, int32_t thePixels, uint8_t *__restrict theValid) {
-  constexpr double aTolerance = 1.1754943508222875e-38;
-  if (std::isnan(theNull)) {
-    for (int32_t x = 0; x < thePixels; ++x)
-      theValid[x] &= theRow[x] == theRow[x];
-    return;
-  }
-  for (int32_t x = 0; x < thePixels; ++x) {
-    const double aValue = theRow[x];
-    theValid[x] &= !(aValue >= theNull - aTolerance && aValue <= theNull + aTolerance);
-  }
-}
-
-// Input by input over the whole line, so each loop vectorises; a pixel that
-// is no data in any input ends as theNull with date 0, as if the visit had
-// stopped at that input. Strict comparisons keep the earlier date on ties.
-void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
-                   int32_t thePixels, float theNull, std::vector<uint8_t> &theValid, const SMinMax &theOut) {
-  std::fill(theValid.begin(), theValid.end(), 1);
-  const float *aFirst = theRows[0].data();
-  for (int32_t x = 0; x < thePixels; ++x) {
-    theOut.mMin[x] = theOut.mMax[x] = aFirst[x];
-    theOut.mMinDate[x] = theOut.mMaxDate[x] = 1.0f;
-  }
-  fdfValidCells(aFirst, theNulls[0], thePixels, theValid.data());
-  for (size_t i = 1; i < theRows.size(); ++i) {
-    const float *__restrict aRow = theRows[i].data();
-    float *__restrict aMin = theOut.mMin;
-    float *__restrict aMax = theOut.mMax;
-    float *__restrict aMinDate = theOut.mMinDate;
-    float *__restrict aMaxDate = theOut.mMaxDate;
-    const float aDate = static_cast<float>(i + 1);
-    for (int32_t x = 0; x < thePixels; ++x) {
-      const float aValue = aRow[x];
-      const bool aLower = aValue < aMin[x];
-      const bool aHigher = aValue > aMax[x];
-      aMin[x] = fdfSelect(aLower, aValue, aMin[x]);
-      aMinDate[x] = fdfSelect(aLower, aDate, aMinDate[x]);
-      aMax[x] = fdfSelect(aHigher, aValue, aMax[x]);
-      aMaxDate[x] = fdfSelect(aHigher, aDate, aMaxDate[x]);
-    }
-    fdfValidCells(aRow, theNulls[i], thePixels, theValid.data());
-  }
-  for (int32_t x = 0; x < thePixels; ++x) {
-    const bool aValid = theValid[x] != 0;
-    theOut.mMin[x] = aValid ? theOut.mMin[x] : theNull;
-    theOut.mMax[x] = aValid ? theOut.mMax[x] : theNull;
-    theOut.mMinDate[x] = aValid ? theOut.mMinDate[x] : 0.0f;
-    theOut.mMaxDate[x] = aValid ? theOut.mMaxDate[x] : 0.0f;
-  }
-}
 
 int32_t fdfRunMinMax(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Min and Max");
@@ -259,20 +172,6 @@ int32_t fdfRunMinMax(const char *theArguments) {
 
 } // namespace
 
-std::vector<STLRXDate> fdfOrderChronologically(std::vector<std::string> &theNames) {
-  std::vector<STLRXDate> aDates;
-  for (const std::string &aName : theNames)
-    aDates.push_back(fdfReadInputDate(aName));
-  for (size_t i = 0; i + 1 < aDates.size(); ++i)
-    for (size_t j = i + 1; j < aDates.size(); ++j)
-      if (fdfDateBefore(aDates[j], aDates[i])) {
-        std::swap(aDates[i], aDates[j]);
-        std::swap(theNames[i], theNames[j]);
-      }
-  for (size_t i = 0; i < aDates.size(); ++i)
-    fdfTraceMessage("DATE = %s   NAME = %s\n", fdfDateTraceText(aDates[i]).c_str(), theNames[i].c_str());
-  return aDates;
-}
 
 void fdfDateClassColour(int theClass, int &theRed, int &theGreen, int &theBlue) {
   theRed = (5 * theClass) % 150 + 100;
