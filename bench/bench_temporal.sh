@@ -69,6 +69,7 @@ parameters() {
       span_max_on_min max_on_min_sup max_on_min_inf date_max date_min_before_max; do
       printf '<%s>OK</%s>\n' "$aSwitch" "$aSwitch"
     done
+    printf '<saturation_default>0</saturation_default>\n'
     printf '<TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>\n</MAIN_CMD>\n</HEADER_INFO>\n'
   } >"$WORK/$4"
 }

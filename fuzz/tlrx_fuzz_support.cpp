@@ -40,7 +40,6 @@ std::string scratchFolder() {
 } // namespace
 
 extern "C" int LLVMFuzzerInitialize(int *, char ***) {
-  fdfSetReportAndExit(false);
   return 0;
 }
 

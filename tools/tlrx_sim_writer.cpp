@@ -15,7 +15,7 @@
 // ------------------------------------------------------------- encoding
 
 CSimCellEncoder::CSimCellEncoder(int32_t theCellType, double theNull, double theScaleFactor)
-    : mCellType(theCellType), mNull(theNull), mScaleFactor(theScaleFactor) {}
+    : mCellType(theCellType), mNull(theNull), mNoData(theNull), mScaleFactor(theScaleFactor) {}
 
 size_t CSimCellEncoder::lineBytes(int32_t thePixels) const {
   return static_cast<size_t>(fdfCellLineBytes(mCellType, thePixels));
@@ -45,7 +45,7 @@ T CSimCellEncoder::toCell(double theValue) {
 // types the step is well beyond the no-data tolerance of the readers.
 template <typename T>
 T CSimCellEncoder::awayFromNull(T theCell) const {
-  if (!fdfIsNull(static_cast<double>(theCell), mNull))
+  if (!mNoData.isNull(static_cast<double>(theCell)))
     return theCell;
   if (std::is_integral<T>::value)
     return mNull < static_cast<double>(std::numeric_limits<T>::max()) ? static_cast<T>(mNull + 1.0)
@@ -76,7 +76,7 @@ void CSimCellEncoder::encodeComplex(const double *theRe, const double *theIm, co
     aCell.mRe = toCell<TPart>(theUnsigned ? std::fabs(theRe[p]) : theRe[p]);
     aCell.mIm = toCell<TPart>(theUnsigned ? std::fabs(theIm[p]) : theIm[p]);
     // A complex cell is no data only when both parts are.
-    if (fdfIsNull(static_cast<double>(aCell.mIm), mNull))
+    if (mNoData.isNull(static_cast<double>(aCell.mIm)))
       aCell.mRe = awayFromNull(aCell.mRe);
   }
 }

@@ -39,6 +39,7 @@ private:
 
   int32_t mCellType;
   double mNull;
+  SNoData mNoData; // the readers' rule for mNull
   double mScaleFactor;
   int64_t mClipped = 0;
 };

@@ -77,10 +77,8 @@ int main(int argc, char **argv) {
     return CTLRX_SIM_EXIT_FAILURE;
   }
   try {
-    // Start-up itself runs in report-and-exit mode; everything after throws.
     fdfInitEnvironment(false, "tlrx_simulate (Tellurix scene simulator)");
     fdfInstallEnviHeaderWriter();
-    fdfSetReportAndExit(false);
     fdfSetProcessName("tlrx_simulate");
     loadCatalogues();
     fdfSimRun(aOptions);

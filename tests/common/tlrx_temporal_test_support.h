@@ -54,6 +54,7 @@ struct STLRXTemporalParameters {
   bool mWithList = true;
   std::string mRoot;
   std::vector<std::pair<std::string, std::string>> mSettings;
+  std::string mSaturation = "0"; // written unless mSettings holds one; empty: none
   std::string mEnvironment = "IDL_ENVI_ENV";
   std::string mRootTag = "HEADER_INFO";
 };
@@ -70,8 +71,13 @@ inline std::string tlrxTemporalParameterText(const STLRXTemporalParameters &theP
   }
   if (!theParameters.mRoot.empty())
     aText += "      <out_root_file_name>" + theParameters.mRoot + "</out_root_file_name>\n";
-  for (const auto &aSetting : theParameters.mSettings)
+  bool aSaturation = theParameters.mSaturation.empty();
+  for (const auto &aSetting : theParameters.mSettings) {
     aText += "      <" + aSetting.first + ">" + aSetting.second + "</" + aSetting.first + ">\n";
+    aSaturation = aSaturation || aSetting.first == "saturation_default";
+  }
+  if (!aSaturation)
+    aText += "      <saturation_default>" + theParameters.mSaturation + "</saturation_default>\n";
   aText += "      <TellurixEnvironment>" + theParameters.mEnvironment + "</TellurixEnvironment>\n";
   return aText + "   </MAIN_CMD>\n</" + theParameters.mRootTag + ">\n";
 }

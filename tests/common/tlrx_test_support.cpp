@@ -65,7 +65,6 @@ void tlrxStartLibraryEnvironment(const std::string &theWorkDir) {
   unsetenv("TELLURIX_WORKING_FILE");
   fdfInitEnvironment(true, "Tellurix test banner");
   fdfInstallEnviHeaderWriter();
-  fdfSetReportAndExit(false);
 }
 
 void tlrxWriteConfiguration(const std::string &theDir, const std::map<int, std::string> &theReplace, int theLines) {

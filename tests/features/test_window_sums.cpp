@@ -46,21 +46,29 @@ double directSum(const STestImage &theImage, int theRows, int theCols, int theLi
 
 } // namespace
 
-TEST(RowWindowSum, MatchesDirectSumsForEveryHalfWidthAndLength) {
+// Every width (odd: both rules; even: the exact rule), the window starting
+// width / 2 columns left of j, with the count of non-zero terms beside.
+TEST(RowWindowSum, MatchesDirectSumsForEveryWidthAndLength) {
   std::mt19937_64 aEngine(7);
   std::uniform_real_distribution<double> aValue(-3.0, 11.0);
   for (int aPixels = 1; aPixels <= 13; ++aPixels) {
     std::vector<double> aTerms(aPixels);
     for (double &aTerm : aTerms)
-      aTerm = aValue(aEngine);
-    for (int aHalf = 0; aHalf <= 15; ++aHalf) {
+      aTerm = aEngine() % 4 == 0 ? 0.0 : aValue(aEngine);
+    for (int aWidth = 1; aWidth <= 31; ++aWidth) {
+      const int aLeft = aWidth / 2;
       std::vector<double> aSums(aPixels, theNaN);
-      fdfRowWindowSum(aTerms.data(), aPixels, aHalf, aSums.data());
+      std::vector<int32_t> aNonZero(aPixels, -1);
+      fdfRowWindowSum(aTerms.data(), aPixels, aLeft, aWidth, aSums.data(), aNonZero.data());
       for (int j = 0; j < aPixels; ++j) {
         double aWant = 0;
-        for (int k = std::max(0, j - aHalf); k <= std::min(aPixels - 1, j + aHalf); ++k)
+        int aWantNonZero = 0;
+        for (int k = std::max(0, j - aLeft); k <= std::min(aPixels - 1, j - aLeft + aWidth - 1); ++k) {
           aWant += aTerms[k];
-        EXPECT_NEAR(aSums[j], aWant, 1e-12) << "P " << aPixels << " half " << aHalf << " column " << j;
+          aWantNonZero += aTerms[k] != 0.0 ? 1 : 0;
+        }
+        EXPECT_NEAR(aSums[j], aWant, 1e-12) << "P " << aPixels << " width " << aWidth << " column " << j;
+        EXPECT_EQ(aNonZero[j], aWantNonZero) << "P " << aPixels << " width " << aWidth << " column " << j;
       }
     }
   }
@@ -80,9 +88,10 @@ TEST(RowWindowSum, InvalidFirstPixelKeepsColumnZeroSums) {
   uint8_t aCentre[5];
   fdfTextureTerms(aValues, aMask, 5, false, aTermPointers, aCentre);
   double aSum[5], aSquares[5], aCount[5];
-  fdfRowWindowSum(aTermPointers[0], 5, 1, aSum);
-  fdfRowWindowSum(aTermPointers[1], 5, 1, aSquares);
-  fdfRowWindowSum(aTermPointers[2], 5, 1, aCount);
+  int32_t aNonZero[5];
+  fdfRowWindowSum(aTermPointers[0], 5, 1, 3, aSum, aNonZero);
+  fdfRowWindowSum(aTermPointers[1], 5, 1, 3, aSquares, aNonZero);
+  fdfRowWindowSum(aTermPointers[2], 5, 1, 3, aCount, aNonZero);
   EXPECT_EQ(aSum[0], 2.0);
   EXPECT_EQ(aSquares[0], 4.0);
   EXPECT_EQ(aCount[0], 1.0);
@@ -91,64 +100,144 @@ TEST(RowWindowSum, InvalidFirstPixelKeepsColumnZeroSums) {
   EXPECT_EQ(aCentre[1], 1);
 }
 
-// The ring and the line schedule on a 7 x 9 image for odd and even windows,
-// windows taller than the image (7 lines) and wider than it (9 pixels): the
-// accumulators at each emitted line equal the direct window sums, every line
-// is loaded once in order, and the centre flags are those of the line.
-TEST(WindowSchedule, AccumulatorsEqualDirectWindowSums) {
+namespace {
+
+// Streams theImage through a ring of theShape with channels value and count;
+// at each emitted line, theCheck(line, pixel, centre, sum, count) for every
+// pixel. Checks that every line is loaded once, in order, and emitted once.
+void streamImage(const STestImage &theImage, const SWindowShape &theShape,
+                 const std::function<void(int, int, int, double, double)> &theCheck) {
+  CWindowRing aRing(theShape, theImage.mLines, theImage.mPixels, 2);
+  std::vector<int> aLoaded;
+  int aEmitted = 0;
+  fdfRunWindowSchedule(
+      aRing,
+      [&](int32_t theLine) {
+        aLoaded.push_back(theLine);
+        for (int x = 0; x < theImage.mPixels; ++x) {
+          const bool aValid = theImage.valid(theLine, x);
+          aRing.terms(0)[x] = aValid ? theImage.at(theLine, x) : 0.0;
+          aRing.terms(1)[x] = aValid ? 1.0 : 0.0;
+          aRing.centre(theLine)[x] = aValid ? 1 : 0;
+        }
+      },
+      [&](int32_t theLine) {
+        ASSERT_EQ(theLine, aEmitted++);
+        for (int j = 0; j < theImage.mPixels; ++j)
+          theCheck(theLine, j, aRing.centre(theLine)[j], aRing.column(0)[j], aRing.column(1)[j]);
+      });
+  EXPECT_EQ(aEmitted, theImage.mLines);
+  std::vector<int> aInOrder;
+  for (int l = 0; l < theImage.mLines; ++l)
+    aInOrder.push_back(l);
+  EXPECT_EQ(aLoaded, aInOrder);
+}
+
+} // namespace
+
+// Clipped windows on a 7 x 9 image, odd and even, taller (7 lines) and wider
+// (9 pixels) than the image: the accumulators at each emitted line equal the
+// direct window sums and the centre flags are those of the line.
+TEST(WindowSchedule, ClippedWindowsEqualDirectWindowSums) {
   const STestImage aImage = sevenByNine(11);
   for (int aRows : {1, 2, 3, 4, 5, 6, 7, 8, 9, 14, 15}) {
     for (int aCols : {1, 2, 3, 4, 5, 8, 9, 17, 18}) {
-      CWindowRing aRing(aRows, aCols, aImage.mPixels, 2);
-      std::vector<int> aLoaded;
-      int aEmitted = 0;
-      fdfRunWindowSchedule(
-          aRing, aImage.mLines,
-          [&](int32_t theLine) {
-            aLoaded.push_back(theLine);
-            for (int x = 0; x < aImage.mPixels; ++x) {
-              const bool aValid = aImage.valid(theLine, x);
-              aRing.terms(0)[x] = aValid ? aImage.at(theLine, x) : 0.0;
-              aRing.terms(1)[x] = aValid ? 1.0 : 0.0;
-              aRing.centre(theLine)[x] = aValid ? 1 : 0;
-            }
-          },
-          [&](int32_t theLine) {
-            ASSERT_EQ(theLine, aEmitted++);
-            for (int j = 0; j < aImage.mPixels; ++j) {
-              const std::string aWhere = "R " + std::to_string(aRows) + " K " + std::to_string(aCols) + " at (" +
-                                         std::to_string(theLine) + ", " + std::to_string(j) + ")";
-              EXPECT_NEAR(aRing.column(0)[j],
-                          directSum(aImage, aRows, aCols, theLine, j, [](double v) { return v; }), 1e-9)
-                  << aWhere;
-              EXPECT_EQ(aRing.column(1)[j],
-                        directSum(aImage, aRows, aCols, theLine, j, [](double) { return 1.0; }))
-                  << aWhere;
-              EXPECT_EQ(aRing.centre(theLine)[j], aImage.valid(theLine, j) ? 1 : 0) << aWhere;
-            }
-          },
-          nullptr);
-      EXPECT_EQ(aEmitted, aImage.mLines);
-      std::vector<int> aInOrder;
-      for (int l = 0; l < aImage.mLines; ++l)
-        aInOrder.push_back(l);
-      EXPECT_EQ(aLoaded, aInOrder) << "R " << aRows;
+      streamImage(aImage, {aRows, aCols, ETLRXWindowBorder::kClipped},
+                  [&](int l, int j, int theCentre, double theSum, double theCount) {
+                    const std::string aWhere = "R " + std::to_string(aRows) + " K " + std::to_string(aCols) +
+                                               " at (" + std::to_string(l) + ", " + std::to_string(j) + ")";
+                    EXPECT_NEAR(theSum, directSum(aImage, aRows, aCols, l, j, [](double v) { return v; }), 1e-9)
+                        << aWhere;
+                    EXPECT_EQ(theCount, directSum(aImage, aRows, aCols, l, j, [](double) { return 1.0; })) << aWhere;
+                    EXPECT_EQ(theCentre, aImage.valid(l, j) ? 1 : 0) << aWhere;
+                  });
     }
   }
 }
 
-TEST(WindowSize, ThreeToFiveHundredRowsAndColumns) {
-  for (int aGood : {3, 4, 250, 500})
-    EXPECT_NO_THROW(fdfCheckWindowSize(aGood, aGood));
-  const std::pair<int, int> aBad[] = {{2, 5}, {501, 5}, {5, 2}, {3, 501}, {0, 0}, {-3, 7}};
-  for (const auto &aSizes : aBad) {
+// Exact R x K windows with null borders (no step uses them yet): inside, the
+// accumulators equal the direct sums over lines l - R/2 .. l - R/2 + R - 1 and
+// columns j - K/2 .. j - K/2 + K - 1; the first and last R/2 lines and K/2
+// columns are never computed, and a window larger than the image leaves
+// nothing to compute.
+TEST(WindowSchedule, ExactWindowsEqualDirectSumsWithNullBorders) {
+  const STestImage aImage = sevenByNine(13);
+  for (int aRows : {2, 3, 4, 5, 7, 8}) {
+    for (int aCols : {2, 3, 4, 6, 9, 10}) {
+      streamImage(aImage, {aRows, aCols, ETLRXWindowBorder::kNull},
+                  [&](int l, int j, int theCentre, double theSum, double theCount) {
+                    const std::string aWhere = "R " + std::to_string(aRows) + " K " + std::to_string(aCols) +
+                                               " at (" + std::to_string(l) + ", " + std::to_string(j) + ")";
+                    double aSum = 0, aCount = 0;
+                    const bool aInside = refForExactWindow(aImage.mLines, aImage.mPixels, aRows, aCols, l, j,
+                                                           [&](int y, int x) {
+                                                             if (aImage.valid(y, x)) {
+                                                               aSum += aImage.at(y, x);
+                                                               aCount += 1;
+                                                             }
+                                                           });
+                    EXPECT_EQ(theCentre, aInside && aImage.valid(l, j) ? 1 : 0) << aWhere;
+                    if (aInside) {
+                      EXPECT_NEAR(theSum, aSum, 1e-9) << aWhere;
+                      EXPECT_EQ(theCount, aCount) << aWhere;
+                    }
+                  });
+    }
+  }
+}
+
+// Guards the residue fault: next to a 1e20 spike the running sums lose the
+// ones, and kept the loss after the spike had left. Sums are recomputed from
+// the stored terms at columns that are multiples of the window width and at
+// lines that are multiples of the window height: exact from there on.
+TEST(WindowSums, SpikeLeavesNoResidueFromTheFirstRecomputation) {
+  for (int aSize : {3, 4, 5}) {
+    for (int aSpike : {0, 5, 9}) {
+      const int aHalf = aSize / 2, aWidth = 2 * aHalf + 1;
+      std::vector<double> aTerms(40, 1.0), aSums(40);
+      std::vector<int32_t> aNonZero(40);
+      aTerms[aSpike] = 1e20;
+      fdfRowWindowSum(aTerms.data(), 40, aHalf, aWidth, aSums.data(), aNonZero.data());
+      const int aLeft = aSpike + aHalf + 1; // first column whose window misses it
+      for (int j = (aLeft + aWidth - 1) / aWidth * aWidth; j < 40; ++j)
+        EXPECT_EQ(aSums[j], std::min(39, j + aHalf) - std::max(0, j - aHalf) + 1.0) << aSize << " column " << j;
+      // The same spike in a column of ones, through the ring and its schedule:
+      // line l sees lines l + R/2 - R + 1 .. l + R/2.
+      CWindowRing aRing({aSize, 1, ETLRXWindowBorder::kClipped}, 40, 2, 1);
+      const int aGone = aSpike + aSize - aHalf; // first line whose window misses it
+      fdfRunWindowSchedule(
+          aRing, [&](int32_t theLine) { aRing.terms(0)[0] = aRing.terms(0)[1] = theLine == aSpike ? 1e20 : 1.0; },
+          [&](int32_t theLine) {
+            if (theLine >= (aGone + aSize - 1) / aSize * aSize)
+              EXPECT_EQ(aRing.column(0)[1], std::min(39, theLine + aHalf) - (theLine + aHalf - aSize + 1) + 1.0)
+                  << aSize << " line " << theLine;
+          });
+    }
+  }
+}
+
+// Clipped windows take 3 .. 500 (456961), exact windows from 2 (456962).
+TEST(WindowSize, LimitsAndCodesOfEachRule) {
+  struct SCase {
+    const SWindowRule &mRule;
+    int32_t mRows, mCols, mCode;
+  } const aCases[] = {
+      {CTLRX_CLIPPED_WINDOW_RULE, 3, 3, 0},        {CTLRX_CLIPPED_WINDOW_RULE, 4, 500, 0},
+      {CTLRX_CLIPPED_WINDOW_RULE, 2, 5, 456961},   {CTLRX_CLIPPED_WINDOW_RULE, 501, 5, 456961},
+      {CTLRX_CLIPPED_WINDOW_RULE, 5, 2, 456961},   {CTLRX_CLIPPED_WINDOW_RULE, 3, 501, 456961},
+      {CTLRX_CLIPPED_WINDOW_RULE, 0, 0, 456961},   {CTLRX_CLIPPED_WINDOW_RULE, -3, 7, 456961},
+      {CTLRX_EXACT_WINDOW_RULE, 2, 2, 0},          {CTLRX_EXACT_WINDOW_RULE, 1, 5, 456962},
+      {CTLRX_EXACT_WINDOW_RULE, 5, 1, 456962},
+  };
+  for (const SCase &aCase : aCases) {
+    int32_t aCode = 0;
     try {
-      fdfCheckWindowSize(aSizes.first, aSizes.second);
-      ADD_FAILURE() << aSizes.first << " x " << aSizes.second << " accepted";
+      fdfCheckWindowSize(aCase.mRows, aCase.mCols, aCase.mRule);
     } catch (const CErrorExceptionManager &aError) {
-      EXPECT_EQ(aError.mCode, 456961);
+      aCode = aError.mCode;
       EXPECT_STREQ(aError.mMessage, "");
     }
+    EXPECT_EQ(aCode, aCase.mCode) << aCase.mRows << " x " << aCase.mCols;
   }
 }
 

@@ -38,6 +38,22 @@ inline void refForWindow(int theLines, int thePixels, int theRows, int theCols, 
       theVisit(y, x);
 }
 
+// Exact window of output (l, j): lines l - R/2 .. l - R/2 + R - 1 and columns
+// j - K/2 .. j - K/2 + K - 1. False for a border pixel (within R/2 lines or
+// K/2 columns of an edge), whose output is the null value; otherwise
+// theVisit(line, pixel) for every pixel of the window.
+inline bool refForExactWindow(int theLines, int thePixels, int theRows, int theCols, int theLine, int thePixel,
+                              const std::function<void(int, int)> &theVisit) {
+  const int aHalfRows = theRows / 2, aHalfCols = theCols / 2;
+  if (theLine < aHalfRows || theLine >= theLines - aHalfRows || thePixel < aHalfCols ||
+      thePixel >= thePixels - aHalfCols)
+    return false;
+  for (int y = theLine - aHalfRows; y < theLine - aHalfRows + theRows; ++y)
+    for (int x = thePixel - aHalfCols; x < thePixel - aHalfCols + theCols; ++x)
+      theVisit(y, x);
+  return true;
+}
+
 // Texture: coefficient of variation of the valid amplitudes, two-pass.
 inline std::vector<double> refTexture(const STestImage &theImage, bool thePower, int theRows, int theCols,
                                       double theNull) {

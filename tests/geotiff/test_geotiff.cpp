@@ -789,20 +789,6 @@ TEST_F(GeoTiffTest, BadInputRaisesItsCodeAndLeavesNoTiff) {
   EXPECT_TRUE(tiffFiles().empty());
 }
 
-// In the program an error ends the process where it is raised: the exit
-// handler removes the finished but uncommitted temporary TIFF.
-TEST_F(GeoTiffTest, ProcessEndingOnAnErrorLeavesNoTemporaryTiff) {
-  tlrxWriteFloatRaster(file("ok"), 9, 9, rampValues(9, 9), "AMPLITUDE");
-  ASSERT_EQ(mkdir(file("e.tif.sml").c_str(), 0755), 0);
-  EXPECT_EXIT(
-      {
-        fdfSetReportAndExit(true);
-        convert("ok", "e.tif");
-      },
-      ::testing::ExitedWithCode(fdfExitStatus(CTLRX_ERR_TIFF_HEADER_WRITE)), "");
-  EXPECT_TRUE(tiffFiles().empty());
-}
-
 TEST(GeoTiffTemporaries, OwnerIsReadOnlyFromATemporaryOfThatTiff) {
   const std::pair<const char *, int> aCases[] = {
       {"q.tif.tlrxtmp_4242.aB3xYz", 4242},      {"q.tif.tlrxtmp_1.000000", 1},

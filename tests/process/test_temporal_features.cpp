@@ -342,7 +342,8 @@ TEST_F(TemporalFeaturesTest, EveryParameterIsLoggedWithDefaultsApplied) {
   const std::string aLog = log();
   for (const std::string &aLine : std::vector<std::string>{
            "MAIN PARAMETERS", "\n\n Input Slave List\n " + mDir.file("a") + "\n",
-        "\nout_root_file_name: [" + mDir.file("out") + "]", "\ninterp_type: [nearest_neighbour]",
+        // The text as read (it once logged the kernel it resolved to).
+        "\nout_root_file_name: [" + mDir.file("out") + "]", "\ninterp_type: [Bilinear_interpolation]",
         "\nmax_increment_thr_db: [1000.000000]", "\nmax_decrement_thr_time: [2.500000]",
         "\nnormalize: [FALSE]", "\nOut Db: [TRUE]", "\nmean: [FALSE]",
         "\nstd: [FALSE]", "\nmin: [TRUE]", "\ndate_min_before_max: [FALSE]",
@@ -379,12 +380,20 @@ TEST_F(TemporalFeaturesTest, ParameterFileFailuresAreParameterErrors) {
     EXPECT_NE(log().find(mDir.file("param.xml") + " \n"), std::string::npos) << aCase.mWhat;
     expectNothingWritten();
   }
-  // A setting without a default that the file lacks.
+  // Settings without a default that the file lacks; the saturation is one
+  // even without GeoTIFF copies (it once defaulted to 0).
   STLRXTemporalParameters aNoRoot = parameters({"a"});
   aNoRoot.mRoot.clear();
-  EXPECT_EQ(run(aNoRoot).mExitStatus, 14);
-  EXPECT_NE(error().find("[EC :848642]"), std::string::npos);
-  EXPECT_NE(error().find("MAIN_CMD.out_root_file_name"), std::string::npos);
+  STLRXTemporalParameters aNoSaturation = parameters({"a"});
+  aNoSaturation.mSaturation.clear();
+  const std::pair<STLRXTemporalParameters, const char *> aMissing[] = {
+      {aNoRoot, "MAIN_CMD.out_root_file_name"}, {aNoSaturation, "MAIN_CMD.saturation_default"}};
+  for (const auto &aCase : aMissing) {
+    EXPECT_EQ(run(aCase.first).mExitStatus, 14) << aCase.second;
+    EXPECT_NE(error().find("[EC :848642]"), std::string::npos) << aCase.second;
+    EXPECT_NE(error().find(aCase.second), std::string::npos) << aCase.second;
+    expectNothingWritten();
+  }
 }
 
 TEST_F(TemporalFeaturesTest, BadInputsStopBeforeAnyResultAndLeaveNothingBehind) {

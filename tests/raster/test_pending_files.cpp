@@ -1,6 +1,6 @@
-// The files of a run that must not outlive its failure: removed when an
-// error is raised (both modes), kept once forgotten or when the run ends
-// well; a result's own guard hands its files to the run's.
+// The files of a run that must not outlive its failure: removed when a
+// raised error unwinds past their guard, kept once forgotten or when the run
+// ends well; a result's own guard hands its files to the run's.
 #include "tlrx_errors.h"
 #include "tlrx_pending_files.h"
 #include "tlrx_platform.h"
@@ -19,7 +19,7 @@ TEST(PendingFiles, FailuresRemoveRegisteredFilesAndCompletedOnesStay) {
     for (const std::string &aName : {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther})
       tlrxWriteFile(aName, "x");
   };
-  // Throw mode: an exception leaving the guard's scope removes them.
+  // An error leaving the guard's scope removes them.
   aWrite();
   try {
     CPendingFiles aGuard;
@@ -37,18 +37,6 @@ TEST(PendingFiles, FailuresRemoveRegisteredFilesAndCompletedOnesStay) {
     aGuard.addRaster(aRaster);
     aGuard.forgetRaster(aRaster);
   }
-  EXPECT_TRUE(tlrxFileExists(aRaster));
-  // Report-and-exit mode: the error hook removes them before the process ends.
-  {
-    CPendingFiles aGuard;
-    aGuard.addFile(aOther);
-    fdfWriteErrorFile(456960, "test", static_cast<const char *>(nullptr));
-    EXPECT_FALSE(tlrxFileExists(aOther));
-    aGuard.addRaster(aRaster);
-    fdfWriteErrorFile(CTLRX_WARNING_STATUS, "", static_cast<const char *>(nullptr));
-    EXPECT_TRUE(tlrxFileExists(aRaster));
-  }
-  fdfWriteErrorFile(456960, "test", static_cast<const char *>(nullptr));
   EXPECT_TRUE(tlrxFileExists(aRaster));
   fdfSetSleepFunction(aOldSleep);
 }
@@ -82,8 +70,11 @@ TEST(PendingFiles, ResultsHandedToTheRunGoWhenTheRunFailsLater) {
   // Without a guard nothing is registered, so nothing is removed later.
   tlrxWriteFile(aTiff, "x");
   fdfAddPendingFile(aTiff);
-  { CPendingFiles aRun; }
-  fdfWriteErrorFile(456960, "test", static_cast<const char *>(nullptr));
+  try {
+    CPendingFiles aRun;
+    TLRX_RAISE(130564, "test");
+  } catch (const CErrorExceptionManager &) {
+  }
   EXPECT_TRUE(tlrxFileExists(aTiff));
   fdfSetSleepFunction(aOldSleep);
 }

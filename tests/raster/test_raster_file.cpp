@@ -5,6 +5,7 @@
 
 #include <cfloat>
 #include <cmath>
+#include <complex>
 #include <cstring>
 #include <fcntl.h>
 #include <functional>
@@ -453,6 +454,146 @@ TEST_F(RasterFileTest, ValidMaskMarksNoDataCells) {
     aFile.open_read(aParam);
     aFile.getValidMask(aLine.data(), aMask.data(), 0);
     EXPECT_EQ(aMask, aCase.second) << "null " << aCase.first;
+  }
+}
+
+// ------------------------------------------------------------ complex lines
+
+namespace {
+
+bool sameNumber(double theActual, double theExpected) {
+  return std::isnan(theExpected) ? std::isnan(theActual) : theActual == theExpected;
+}
+
+// The complex value of a grid cell by the rule, computed directly: (D, D)
+// when both parts are no data, else the scaled parts.
+std::complex<double> expectedComplex(const std::vector<double> &theCell, double theNull, double theRealScale,
+                                     double theImagScale, bool &theValid) {
+  const auto aIsNull = [&](double theValue) {
+    return (std::isnan(theNull) && std::isnan(theValue)) ||
+           (theNull - theTolerance <= theValue && theValue <= theNull + theTolerance);
+  };
+  theValid = !(aIsNull(theCell[0]) && aIsNull(theCell[1]));
+  return theValid ? std::complex<double>(theCell[0] * theRealScale, theCell[1] * theImagScale)
+                  : std::complex<double>(theNull, theNull);
+}
+
+template <typename T>
+void expectComplexLine(CRasterFile &theFile, const TGrid &theGrid, int theRow, int theColStart, int theColEnd,
+                       double theNull, double theRealScale, double theImagScale, const std::string &theWhat) {
+  const size_t aCount = static_cast<size_t>(theColEnd - theColStart + 1);
+  std::vector<std::complex<T>> aLine(aCount);
+  std::vector<uint8_t> aValid(aCount, 9);
+  theFile.getComplexLine(aLine.data(), theRow, theColStart, theColEnd, aValid.data());
+  for (size_t i = 0; i < aCount; ++i) {
+    bool aExpectedValid = false;
+    const std::complex<double> aExpected = expectedComplex(theGrid[theRow][theColStart + i], theNull, theRealScale,
+                                                           theImagScale, aExpectedValid);
+    EXPECT_TRUE(sameNumber(aLine[i].real(), static_cast<T>(aExpected.real())) &&
+                sameNumber(aLine[i].imag(), static_cast<T>(aExpected.imag())))
+        << theWhat << " row " << theRow << " col " << theColStart + i << ": " << aLine[i] << " for " << aExpected;
+    EXPECT_EQ(aValid[i], aExpectedValid ? 1 : 0) << theWhat << " row " << theRow << " col " << theColStart + i;
+  }
+}
+
+} // namespace
+
+// Files composed byte by byte in the test are read as complex lines; writing
+// the values read gives the same bytes back.
+TEST_F(RasterFileTest, ComplexLinesOfEveryComplexTypeInBothByteOrders) {
+  const int aRows = 4;
+  const int aCols = 6;
+  const std::vector<SRoundTripCase> aCases = {
+      {{0, 0, 0}, false, 2.0, 0.5}, {{5, 2, 3}, true, 2.0, 0.5}, {{0, 0, 0}, true, 1.0, 1.0}};
+  for (const STypeInfo &aType : theTypes) {
+    if (aType.mValues != 2)
+      continue;
+    for (size_t k = 0; k < aCases.size(); ++k) {
+      const SRoundTripCase &aCase = aCases[k];
+      // The last case has a NaN null, which only floating parts can hold.
+      const bool aNaNNull = k == 2;
+      if (aNaNNull && aType.mKind != EKind::kFloat)
+        continue;
+      const double aNull = aNaNNull ? NAN : 7.0;
+      const std::string aWhat = std::string(fdfCellTypeName(aType.mCode)) + " case " + std::to_string(k);
+      const TGrid aGrid = makeGrid(aType, aRows, aCols, aNull);
+      const std::string aBytes = encodeFile(aGrid, aType, aCase.mMSBF, aCase.mLayout, 0);
+      CRasterFileParam aParam = param("cx_" + std::to_string(aType.mCode) + "_" + std::to_string(k) + ".raw",
+                                      aType.mCode, aRows, aCols);
+      aParam.mHeaderOffset = aCase.mLayout.mHeader;
+      aParam.mRowPrefix = aCase.mLayout.mPrefix;
+      aParam.mRowSuffix = aCase.mLayout.mSuffix;
+      aParam.mMSBF = aCase.mMSBF;
+      aParam.mNullCellValue = aNull;
+      aParam.mRealScaleFactor = aCase.mRealScale;
+      aParam.mImaginaryScaleFactor = aCase.mImagScale;
+      tlrxWriteFile(aParam.mFileName, aBytes);
+
+      std::vector<std::vector<std::complex<double>>> aRead(aRows, std::vector<std::complex<double>>(aCols));
+      {
+        CRasterFile aFile;
+        aFile.open_read(aParam);
+        for (int r = 0; r < aRows; ++r) {
+          expectComplexLine<double>(aFile, aGrid, r, 0, aCols - 1, aNull, aCase.mRealScale, aCase.mImagScale, aWhat);
+          expectComplexLine<float>(aFile, aGrid, r, 2, 4, aNull, aCase.mRealScale, aCase.mImagScale, aWhat);
+          aFile.getComplexLine(aRead[r].data(), r);
+        }
+      }
+      // In the caller's order when lines and pixels run reversed.
+      CRasterFileParam aReversed = aParam;
+      aReversed.mLinesReversed = aReversed.mPixelsReversed = true;
+      std::vector<std::vector<std::complex<double>>> aReadReversed = aRead;
+      {
+        CRasterFile aFile;
+        aFile.open_read(aReversed);
+        for (int r = 0; r < aRows; ++r)
+          aFile.getComplexLine(aReadReversed[r].data(), r);
+        EXPECT_TRUE(sameNumber(aReadReversed[0][0].imag(), aRead[aRows - 1][aCols - 1].imag())) << aWhat;
+        EXPECT_TRUE(sameNumber(aReadReversed[0][aCols - 1].real(), aRead[aRows - 1][0].real())) << aWhat;
+      }
+      for (const CRasterFileParam *aOut : {&aParam, &aReversed}) {
+        CRasterFileParam aWrite = *aOut;
+        aWrite.mFileName = mDir.file("cx_out.raw");
+        CRasterFile aFile;
+        aFile.open_write(aWrite);
+        for (int r = 0; r < aRows; ++r)
+          aFile.putComplexLine(r, (aOut == &aParam ? aRead : aReadReversed)[r].data());
+        aFile.close();
+        EXPECT_EQ(bytesOf(tlrxReadFile(aWrite.mFileName)), bytesOf(aBytes)) << aWhat << " written back";
+      }
+    }
+  }
+}
+
+TEST_F(RasterFileTest, ComplexWritesRoundSaturateAndStoreNoDataAsTheNull) {
+  CRasterFileParam aParam = param("cw.raw", CTLRX_CELL_SHORT_COMPLEX, 1, 5);
+  aParam.mMSBF = true;
+  aParam.mNullCellValue = -9999.0;
+  aParam.mImaginaryScaleFactor = 0.5;
+  const std::vector<std::complex<float>> aValues = {
+      {1.5f, -1.25f}, {1e6f, -1e6f}, {NAN, 3.0f}, {-9999.0f, -9999.0f}, {-9999.0f, 2.0f}};
+  {
+    CRasterFile aFile;
+    aFile.open_write(aParam);
+    aFile.putComplexLine(0, aValues.data());
+    aFile.close();
+  }
+  // Real parts rounded to the nearest (even on ties), imaginary parts
+  // divided by 0.5 first; beyond the range saturated; NaN as 0; a no-data
+  // value stored unscaled as the null in both parts.
+  const STypeInfo aType{CTLRX_CELL_SHORT_COMPLEX, 2, 2, EKind::kSigned};
+  const TGrid aExpected = {{{2, -2}, {32767, -32768}, {0, 6}, {-9999, -9999}, {-9999, 4}}};
+  EXPECT_EQ(bytesOf(tlrxReadFile(aParam.mFileName)), bytesOf(encodeFile(aExpected, aType, true, {0, 0, 0}, 0)));
+}
+
+TEST_F(RasterFileTest, ComplexLinesRefuseRealCellsAndLinesOutside) {
+  const std::complex<float> aLine[2] = {};
+  for (int32_t aCellType : {CTLRX_CELL_FLOAT, CTLRX_CELL_FLOAT_COMPLEX}) {
+    CRasterFile aFile;
+    aFile.open_write(param("c" + std::to_string(aCellType), aCellType, 1, 2));
+    const int32_t aRow = aCellType == CTLRX_CELL_FLOAT ? 0 : 1;
+    expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.putComplexLine(aRow, aLine); }, fdfCellTypeName(aCellType));
+    aFile.close();
   }
 }
 

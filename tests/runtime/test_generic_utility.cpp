@@ -178,16 +178,7 @@ TEST(UtilityText, TimeStampForms) {
   EXPECT_EQ(fdfGetAscTime().back(), '\n');
 }
 
-TEST(UtilityText, NullRuleUsesTheSmallestNormalFloatAsTolerance) {
-  const double aNaN = std::numeric_limits<double>::quiet_NaN();
-  EXPECT_TRUE(fdfIsNull(aNaN, aNaN));
-  EXPECT_FALSE(fdfIsNull(0.0, aNaN));
-  EXPECT_TRUE(fdfIsNull(0.0, 0.0));
-  EXPECT_TRUE(fdfIsNull(1e-38, 0.0));
-  EXPECT_FALSE(fdfIsNull(1.2e-38, 0.0));
-  EXPECT_TRUE(fdfIsNull(-9999.0, -9999.0));
-  EXPECT_FALSE(fdfIsNull(-9998.9999, -9999.0));
-  EXPECT_FALSE(fdfIsNull(aNaN, -9999.0));
+TEST(UtilityText, SwitchIsExactlyOK) {
   EXPECT_TRUE(fdfIsSwitchOn("OK"));
   EXPECT_FALSE(fdfIsSwitchOn("ok"));
   EXPECT_FALSE(fdfIsSwitchOn("OK "));
@@ -279,16 +270,3 @@ TEST_F(UtilityTest, RemovalTakesALinkItselfAndNeverAFolder) {
   }
 }
 
-TEST_F(UtilityTest, DeletionListDeletesOrOnlyTracesAndEmpties) {
-  tlrxWriteFile(mDir.file("a.tmp"), "x");
-  tlrxWriteFile(mDir.file("a.tmp.sml"), "x");
-  fdfAddToDeletionList(mDir.file("a.tmp").c_str(), false);
-  fdfRunDeletionList(false);
-  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp")));
-  fdfRunDeletionList(true); // emptied by the first run
-  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp")));
-  fdfAddToDeletionList(mDir.file("a.tmp").c_str(), false);
-  fdfRunDeletionList(true);
-  EXPECT_FALSE(tlrxFileExists(mDir.file("a.tmp")));
-  EXPECT_TRUE(tlrxFileExists(mDir.file("a.tmp.sml")));
-}

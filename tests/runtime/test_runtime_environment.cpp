@@ -38,7 +38,6 @@ protected:
     tlrxWriteConfiguration(mDir.path(), theLines);
     setenv("TELLURIX_INIT_DIR", mDir.path().c_str(), 1);
     fdfInitEnvironment(true, "banner");
-    fdfSetReportAndExit(false);
     setenv("TELLURIX_INIT_DIR", tlrxConfigDir().c_str(), 1);
   }
 };
@@ -169,6 +168,19 @@ TEST_F(EnvironmentTest, StartBannerListsArgumentsOrParameterTextLiterally) {
   EXPECT_NE(aLog.find("text with %n and %s\n"), std::string::npos);
 }
 
+
+// Guards the END banner's line end after the time: without it the time's own
+// line end ran straight into the stars.
+TEST_F(EnvironmentTest, EndBannerEndsItsTimeLineBeforeTheStars) {
+  fdfEndBanner();
+  const std::string aLog = tlrxReadFile(mDir.file("Process.log"));
+  const std::string aStars(160, '*');
+  const std::string aHead = "\n" + aStars + "\nEND : Tellurix test banner  -  ";
+  const size_t aAt = aLog.find(aHead);
+  ASSERT_NE(aAt, std::string::npos) << aLog;
+  // The calendar form is 24 characters and its line end, then the banner's.
+  EXPECT_EQ(aLog.substr(aAt + aHead.size() + 24), "\n\n" + aStars + "\n\n");
+}
 TEST_F(EnvironmentTest, ProgressUnchangedOrCompleteLeavesTheFileAlone) {
   tlrxWriteFile(workingFile(), "5\nhost\n");
   getAndSetPerc(5, 5, "x");
@@ -335,7 +347,7 @@ TEST_F(EnvironmentTest, LogsMovedAsideInOneSecondAreAllKept) {
 TEST_F(EnvironmentTest, TraceCopiesOfFailedRunsAreAllKept) {
   for (int i = 0; i < 3; ++i) {
     tlrxWriteFile(mDir.file("Process.trace"), "trace " + std::to_string(i));
-    EXPECT_EXIT(fdfEndProcess(456963, false, false), ::testing::ExitedWithCode(8), "");
+    EXPECT_EQ(fdfEndProcess(456963, false, false), 456963);
   }
   const std::vector<std::string> aCopies = namesLike(mDir.path(), "Process_", "_trace.txt");
   ASSERT_EQ(aCopies.size(), 3u);
@@ -356,4 +368,16 @@ TEST_F(EnvironmentTest, LogAboveOneMillionBytesIsMovedAsideUnderALogName) {
   const STLRXRun aList = tlrxRun("/bin/sh", {"-c", "ls Process_*_log.txt"}, mDir.path());
   EXPECT_EQ(aList.mExitStatus, 0) << aList.mOutput;
   EXPECT_EQ(aList.mOutput.size(), std::string("Process_20261206101010_log.txt\n").size());
+}
+
+// The warning count decides only between success and the warning status: a
+// run that warned and then failed ends as the failure (it used to exit 2).
+TEST_F(EnvironmentTest, WarningsNeverHideAFailure) {
+  TLRX_WARNING(CTLRX_WARN_LINES_PADDED, "padded");
+  EXPECT_EQ(fdfEndProcess(456963, false, false), 456963);
+  EXPECT_EQ(fdfExitStatus(fdfEndProcess(456963, false, false)), 8);
+  tlrxWriteFile(workingFile(), "50\nhost\n");
+  EXPECT_EQ(fdfEndProcess(0, false, false), CTLRX_WARNING_STATUS);
+  fdfResetWarningCount();
+  EXPECT_EQ(fdfEndProcess(0, false, false), 0);
 }

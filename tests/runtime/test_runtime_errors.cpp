@@ -247,16 +247,6 @@ TEST_F(ErrorsTest, WithoutAnyFolderOnlyTheErrorFileGoesToTheCurrentFolder) {
   EXPECT_EQ(aError[3], "TELLURIX_DUMMY_VALUE");
 }
 
-TEST_F(ErrorsTest, ErrorHookSeesTheCodeFirst) {
-  static int32_t theSeen = 0;
-  fdfSetErrorHook([](int32_t theCode) { theSeen = theCode; });
-  tlrxWriteFile(workingFile(), "1\nx\n");
-  fdfWriteErrorFile(261123, "m", static_cast<const char *>(nullptr));
-  fdfSetErrorHook(nullptr);
-  EXPECT_EQ(theSeen, 261123);
-  (void)noSleep;
-}
-
 TEST_F(ErrorsTest, WarningsWriteTheirLogBlocksAndCount) {
   fdfResetWarningCount();
   TLRX_SHORT_WARNING(130561, "lines padded");

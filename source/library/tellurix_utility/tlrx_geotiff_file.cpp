@@ -39,31 +39,6 @@ void traceTiffWarning(const char *theModule, const char *theFormat, va_list theA
   fdfTraceMessage("libtiff warning %s: %s\n", theModule != nullptr ? theModule : "libtiff", aText);
 }
 
-// Temporary files of conversions in progress; removed if the process ends
-// (report-and-exit) before they are committed or discarded.
-std::vector<std::string> &pendingFiles() {
-  static std::vector<std::string> sPending;
-  return sPending;
-}
-
-void removePendingFiles() {
-  for (const std::string &aName : pendingFiles())
-    std::remove(aName.c_str());
-  pendingFiles().clear();
-}
-
-void addPending(const std::string &theName) {
-  std::vector<std::string> &aPending = pendingFiles();
-  static const bool sRegistered = std::atexit(removePendingFiles) == 0;
-  (void)sRegistered;
-  aPending.push_back(theName);
-}
-
-void dropPending(const std::string &theName) {
-  std::vector<std::string> &aPending = pendingFiles();
-  aPending.erase(std::remove(aPending.begin(), aPending.end(), theName), aPending.end());
-}
-
 // Permissions of a new file under the process's umask (mkstemp gives 0600).
 mode_t newFileMode() {
   const mode_t aMask = umask(0);
@@ -110,7 +85,6 @@ CGeoTiffFile::CGeoTiffFile(const std::string &theFinalName, uint64_t theImageByt
     fail("failed in GTIFNew");
   }
   mTempName = aTemplate.data();
-  addPending(mTempName);
   fchmod(aFd, newFileMode());
   // Classic TIFF offsets stop at 4 GB; larger quick-looks become BigTIFF.
   const char *aMode = theImageBytes > 0xF0000000ULL ? "w8" : "w";
@@ -143,7 +117,6 @@ void CGeoTiffFile::discard() {
   closeTiff();
   if (!mTempName.empty()) {
     std::remove(mTempName.c_str());
-    dropPending(mTempName);
   }
 }
 
@@ -210,6 +183,5 @@ void CGeoTiffFile::commit() {
     std::snprintf(sLastTiffError, sizeof sLastTiffError, "rename: %s", std::strerror(errno));
     fail("Error while renaming TIFF file");
   }
-  dropPending(mTempName);
   mCommitted = true;
 }

@@ -3,10 +3,10 @@
 
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_header_numbers.h"
 
 #include <cmath>
 #include <cstdio>
-#include <cstdlib>
 #include <strings.h>
 
 namespace {
@@ -35,19 +35,6 @@ bool fieldText(const CDescription &theHeader, const char *theKey, std::string &t
   }
   theText = aBuffer;
   return true;
-}
-
-// The field's value as a number (texts converted as decimals); false when absent.
-bool fieldNumber(const CDescription &theHeader, const char *theKey, double &theValue) {
-  const CDescriptionField *aField = scalarField(theHeader, theKey);
-  if (aField == nullptr)
-    return false;
-  switch (aField->getValueType()) {
-  case CTLRX_DS_INTEGER: theValue = aField->getInteger(); return true;
-  case CTLRX_DS_DOUBLE: theValue = aField->getDouble(); return true;
-  case CTLRX_DS_STRING: theValue = std::strtod(aField->getString(), nullptr); return true;
-  default: return false;
-  }
 }
 
 bool sameText(const std::string &theText, const char *theName) { return strcasecmp(theText.c_str(), theName) == 0; }
@@ -111,37 +98,29 @@ std::vector<STLRXGeoKey> keysOfState(const CDescription &theHeader, const std::s
     return geographicKeys();
   if (!sameText(theState, "UTM-GLOBAL"))
     return otherKeys(theHeader);
-  double aZone = 0.0;
-  std::string aHemisphere;
-  fieldText(theHeader, "CartographicSystem.Hemisphere", aHemisphere);
-  if (!fieldNumber(theHeader, "CartographicSystem.Zone", aZone) || !(aZone >= 1.0 && aZone < 61.0)) {
-    fdfTraceMessage("UTM zone missing or outside 1..60 : %g\n", aZone);
+  int32_t aZone = 0;
+  bool aNorth = false;
+  std::string aKey, aProblem;
+  if (!fdfReadUtmZone(theHeader, aZone, aNorth, aKey, aProblem)) {
+    fdfTraceMessage("UTM keys not written: %s %s\n", aKey.c_str(), aProblem.c_str());
     return otherKeys(theHeader);
   }
-  return utmKeys(static_cast<int>(aZone), sameText(aHemisphere, "NORTH"));
+  return utmKeys(aZone, aNorth);
 }
-
-bool usableSpacing(double theSpacing) { return std::isfinite(theSpacing) && std::fabs(theSpacing) > 0.0; }
 
 // Tie point and pixel scale of the quick-look; false (traced) when the
 // corner or a spacing is missing or unusable.
 bool setTransform(const CDescription &theHeader, const STLRXTiffGrid &theGrid, STLRXGeoReference &theGeo) {
-  double aEasting = 0.0, aNorthing = 0.0, aColSpacing = 0.0, aRowSpacing = 0.0;
-  if (!fieldNumber(theHeader, "RegistrationCoordinates.LonEasting", aEasting) ||
-      !fieldNumber(theHeader, "RegistrationCoordinates.LatNorthing", aNorthing) ||
-      !fieldNumber(theHeader, "RegistrationCoordinates.PixelSpacingLonEast", aColSpacing) ||
-      !fieldNumber(theHeader, "RegistrationCoordinates.PixelSpacingLatNorth", aRowSpacing)) {
-    fdfTraceMessage("No registration coordinates: no tie point\n");
+  SMapRegistration aRegistration;
+  std::string aKey, aProblem;
+  if (!fdfReadMapRegistration(theHeader, aRegistration, aKey, aProblem)) {
+    fdfTraceMessage("No tie point: %s %s\n", aKey.c_str(), aProblem.c_str());
     return false;
   }
-  if (!usableSpacing(aColSpacing)) {
-    fdfTraceMessage("WRONG Cols Scale = %g\n", aColSpacing);
-    return false;
-  }
-  if (!usableSpacing(aRowSpacing) || !std::isfinite(aEasting) || !std::isfinite(aNorthing)) {
-    fdfTraceMessage("WRONG Rows Scale = %g\n", aRowSpacing);
-    return false;
-  }
+  const double aEasting = aRegistration.mEasting;
+  const double aNorthing = aRegistration.mNorthing;
+  const double aColSpacing = aRegistration.mEastSpacing;
+  const double aRowSpacing = aRegistration.mNorthSpacing;
   const double aStepX = std::fabs(aColSpacing) * theGrid.mColFactor;
   const double aStepY = std::fabs(aRowSpacing) * theGrid.mRowFactor;
   const double aTieX = aEasting + (theGrid.mInvertCols ? aStepX * theGrid.mOutCols : 0.0);

@@ -1,11 +1,13 @@
 // Lines of a raster as the values a GeoTIFF quick-look stretches: the cell
 // value of real cells (scale factor applied by the raster file); for complex
 // cells the amplitude, the intensity (intensity units) or the phase (phase
-// and interferogram units), with their real and imaginary parts kept for the
-// statistics. Null cells (both parts null for complex cells) and cells that
-// are not finite are marked invalid.
+// and interferogram units), with their real and imaginary parts (scaled by
+// the raster file) kept for the statistics. No-data cells (by the raster
+// rule; both parts for complex cells) and cells that are not finite are
+// marked invalid.
 #pragma once
 
+#include <complex>
 #include <cstdint>
 #include <vector>
 
@@ -15,8 +17,7 @@ class CRasterFile;
 
 class CTiffLineSource {
 public:
-  // theReScale and theImScale scale the parts of complex cells.
-  CTiffLineSource(CRasterFile &theRaster, ETLRXTiffFamily theFamily, double theReScale, double theImScale);
+  CTiffLineSource(CRasterFile &theRaster, ETLRXTiffFamily theFamily);
 
   // Columns theColStart..theColEnd of file line theRow into values() and
   // valid() (and re(), im() for complex cells), from index 0.
@@ -36,9 +37,7 @@ private:
   CRasterFile &mRaster;
   ETLRXTiffFamily mFamily;
   bool mComplex;
-  double mNull;
-  double mReScale;
-  double mImScale;
+  std::vector<std::complex<double>> mCells;
   std::vector<double> mValues;
   std::vector<uint8_t> mValid;
   std::vector<double> mRe;

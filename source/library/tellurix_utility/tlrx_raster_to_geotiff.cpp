@@ -11,6 +11,7 @@
 #include "tlrx_pending_files.h"
 #include "tlrx_geotiff_georef.h"
 #include "tlrx_geotiff_source.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_geotiff_stretch.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
@@ -79,13 +80,6 @@ private:
 bool holdsScalar(const CDescription &theHeader, const char *theKey) {
   const CDescriptionField *aField = theHeader.findField(theKey);
   return aField != nullptr && aField->getShape() == CTLRX_DS_SCALAR && aField->holdsValue();
-}
-
-double doubleOr(const CDescription &theHeader, const char *theKey, double theDefault) {
-  if (!holdsScalar(theHeader, theKey))
-    return theDefault;
-  const CDescriptionField &aField = theHeader.getField(theKey);
-  return aField.getValueType() == CTLRX_DS_DOUBLE ? aField.getDouble() : theDefault;
 }
 
 bool switchIsOn(const CDescription &theHeader, const char *theKey) {
@@ -406,8 +400,7 @@ int32_t convert(const STiffRequest &theRequest) {
   traceInput(theRequest, aRaster, aHeader);
   const STLRXTiffGrid aGrid = makeGrid(theRequest, aRaster, aHeader);
   const ETLRXTiffFamily aFamily = fdfTiffFamily(aRaster.getDataUnits());
-  CTiffLineSource aSource(aRaster, aFamily, doubleOr(aHeader, "RasterInfo.RealScaleFactor", 1.0),
-                          doubleOr(aHeader, "RasterInfo.ImaginaryScaleFactor", 1.0));
+  CTiffLineSource aSource(aRaster, aFamily);
   CProgress aProgress;
 
   const SSampleWindow aWindow =

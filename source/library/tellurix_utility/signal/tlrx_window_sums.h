@@ -1,72 +1,122 @@
-// Moving-window sums shared by the texture, normalisation and intensity
-// correlation steps: row-window running sums per input line, a ring of R line
-// slots, column accumulators over the vertical window, and the line schedule
-// that streams an image through them with a few lines in memory.
+// Moving-window sums shared by the window steps (texture, normalisation,
+// intensity correlation, and any later step on a moving window): row-window
+// running sums per input line, a ring of R line slots, column accumulators
+// over the vertical window, and the line schedule that streams an image
+// through them with a few lines in memory.
 //
-// Window of output pixel (l, j) for R rows and K columns, hr = R / 2 and
-// hc = K / 2, in an image of L lines of P pixels:
-//   columns max(0, j - hc) .. min(P - 1, j + hc)   (2 hc + 1 wide: K + 1 when K is even)
-//   lines   max(0, l + hr - R + 1) .. min(L - 1, l + hr)
-//                                                 (R lines, centred when R is odd)
-// Windows are clipped at the image edges, never padded or mirrored. An image
-// with fewer lines or pixels than the window is computed with the clipped
-// windows, so every output pixel sees the whole image in that direction.
+// Windows of output pixel (l, j) for R rows and K columns, hr = R / 2 and
+// hc = K / 2, in an image of L lines of P pixels, by border rule:
+//   clipped: columns j - hc .. j + hc (2 hc + 1 wide: K + 1 when K is even),
+//            lines l + hr - R + 1 .. l + hr (R lines, centred when R is odd),
+//            both clipped to the image, never padded or mirrored; every pixel
+//            is computed, an image smaller than the window included.
+//   exact:   columns j - hc .. j - hc + K - 1, lines l - hr .. l - hr + R - 1
+//            (exactly R x K, centred when odd). The first and last hr lines
+//            and hc columns are border: their centre flags are cleared, so
+//            the measures write the null value there (an image smaller than
+//            the window is all border).
 //
 // Each measure turns an input line into "terms" (one array of P doubles per
-// channel, 0 where the pixel does not count) and the validity flags of the
-// line's own pixels; the machinery sums the terms over the window, so it never
-// looks at no-data values itself. Sums are double precision; counts are kept
-// as doubles too (exact up to 2^53).
+// channel, 0 where the pixel does not count) and the centre flags of the
+// line's own pixels (1: the output pixel is computed); the machinery sums the
+// terms over the window and never looks at no-data values itself. A measure
+// must write the null value wherever the centre flag is 0.
+//
+// Exactness: beside every sum the number of non-zero terms in its window is
+// kept as an integer, and a window with none sums to exactly 0 (a block of
+// zeros after bright pixels gives 0, not a residue of the bright values).
+// Counts of valid pixels are channels of terms 1 and 0, exact in double up to
+// 2^53. Running sums are recomputed from the stored terms at the columns that
+// are multiples of the window width and at the output lines that are
+// multiples of R, so rounding residue (a 1e20 spike among ones) never outlives
+// one window, and results depend on absolute positions only, not on where a
+// block of lines or columns starts. The cost per pixel stays independent of
+// the window size (one recomputation of cost K per K columns, of R line slots
+// per R lines). Sums are double precision.
 #pragma once
 
 #include <cstdint>
 #include <functional>
 #include <vector>
 
-// Row-window sum of one line: theSums[j] = sum of theTerms[k] for k in
-// max(0, j - theHalf) .. min(thePixels - 1, j + theHalf). Running sum: one
-// term enters and one leaves per column, so the cost does not depend on
-// theHalf. Column 0 is summed like every other column.
-void fdfRowWindowSum(const double *theTerms, int32_t thePixels, int32_t theHalf, double *theSums);
+// How the window meets the image edges (see above).
+enum class ETLRXWindowBorder {
+  kClipped,
+  kNull,
+};
+
+// Window of R rows and K columns with its border rule.
+struct SWindowShape {
+  int32_t mRows = 3;
+  int32_t mCols = 3;
+  ETLRXWindowBorder mBorder = ETLRXWindowBorder::kClipped;
+
+  // Columns left of j in the window, and the window width.
+  int32_t left() const { return mCols / 2; }
+  int32_t width() const { return mBorder == ETLRXWindowBorder::kClipped ? 2 * (mCols / 2) + 1 : mCols; }
+  // Lines after l in the window (the window holds mRows lines).
+  int32_t below() const { return mBorder == ETLRXWindowBorder::kClipped ? mRows / 2 : mRows - 1 - mRows / 2; }
+};
+
+// Row-window sum of one line: theSums[j] = sum of theTerms[k] and
+// theNonZero[j] = number of non-zero theTerms[k] for k in the window
+// j - theLeft .. j - theLeft + theWidth - 1 clipped to 0 .. thePixels - 1;
+// theSums[j] is exactly 0 where theNonZero[j] is 0. Running sums, recomputed
+// directly at the columns that are multiples of theWidth.
+void fdfRowWindowSum(const double *theTerms, int32_t thePixels, int32_t theLeft, int32_t theWidth, double *theSums,
+                     int32_t *theNonZero);
 
 // R line slots of row-window sums, the column accumulators over the lines
-// currently added, and the scratch line the measure fills before a line is
-// stored. Memory: (R + 2) x channels x P doubles and R x P flags.
+// currently in the window, and the scratch line the measure fills before a
+// line is stored. Memory: (R + 2) x channels x P doubles, (R + 1) x channels
+// x P counts and R x P flags.
 class CWindowRing {
 public:
-  CWindowRing(int32_t theRows, int32_t theCols, int32_t thePixels, int theChannels);
+  CWindowRing(const SWindowShape &theShape, int32_t theLines, int32_t thePixels, int theChannels);
 
-  int32_t rows() const { return mRows; }
-  int32_t halfRows() const { return mRows / 2; }
-  int32_t halfCols() const { return mCols / 2; }
-  int32_t pixels() const { return mPixels; }
+  const SWindowShape &shape() const { return mShape; }
+  int32_t lines() const { return mLines; }
+  int32_t pixels() const { return static_cast<int32_t>(mPixels); }
   int channels() const { return mChannels; }
 
   // Scratch terms of channel theChannel for the line about to be stored.
   double *terms(int theChannel) { return &mTerms[static_cast<size_t>(theChannel) * mPixels]; }
-  // Validity flags (1 valid) of the pixels of image line theLine (its slot).
+  // The scratch terms of every channel, for the measures' term functions.
+  std::vector<double *> termArrays();
+  // Centre flags (1 computed) of image line theLine (its slot).
   uint8_t *centre(int32_t theLine) { return &mCentre[slotIndex(theLine) * mPixels]; }
-  // Row-window sums of the scratch terms into the slot of image line theLine.
+  // Row-window sums of the scratch terms into the slot of image line
+  // theLine; clears the centre flags of its border pixels.
   void storeLine(int32_t theLine);
-  // Adds (or removes) the sums of image line theLine to (from) the accumulators.
+  // Adds (or removes) the sums of image line theLine to (from) the
+  // accumulators.
   void addLine(int32_t theLine);
   void subtractLine(int32_t theLine);
+  // Sets the accumulators to the sums of the slots of lines theFirst ..
+  // theLast, added in line order.
+  void recompute(int32_t theFirst, int32_t theLast);
   // Accumulator of channel theChannel: the window sums of the added lines.
   const double *column(int theChannel) const { return &mColumns[static_cast<size_t>(theChannel) * mPixels]; }
+  // The accumulators of every channel, for the measures' line functions.
+  std::vector<const double *> columnArrays() const;
 
 private:
-  size_t slotIndex(int32_t theLine) const { return static_cast<size_t>(theLine % mRows); }
-  double *slot(int32_t theLine, int theChannel) {
-    return &mSlots[(slotIndex(theLine) * mChannels + theChannel) * mPixels];
+  size_t slotIndex(int32_t theLine) const { return static_cast<size_t>(theLine % mShape.mRows); }
+  size_t slotOffset(int32_t theLine, int theChannel) const {
+    return (slotIndex(theLine) * mChannels + theChannel) * mPixels;
   }
+  void addSlot(int32_t theLine, int theSign);
+  void clearBorder(int32_t theLine);
 
-  int32_t mRows;
-  int32_t mCols;
+  SWindowShape mShape;
+  int32_t mLines;
   size_t mPixels;
   int mChannels;
   std::vector<double> mSlots;
+  std::vector<int32_t> mSlotNonZero;
   std::vector<uint8_t> mCentre;
   std::vector<double> mColumns;
+  std::vector<int32_t> mColumnNonZero;
   std::vector<double> mTerms;
 };
 
@@ -77,10 +127,11 @@ using TLRXWindowEmit = std::function<void(int32_t theLine)>;
 // Told output line theLine of theLines is next (progress, interruption).
 using TLRXWindowProgress = std::function<void(int32_t theLine, int32_t theLines)>;
 
-// The line schedule: for output line l = 0 .. theLines - 1, the line that
-// left the window (l + hr - R) is subtracted, the lines that entered it (up to
-// min(theLines - 1, l + hr)) are loaded into the slot just freed and added,
-// and line l is emitted. Every input line is loaded once, in order. Progress
-// (when given) is told before each output line.
-void fdfRunWindowSchedule(CWindowRing &theRing, int32_t theLines, const TLRXWindowLoad &theLoad,
-                          const TLRXWindowEmit &theEmit, const TLRXWindowProgress &theProgress = nullptr);
+// The line schedule over the ring's lines: for output line l, the line that
+// left the window is subtracted, the lines that entered it are loaded into
+// the slots just freed and added (at lines that are multiples of R the
+// accumulators are recomputed from the slots instead), and line l is
+// emitted. Every input line is loaded once, in order. Progress (when given)
+// is told before each output line.
+void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &theLoad, const TLRXWindowEmit &theEmit,
+                          const TLRXWindowProgress &theProgress = nullptr);

@@ -7,6 +7,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_init_from_xml_schema.h"
 #include "tlrx_resampling_kernels.h"
 #include "tlrx_temporal_features.h"
@@ -38,8 +39,7 @@ bool fdfSwitch(const CDescription &theParameters, const char *theField) {
 
 // A threshold that is absent or not positive takes its default.
 double fdfPositive(const CDescription &theParameters, const char *theField, double theDefault) {
-  const CDescriptionField *aField = fdfSetting(theParameters, theField);
-  const double aValue = aField != nullptr ? aField->getDouble() : theDefault;
+  const double aValue = fdfHeaderRealOr(theParameters, fdfKey(theField).c_str(), theDefault);
   return aValue > 0.0 ? aValue : theDefault;
 }
 
@@ -70,9 +70,9 @@ STemporalRequest fdfReadRequest(const CDescription &theParameters, const char *t
     TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, fdfKey("out_root_file_name").c_str());
   }
   const CDescriptionField *aInterpolation = fdfSetting(theParameters, "interp_type");
+  aRequest.mInterpolationText = aInterpolation != nullptr ? aInterpolation->getString() : "";
   bool aKnown = false;
-  aRequest.mInterpolation =
-      fdfKernelName(fdfKernelFromName(aInterpolation != nullptr ? aInterpolation->getString() : "", aKnown));
+  aRequest.mInterpolation = fdfKernelName(fdfKernelFromName(aRequest.mInterpolationText.c_str(), aKnown));
   aRequest.mMaxIncrementThrDb = fdfPositive(theParameters, "max_increment_thr_db", CTLRX_TF_DEFAULT_INCREMENT_DB);
   aRequest.mMaxDecrementThrTime =
       fdfPositive(theParameters, "max_decrement_thr_time", CTLRX_TF_DEFAULT_DECREMENT_DAYS);
@@ -86,9 +86,8 @@ STemporalRequest fdfReadRequest(const CDescription &theParameters, const char *t
     TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, "MAIN_CMD: no output switch (mean ... date_min_before_max) is OK");
   }
   aRequest.mMakeTiff = fdfSwitch(theParameters, "make_tiff");
-  // Without a saturation the conversion takes its own default (0 selects it).
-  const CDescriptionField *aSaturation = fdfSetting(theParameters, "saturation_default");
-  aRequest.mSaturation = aSaturation != nullptr ? aSaturation->getDouble() : 0.0;
+  // A setting without a default, logged whether or not GeoTIFF copies are made.
+  aRequest.mSaturation = fdfHeaderReal(theParameters, fdfKey("saturation_default").c_str());
   return aRequest;
 }
 
@@ -97,7 +96,7 @@ void fdfLogRequest(const STemporalRequest &theRequest) {
   for (const std::string &aName : theRequest.mInputs)
     fdfLogMessage("%s\n", aName.c_str());
   fdfLogMessage("\nout_root_file_name: [%s]", theRequest.mRoot.c_str());
-  fdfLogMessage("\ninterp_type: [%s]", theRequest.mInterpolation.c_str());
+  fdfLogMessage("\ninterp_type: [%s]", theRequest.mInterpolationText.c_str());
   fdfLogMessage("\nmax_increment_thr_db: [%lf]", theRequest.mMaxIncrementThrDb);
   fdfLogMessage("\nmax_decrement_thr_time: [%lf]", theRequest.mMaxDecrementThrTime);
   fdfLogMessage("\nnormalize: [%s]", fdfShown(theRequest.mNormalize));

@@ -1,8 +1,11 @@
 // Minimum and maximum over a stack, one line at a time, with the position
 // in time (1..n) of the input that holds each. A pixel that is no data in
-// any input is no data in every result (value theNull, date 0); strict
+// any input, by the raster rule (tlrx_no_data.h) against that input's null
+// value, is no data in every result (value theNull, date 0); strict
 // comparisons keep the earlier date on ties.
 #include "tlrx_min_max_line.h"
+
+#include "tlrx_no_data.h"
 
 #include <algorithm>
 #include <cmath>
@@ -23,18 +26,13 @@ inline float fdfSelect(bool theCondition, float theYes, float theNo) {
   return aResult;
 }
 
-// Validity of one input line against its null value (same rule as fdfIsNull).
+// Validity of one input line against its null value. Min and max keep the
+// rule as it is: a NaN value with a numeric null is a value (the strict
+// comparisons never select a later NaN; a first one stays).
 void fdfValidCells(const float *__restrict theRow, double theNull, int32_t thePixels, uint8_t *__restrict theValid) {
-  constexpr double aTolerance = 1.1754943508222875e-38;
-  if (std::isnan(theNull)) {
-    for (int32_t x = 0; x < thePixels; ++x)
-      theValid[x] &= theRow[x] == theRow[x];
-    return;
-  }
-  for (int32_t x = 0; x < thePixels; ++x) {
-    const double aValue = theRow[x];
-    theValid[x] &= !(aValue >= theNull - aTolerance && aValue <= theNull + aTolerance);
-  }
+  const SNoData aNoData(theNull);
+  for (int32_t x = 0; x < thePixels; ++x)
+    theValid[x] &= !aNoData.isNull(theRow[x]);
 }
 
 } // namespace

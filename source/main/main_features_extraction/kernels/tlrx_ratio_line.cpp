@@ -1,8 +1,11 @@
 // Ratio of two lines: out = a / b, or 10 log10(a / b) in decibels. A pixel
-// is theNull where either input holds its own null value (a NaN null matches
-// NaN; a NaN input with a numeric null stays a value and gives NaN) or the
-// divisor is not above the smallest normal float.
+// is theNull where either input is no data by the raster rule (tlrx_no_data.h)
+// against its own null value, or the divisor is not above the smallest normal
+// float. Ratio keeps the rule as it is: a NaN input with a numeric null stays
+// a value and gives NaN.
 #include "tlrx_ratio_line.h"
+
+#include "tlrx_no_data.h"
 
 #include <array>
 #include <cmath>
@@ -10,7 +13,8 @@
 
 namespace {
 
-constexpr double CTLRX_EPS = 1.1754943508222875e-38;
+// Ratio's own rule: divisors up to the smallest normal float give no ratio.
+constexpr double CTLRX_RATIO_MIN_DIVISOR = std::numeric_limits<float>::min();
 
 // Counting classes: below each limit in turn, then "Other".
 const double theHistogramLimits[CTLRX_RATIO_COUNTED_CLASSES - 1] = {-10, -1, -0.1, 0.1, 1, 10, 100, 1000, 10000, 100000, 1000000};
@@ -28,26 +32,24 @@ CFloatLimits fdfFloatLimits() {
 
 } // namespace
 
-// Whether v is a valid cell against null D: not NaN-with-NaN, not within
-// the smallest normal float of D.
 namespace {
 
-inline bool fdfValidCell(double theValue, double theNull, bool theNullIsNaN) {
-  return theNullIsNaN ? theValue == theValue
-                      : !(theValue >= theNull - CTLRX_EPS && theValue <= theNull + CTLRX_EPS);
+// Both inputs hold data (NaN values included) and the divisor is usable.
+inline bool fdfValidPair(double theA, const SNoData &theNullA, double theB, const SNoData &theNullB) {
+  return !theNullA.isNull(theA) & !theNullB.isNull(theB) & !(theB <= CTLRX_RATIO_MIN_DIVISOR);
 }
 
 } // namespace
 
 void fdfRatioLine(const float *theA, double theNullA, const float *theB, double theNullB, int32_t thePixels,
                   bool theDecibel, float theNull, float *theOut, long long *theHistogram) {
-  const bool aNaNA = std::isnan(theNullA);
-  const bool aNaNB = std::isnan(theNullB);
+  const SNoData aNullA(theNullA);
+  const SNoData aNullB(theNullB);
   // Branch-free so the compiler vectorises it: invalid pairs divide by 1.
   for (int32_t i = 0; i < thePixels; ++i) {
     const double aA = theA[i];
     const double aB = theB[i];
-    const bool aValid = fdfValidCell(aA, theNullA, aNaNA) & fdfValidCell(aB, theNullB, aNaNB) & !(aB <= CTLRX_EPS);
+    const bool aValid = fdfValidPair(aA, aNullA, aB, aNullB);
     const double aRatio = aA / (aValid ? aB : 1.0);
     theOut[i] = aValid ? static_cast<float>(aRatio) : theNull;
   }
@@ -55,7 +57,7 @@ void fdfRatioLine(const float *theA, double theNullA, const float *theB, double 
     for (int32_t i = 0; i < thePixels; ++i) {
       const double aA = theA[i];
       const double aB = theB[i];
-      if (fdfValidCell(aA, theNullA, aNaNA) && fdfValidCell(aB, theNullB, aNaNB) && !(aB <= CTLRX_EPS))
+      if (fdfValidPair(aA, aNullA, aB, aNullB))
         theOut[i] = static_cast<float>(10.0 * std::log10(aA / aB));
     }
   // The class is the number of limits not above the value ("Other" for NaN),

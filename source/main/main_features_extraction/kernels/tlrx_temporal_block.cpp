@@ -31,20 +31,21 @@ TLRX_VECTOR_CLONES void CTemporalSeries::gatherBlock(const double *theRows, size
   // Scratch rows until computeBlock.
   double *__restrict aLargest = mBlock.mState.data() + CTLRX_BS_SUM * B;
   double *__restrict aSmallest = mBlock.mState.data() + CTLRX_BS_SQUARES * B;
-  const double aNullLow = mSettings.mNull - CTLRX_NULL_TOLERANCE, aNullHigh = mSettings.mNull + CTLRX_NULL_TOLERANCE;
+  const SNoData aOutputNull(mSettings.mNull);
   std::fill(aDoubt, aDoubt + M, 0.0);
   std::fill(aLargest, aLargest + M, 0.0);
   std::fill(aSmallest, aSmallest + M, std::numeric_limits<double>::infinity());
   for (int32_t j = 0; j < n; ++j) {
     const double *__restrict aRow = theRows + static_cast<size_t>(j) * theStride;
     double *__restrict aNow = mBlock.mValues.data() + static_cast<size_t>(j) * B;
-    const double aLow = mInputs[j].mNullLow, aHigh = mInputs[j].mNullHigh;
+    const SNoData aInputNull = mInputs[j].mNoData;
     for (int32_t m = 0; m < M; ++m) {
       const double r = aRow[m];
       const double a = std::fabs(r);
       aNow[m] = a;
-      const bool aNoData = (r != r) | ((r >= aLow) & (r <= aHigh));
-      const bool aNullValued = (a >= aNullLow) & (a <= aNullHigh);
+      // As select(): a NaN is no data whatever the null value.
+      const bool aNoData = aInputNull.isNullOrNaN(r);
+      const bool aNullValued = aOutputNull.isNull(a);
       aDoubt[m] += (aNoData | aNullValued) ? 1.0 : 0.0;
       aLargest[m] = std::max(aLargest[m], a);
       aSmallest[m] = std::min(aSmallest[m], a);

@@ -19,7 +19,6 @@
 
 namespace tlrx_temporal_detail {
 
-inline constexpr double CTLRX_NULL_TOLERANCE = 1.1754943508222875e-38;
 inline constexpr double CTLRX_FLOAT_MAX = 3.4028234663852886e+38;
 inline constexpr double CTLRX_RESCALE_LIMIT = 1e14; // as in CTemporalAccumulator::scaledAdd
 // Relative distance from the rate limit beyond which a product decides the

@@ -20,12 +20,6 @@ constexpr int32_t CTLRX_NETWORK_LIMIT = 32;
 const bool theNeedsTwo[CTLRX_TF_VALUE_COUNT] = {false, true,  false, true, false, false,
                                                 false, true,  true,  false, true, true};
 
-// Comparisons with NaN bounds are false, so a NaN null value leaves only the
-// NaN test.
-inline bool fdfInInterval(double theValue, double theLow, double theHigh) {
-  return theValue >= theLow && theValue <= theHigh;
-}
-
 // Whether (theValue / theLast) / theDays < theThreshold, as those divisions
 // and that comparison decide it, NaN, infinities and zeros included. Far
 // from the limit a product decides without dividing; within a few units in
@@ -88,10 +82,7 @@ constexpr auto theMedianNetworks = fdfMedianTable(std::make_integer_sequence<int
 void CTemporalAccumulator::reset(double theNull) {
   mSum = mSquares = 0.0;
   mSumScale = mSquaresScale = 1.0;
-  mNull = theNull;
-  mNullLow = theNull - CTLRX_NULL_TOLERANCE;
-  mNullHigh = theNull + CTLRX_NULL_TOLERANCE;
-  mNullIsNaN = std::isnan(theNull);
+  mNoData = SNoData(theNull);
   mCount = 0;
 }
 
@@ -120,11 +111,11 @@ void CTemporalAccumulator::addAll(const double *theValues, int32_t theCount, dou
   mCount = aCount;
 }
 
-double CTemporalAccumulator::mean() const { return mCount < 1 ? mNull : mSum / mCount * mSumScale; }
+double CTemporalAccumulator::mean() const { return mCount < 1 ? mNoData.mNull : mSum / mCount * mSumScale; }
 
 double CTemporalAccumulator::std() const {
   if (mCount < 1)
-    return mNull;
+    return mNoData.mNull;
   const double aMean = mSum / mCount * mSumScale;
   const double aVariance = mSquares / mCount * mSquaresScale - aMean * aMean;
   // Cancellation can leave a tiny negative variance for a constant series.
@@ -160,8 +151,8 @@ CTemporalSeries::CTemporalSeries(const STemporalSettings &theSettings, const std
     }
   }
   for (size_t i = 0; i < theDays.size(); ++i)
-    mInputs.push_back({theNulls[i] - CTLRX_NULL_TOLERANCE, theNulls[i] + CTLRX_NULL_TOLERANCE,
-                       static_cast<double>(theDays[i]), static_cast<int32_t>(theDays[i] - theDays[0])});
+    mInputs.push_back({SNoData(theNulls[i]), static_cast<double>(theDays[i]),
+                       static_cast<int32_t>(theDays[i] - theDays[0])});
 }
 
 int32_t CTemporalSeries::select(const double *theValues, size_t theStride) {
@@ -171,8 +162,9 @@ int32_t CTemporalSeries::select(const double *theValues, size_t theStride) {
   for (size_t i = 0; i < aInputs; ++i) {
     const SInputTerms &aInput = mInputs[i];
     double v = theValues[i * theStride];
-    // Not a number carries no measurement, whatever the null value.
-    if (std::isnan(v) || fdfInInterval(v, aInput.mNullLow, aInput.mNullHigh))
+    // Temporal features drop a NaN as no data too: it carries no measurement,
+    // whatever the null value.
+    if (aInput.mNoData.isNullOrNaN(v))
       continue;
     v = std::fabs(v);
     if (k > 0 && !fdfBelowRatePerDay(v, aLast, aInput.mDay - aLastDay, mSettings.mRatioTimeThreshold))

@@ -3,8 +3,8 @@
 // modifiers. Works on plain buffers, one pixel at a time, without allocating.
 //
 // Selection, over the inputs in temporal order: a value that is no data for
-// its input (or not a number) is skipped; the others enter as absolute
-// values. The first one is kept; a later one only when
+// its input by the raster rule (tlrx_no_data.h), or not a number whatever the
+// null value, is skipped; the others enter as absolute values. The first one is kept; a later one only when
 // (v / v_last) / (t - t_last) < ratio-time threshold, v_last and t_last being
 // those of the last kept sample. The arithmetic decides the degenerate cases:
 // a same-day sample (division by 0 days) and any sample after a kept 0 are
@@ -14,6 +14,8 @@
 #include <cstddef>
 #include <cstdint>
 #include <vector>
+
+#include "tlrx_no_data.h"
 
 // The features, in the order of their outputs.
 enum ETemporalFeature {
@@ -38,8 +40,8 @@ constexpr int32_t CTLRX_TF_NO_DATE = -9999;
 
 // Running mean and standard deviation. The partial sums are kept below about
 // 1e14 by moving a power of ten into their scale factors, which limits the
-// loss of precision on long series of large values. Values equal to the null
-// value (both not a number, or within 1.1754943508222875e-38) are ignored.
+// loss of precision on long series of large values. Values that are no data
+// for the null value by the raster rule are ignored.
 class CTemporalAccumulator {
 public:
   void reset(double theNull);
@@ -63,9 +65,7 @@ public:
   double std() const;
 
 private:
-  bool isNull(double theValue) const {
-    return (mNullIsNaN && theValue != theValue) || (theValue >= mNullLow && theValue <= mNullHigh);
-  }
+  bool isNull(double theValue) const { return mNoData.isNull(theValue); }
   // A scale of 1 divides exactly, so the usual case skips the division.
   static void scaledAdd(double &theSum, double &theScale, double theValue) {
     if (theSum > 1e14) {
@@ -78,9 +78,7 @@ private:
 
   double mSum = 0.0, mSumScale = 1.0;
   double mSquares = 0.0, mSquaresScale = 1.0;
-  double mNull = 0.0;
-  double mNullLow = 0.0, mNullHigh = 0.0; // the no-data interval (NaN bounds for a NaN null)
-  bool mNullIsNaN = false;
+  SNoData mNoData;
   int32_t mCount = 0;
 };
 
@@ -155,7 +153,7 @@ private:
 
   // What the selection needs of every input, in temporal order.
   struct SInputTerms {
-    double mNullLow, mNullHigh; // no-data interval (NaN bounds for a NaN null)
+    SNoData mNoData;
     double mDay;                // day number
     int32_t mFromReference;     // days from the first input
   };

@@ -9,6 +9,7 @@
 #include "tlrx_envi_util.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_platform.h"
 
 #include <cstring>
 #include <exception>
@@ -31,6 +32,12 @@ const char *const theTrailerMarker = "###Tellurix###";
 
 // The command line as the host gave it, kept for the whole run.
 std::string theCommandLine;
+
+// Anything else escaping a command, reported as 913920 with the process
+// that was running.
+CErrorExceptionManager fdfUnexpected(int theLine) {
+  return CErrorExceptionManager(CTLRX_ERR_UNEXPECTED, theLine, __FILE__, fdfGetProcessName(), fdfGetProcessName());
+}
 
 } // namespace
 
@@ -69,15 +76,16 @@ int main_features_extraction(const char *theLine) {
     int32_t aStatus = CTLRX_ERR_UNKNOWN_COMMAND;
     if (aCommand >= 0 && theCommands[aCommand].mDriver != nullptr)
       aStatus = theCommands[aCommand].mDriver(aArguments);
-    if (aStatus == 0) {
-      fdfEndProcess(0, true, true);
-      return 0;
-    }
-    fdfRaiseError(aStatus, nullptr, __FILE__, 100);
+    // A driver's failing status is reported like any raised error.
+    if (aStatus != 0)
+      fdfRaiseError(aStatus, nullptr, __FILE__, 100);
+    return fdfExitStatus(fdfEndProcess(0, true, true));
   } catch (const CErrorExceptionManager &theError) {
-    // Only where report-and-exit is off: hand the code back to the caller.
-    return theError.mCode;
+    return fdfReportError(theError);
+  } catch (const std::exception &theError) {
+    fdfTraceMessage("Exception raised: %s\n", theError.what());
+    return fdfReportError(fdfUnexpected(__LINE__));
   } catch (...) {
-    fdfRaiseError(CTLRX_ERR_UNEXPECTED, fdfGetProcessName(), __FILE__, 108);
+    return fdfReportError(fdfUnexpected(__LINE__));
   }
 }

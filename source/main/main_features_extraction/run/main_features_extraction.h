@@ -21,5 +21,6 @@ int fdfMatchCommand(const char *theCommandLine, const char **theArguments);
 
 const char *fdfProductBanner();
 
-// Runs a whole command line; returns 0 on success (failures end the process).
+// Runs a whole command line: start-up, the command, and the report of its
+// end, success or the one error that stopped it. Returns the exit status.
 int main_features_extraction(const char *theCommandLine);

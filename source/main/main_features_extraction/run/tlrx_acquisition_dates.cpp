@@ -26,17 +26,37 @@ STLRXDate fdfReadInputDate(const std::string &theName) {
   return aDate;
 }
 
-std::vector<STLRXDate> fdfOrderChronologically(std::vector<std::string> &theNames) {
+namespace {
+
+bool fdfComesAfter(const STLRXDate &theFirst, const STLRXDate &theSecond, ETLRXDateOrder theOrder) {
+  return theOrder == ETLRXDateOrder::kDayNumber ? theFirst.mDay > theSecond.mDay : fdfDateBefore(theSecond, theFirst);
+}
+
+std::vector<STLRXDate> fdfReadAndOrder(std::vector<std::string> &theNames, ETLRXDateOrder theOrder) {
   std::vector<STLRXDate> aDates;
   for (const std::string &aName : theNames)
     aDates.push_back(fdfReadInputDate(aName));
-  for (size_t i = 0; i + 1 < aDates.size(); ++i)
-    for (size_t j = i + 1; j < aDates.size(); ++j)
-      if (fdfDateBefore(aDates[j], aDates[i])) {
-        std::swap(aDates[i], aDates[j]);
-        std::swap(theNames[i], theNames[j]);
-      }
+  fdfSortByDate(aDates, theNames, theOrder);
   for (size_t i = 0; i < aDates.size(); ++i)
     fdfTraceMessage("DATE = %s   NAME = %s\n", fdfDateTraceText(aDates[i]).c_str(), theNames[i].c_str());
   return aDates;
+}
+
+} // namespace
+
+void fdfSortByDate(std::vector<STLRXDate> &theDates, std::vector<std::string> &theNames, ETLRXDateOrder theOrder) {
+  for (size_t i = 0; i + 1 < theDates.size(); ++i)
+    for (size_t j = i + 1; j < theDates.size(); ++j)
+      if (fdfComesAfter(theDates[i], theDates[j], theOrder)) {
+        std::swap(theDates[i], theDates[j]);
+        std::swap(theNames[i], theNames[j]);
+      }
+}
+
+std::vector<STLRXDate> fdfOrderChronologically(std::vector<std::string> &theNames) {
+  return fdfReadAndOrder(theNames, ETLRXDateOrder::kDayThenSeconds);
+}
+
+std::vector<STLRXDate> fdfOrderByDayNumber(std::vector<std::string> &theNames) {
+  return fdfReadAndOrder(theNames, ETLRXDateOrder::kDayNumber);
 }

@@ -6,6 +6,7 @@
 #include "tlrx_generic_utility.h"
 #include "tlrx_standard_header.h"
 
+#include <climits>
 #include <cstring>
 
 std::vector<std::string> fdfStartArgumentCommand(const char *theArguments, const char *theTitle) {
@@ -47,11 +48,6 @@ bool fdfFindOtherInfo(const CDescription &theHeader, const char *theKey, std::st
   return false;
 }
 
-double fdfHeaderNullValue(const CDescription &theHeader) {
-  const CDescriptionField *aField = theHeader.findField("RasterInfo.NullCellValue");
-  return aField != nullptr && aField->holdsValue() ? aField->getDouble() : 0.0;
-}
-
 int32_t fdfIntegerToken(const char *theToken, const char *theWhat, int32_t theCode) {
   int32_t aValue = 0;
   if (!fdfParseWholeInteger(theToken, aValue))
@@ -66,32 +62,35 @@ double fdfRealToken(const char *theToken, const char *theWhat, int32_t theCode) 
   return aValue;
 }
 
-int32_t fdfHeaderInteger(const CDescription &theHeader, const char *theKey) {
-  return theHeader.getField(theKey).getInteger();
-}
+namespace {
+
+// A result header without the field would silently lose the value: the
+// readers' missing-field error (848642 naming the key) says so.
+CDescriptionField &declaredField(CDescription &theHeader, const char *theKey) { return theHeader.getField(theKey); }
+
+} // namespace
 
 void fdfSetHeaderText(CDescription &theHeader, const char *theKey, const char *theValue) {
-  if (CDescriptionField *aField = theHeader.findField(theKey))
-    aField->setString(theValue);
+  declaredField(theHeader, theKey).setString(theValue);
 }
 
 void fdfSetHeaderNumber(CDescription &theHeader, const char *theKey, double theValue) {
-  CDescriptionField *aField = theHeader.findField(theKey);
-  if (aField == nullptr)
+  CDescriptionField &aField = declaredField(theHeader, theKey);
+  if (aField.getValueType() != CTLRX_DS_INTEGER) {
+    aField.setDouble(theValue);
     return;
-  if (aField->getValueType() == CTLRX_DS_INTEGER)
-    aField->setInteger(static_cast<int32_t>(theValue));
-  else
-    aField->setDouble(theValue);
+  }
+  // Converting a value outside the 32-bit range is undefined behaviour.
+  if (!(theValue >= INT32_MIN && theValue <= INT32_MAX))
+    TLRX_RAISE_F(CTLRX_ERR_DS_TYPE, "%.200s: %.17g is not a 32-bit integer", theKey, theValue);
+  aField.setInteger(static_cast<int32_t>(theValue));
 }
 
 void fdfSetHeaderList(CDescription &theHeader, const char *theKey, const std::vector<std::string> &theNames) {
-  CDescriptionField *aField = theHeader.findField(theKey);
-  if (aField == nullptr)
-    return;
-  aField->setNumberOfElements(static_cast<int32_t>(theNames.size()));
+  CDescriptionField &aField = declaredField(theHeader, theKey);
+  aField.setNumberOfElements(static_cast<int32_t>(theNames.size()));
   for (size_t i = 0; i < theNames.size(); ++i)
-    aField->setString(static_cast<int32_t>(i), theNames[i].c_str());
+    aField.setString(static_cast<int32_t>(i), theNames[i].c_str());
 }
 
 void fdfWriteResultHeader(const std::string &theRaster, CDescription &theHeader, int32_t theCode) {

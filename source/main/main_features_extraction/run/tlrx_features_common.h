@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "tlrx_description_section.h"
+#include "tlrx_header_numbers.h"
 
 // Key of the acquisition date in "RasterInfo.OtherInfo".
 constexpr const char *CTLRX_ACQUISITION_TIME_KEY = "ACQUISITION TIME";
@@ -32,12 +33,9 @@ void fdfLoadInputHeader(const std::string &theRaster, CDescription &theHeader);
 // theKey; false when there is none.
 bool fdfFindOtherInfo(const CDescription &theHeader, const char *theKey, std::string &theValue);
 
-// "NullCellValue" of a header, 0 when absent or unset.
-double fdfHeaderNullValue(const CDescription &theHeader);
-int32_t fdfHeaderInteger(const CDescription &theHeader, const char *theKey);
-
-// Sets a scalar field when the header declares it (string, integer or
-// double as the field is typed).
+// Sets a scalar field (string, integer or double as the field is typed); a
+// key the header does not declare raises 848642 naming it, a number that an
+// integer field cannot hold raises 848644.
 void fdfSetHeaderText(CDescription &theHeader, const char *theKey, const char *theValue);
 void fdfSetHeaderNumber(CDescription &theHeader, const char *theKey, double theValue);
 // Stores theNames in the string vector theKey.

@@ -8,14 +8,9 @@
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
 #include "tlrx_generic_utility.h"
-#include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_step.h"
-#include "tlrx_window_sums.h"
-
-#include <cstdlib>
-#include <vector>
 
 namespace {
 
@@ -27,68 +22,51 @@ void fdfTraceCorrelationStats(const SCorrelationStats &theStats) {
                   static_cast<long long>(theStats.mAbove0));
 }
 
+const SWindowStepSyntax CTLRX_CORRELATION_SYNTAX{
+    "Texture Derodi program version 1.0 05-gen-2000\n", 7,
+    [](int theArgc, char **theArgv) { fdfTracePairStepUsage(theArgc, theArgv, true); }, CTLRX_ERR_SETTING_MISSING,
+    CTLRX_CLIPPED_WINDOW_RULE};
+
 } // namespace
 
 int quick_and_dirty(int argc, char **argv) {
-  fdfTraceMessage("Texture Derodi program version 1.0 05-gen-2000\n");
-  if (argc < 8) {
-    fdfTracePairStepUsage(argc, argv, true);
-    TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, nullptr);
-  }
-  const int32_t aRows = fdfIntegerToken(argv[6], "window rows", CTLRX_ERR_WINDOW_SIZE);
-  const int32_t aCols = fdfIntegerToken(argv[7], "window columns", CTLRX_ERR_WINDOW_SIZE);
+  CWindowStep aStep(argc, argv, CTLRX_CORRELATION_SYNTAX);
+  const int32_t aRows = aStep.windowArgument(6, "window rows");
+  const int32_t aCols = aStep.windowArgument(7, "window columns");
   fdfTraceMessage("  input file 1 name   : %s\n  input file 2 name   : %s\n  Norm image file name  : %s\n"
                   "  output image file name  : %s\n  rows number in texture window : %d\n"
                   "  cols number in texture window : %d\n",
                   argv[1], argv[2], argv[3], argv[4], aRows, aCols);
-  fdfCheckWindowSize(aRows, aCols);
+  aStep.setWindow(aRows, aCols);
 
-  CWindowInput aFirst(argv[1]);
-  CWindowInput aSecond(argv[2]);
-  CWindowInput aNorm(argv[3]);
-  fdfCheckSameSize(aFirst, aSecond);
-  fdfCheckSameSize(aFirst, aNorm);
+  aStep.addInputs({1, 2, 3});
+  CWindowInput &aFirst = aStep.input(0);
+  CWindowInput &aSecond = aStep.input(1);
+  CWindowInput &aNorm = aStep.input(2);
   for (const CWindowInput *aInput : {&aFirst, &aSecond})
     if (aInput->deliversIntensity())
       fdfTraceMessage(" Intensity\n");
-  aFirst.open();
-  aSecond.open();
-  aNorm.open();
+  aStep.openInputs();
   const float aNull = fdfGetDummyValue();
   CDescription aHeader;
   fdfMakeWindowResultHeader(aHeader, aFirst.header(), fdfGetDummyValueDouble(), "COHERENCE");
   fdfStampPairInputs(aHeader, aFirst, aSecond);
   CResultRaster aOutput(argv[4], aHeader);
 
-  const int32_t aPixels = aFirst.pixels();
-  CWindowRing aRing(aRows, aCols, aPixels, CTLRX_CORRELATION_CHANNELS);
-  double *const aTerms[CTLRX_CORRELATION_CHANNELS] = {aRing.terms(0), aRing.terms(1), aRing.terms(2)};
-  const double *const aSums[CTLRX_CORRELATION_CHANNELS] = {aRing.column(0), aRing.column(1), aRing.column(2)};
-  std::vector<float> aLine(static_cast<size_t>(aPixels));
   SCorrelationStats aStats;
-  CLineProgress aProgress(97.0, 2);
-  fdfRunWindowSchedule(
-      aRing, aFirst.lines(),
-      [&](int32_t theLine) {
-        aFirst.readLine(theLine);
-        aSecond.readLine(theLine);
-        aNorm.readLine(theLine);
+  aStep.runLines(
+      aOutput, CTLRX_CORRELATION_CHANNELS,
+      [&](double *const *theTerms, uint8_t *theCentre) {
         fdfCorrelationTerms(aFirst.values(), aFirst.mask(), aFirst.deliversIntensity(), aSecond.values(),
-                            aSecond.mask(), aSecond.deliversIntensity(), aNorm.values(), aNorm.mask(), aPixels,
-                            aTerms, aRing.centre(theLine));
+                            aSecond.mask(), aSecond.deliversIntensity(), aNorm.values(), aNorm.mask(),
+                            aFirst.pixels(), theTerms, theCentre);
       },
-      [&](int32_t theLine) {
-        fdfCorrelationLine(aSums, aRing.centre(theLine), aPixels, aNull, aLine.data(), aStats);
-        aOutput.file().putLine(theLine, aLine.data());
-      },
-      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
-  aFirst.close();
-  aSecond.close();
-  aNorm.close();
+      [&](const double *const *theSums, const uint8_t *theCentre, float *theOut) {
+        fdfCorrelationLine(theSums, theCentre, aFirst.pixels(), aNull, theOut, aStats);
+      });
   fdfTraceCorrelationStats(aStats);
   fdfTraceSignificantCount(aNull, aStats.mComputed);
-  fdfTraceMessage("writing the output parameter file %s\n", argv[4]);
-  aOutput.commit(aHeader, CTLRX_ERR_FILE_COPY);
+  aStep.commit(aOutput, aHeader);
   return 0;
 }
 

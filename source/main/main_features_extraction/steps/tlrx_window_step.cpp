@@ -5,6 +5,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_features_common.h"
+#include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 
 #include <cstring>
@@ -17,17 +18,20 @@ const char *fdfHeaderText(const CDescription &theHeader, const char *theKey) {
                                                                                                 : "";
 }
 
+bool fdfIsComplexHeader(const CDescription &theHeader) {
+  return fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType")));
+}
+
 } // namespace
 
-void fdfCheckWindowSize(int32_t theRows, int32_t theCols) {
+void fdfCheckWindowSize(int32_t theRows, int32_t theCols, const SWindowRule &theRule) {
   for (int32_t aSize : {theRows, theCols})
-    if (aSize < CTLRX_WINDOW_MIN_SIZE || aSize > CTLRX_WINDOW_MAX_SIZE)
-      TLRX_RAISE(CTLRX_ERR_WINDOW_SIZE, nullptr);
+    if (aSize < theRule.mMinSize || aSize > theRule.mMaxSize)
+      TLRX_RAISE(theRule.mSizeCode, nullptr);
 }
 
 bool fdfDeliversIntensity(const CDescription &theHeader) {
-  return std::strcmp(fdfHeaderText(theHeader, "RasterInfo.DataUnits"), "POWER") == 0 ||
-         fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType")));
+  return std::strcmp(fdfHeaderText(theHeader, "RasterInfo.DataUnits"), "POWER") == 0 || fdfIsComplexHeader(theHeader);
 }
 
 CWindowInput::CWindowInput(const char *theName) : mName(theName) {
@@ -41,11 +45,26 @@ void CWindowInput::open() {
   // The raster file checks the layout and the file size before anything is
   // sized by the header's counts.
   mRaster.open_read(mName.c_str(), mHeader);
-  mValues.assign(static_cast<size_t>(mRaster.getNrOfPixelsPerLine()), 0.0);
-  mMask.assign(mValues.size(), 0);
+  const size_t aPixels = static_cast<size_t>(mRaster.getNrOfPixelsPerLine());
+  mValues.assign(mParts ? 0 : aPixels, 0.0);
+  mCells.assign(mParts ? aPixels : 0, 0.0);
+  mValid.assign(mParts ? aPixels : 0, 0);
+  mMask.assign(aPixels, 0);
 }
 
-void CWindowInput::readLine(int32_t theLine) { mRaster.getValidMask(mValues.data(), mMask.data(), theLine); }
+void CWindowInput::readParts() { mParts = fdfIsComplexHeader(mHeader); }
+
+// The mask is the raster rule's; the window measures then drop a NaN (or
+// infinite) value as no data too, whatever the null (tlrx_window_measures.h).
+void CWindowInput::readLine(int32_t theLine) {
+  if (!mParts) {
+    mRaster.getValidMask(mValues.data(), mMask.data(), theLine);
+    return;
+  }
+  mRaster.getComplexLine(mCells.data(), theLine, 0, -1, mValid.data());
+  for (size_t j = 0; j < mValid.size(); ++j)
+    mMask[j] = mValid[j];
+}
 
 void fdfCheckSameSize(const CWindowInput &theFirst, const CWindowInput &theOther) {
   if (theOther.lines() != theFirst.lines()) {
@@ -115,4 +134,67 @@ void fdfTracePairStepUsage(int theArgc, char **theArgv, bool theWithNorm) {
                   "  row             rows number in texture window \n"
                   "  col             cols number in texture window \n",
                   theArgc > 0 ? theArgv[0] : "", theWithNorm ? "  input\tnorm      input normalized file name\n" : "");
+}
+
+CWindowStep::CWindowStep(int theArgc, char **theArgv, const SWindowStepSyntax &theSyntax)
+    : mArgc(theArgc), mArgv(theArgv), mRule(theSyntax.mRule) {
+  fdfTraceMessage("%s", theSyntax.mBanner);
+  if (theArgc < theSyntax.mArguments + 1) {
+    theSyntax.mUsage(theArgc, theArgv);
+    TLRX_RAISE(theSyntax.mMissingCode, nullptr);
+  }
+}
+
+int32_t CWindowStep::windowArgument(int theIndex, const char *theWhat) const {
+  return fdfIntegerToken(mArgv[theIndex], theWhat, mRule.mSizeCode);
+}
+
+double CWindowStep::realArgument(int theIndex, const char *theWhat, int32_t theCode) const {
+  return fdfRealToken(mArgv[theIndex], theWhat, theCode);
+}
+
+void CWindowStep::setWindow(int32_t theRows, int32_t theCols) {
+  fdfCheckWindowSize(theRows, theCols, mRule);
+  mShape = SWindowShape{theRows, theCols, mRule.mBorder};
+}
+
+void CWindowStep::addInputs(std::initializer_list<int> theIndices) {
+  for (int aIndex : theIndices)
+    mInputs.push_back(std::make_unique<CWindowInput>(mArgv[aIndex]));
+  for (size_t i = 1; i < mInputs.size(); ++i)
+    fdfCheckSameSize(*mInputs[0], *mInputs[i]);
+}
+
+void CWindowStep::openInputs() {
+  for (const auto &aInput : mInputs)
+    aInput->open();
+}
+
+void CWindowStep::runLines(CResultRaster &theOutput, int theChannels, const TLRXWindowTerms &theTerms,
+                           const TLRXWindowValues &theValues) {
+  CWindowInput &aFirst = *mInputs[0];
+  CWindowRing aRing(mShape, aFirst.lines(), aFirst.pixels(), theChannels);
+  const std::vector<double *> aTerms = aRing.termArrays();
+  const std::vector<const double *> aSums = aRing.columnArrays();
+  std::vector<float> aLine(static_cast<size_t>(aFirst.pixels()));
+  CLineProgress aProgress(97.0, 2);
+  fdfRunWindowSchedule(
+      aRing,
+      [&](int32_t theLine) {
+        for (const auto &aInput : mInputs)
+          aInput->readLine(theLine);
+        theTerms(aTerms.data(), aRing.centre(theLine));
+      },
+      [&](int32_t theLine) {
+        theValues(aSums.data(), aRing.centre(theLine), aLine.data());
+        theOutput.file().putLine(theLine, aLine.data());
+      },
+      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
+  for (const auto &aInput : mInputs)
+    aInput->close();
+}
+
+void CWindowStep::commit(CResultRaster &theOutput, CDescription &theHeader) {
+  fdfTraceMessage("writing the output parameter file %s\n", theOutput.name().c_str());
+  theOutput.commit(theHeader, CTLRX_ERR_FILE_COPY);
 }

@@ -1,25 +1,55 @@
-// What the window step programs (texture, normalisation, intensity
-// correlation) share around the window machinery: their inputs with headers,
-// the size check of co-registered inputs, the result headers, and the stream
-// of one input raster's lines as values with validity flags.
+// The window step runner and what the window step programs (texture,
+// normalisation, intensity correlation, and later steps on a moving window)
+// share around the window machinery: their arguments with checked numbers,
+// the window rule (shape, border and size limits), their inputs with headers
+// and the size check of co-registered inputs, the line loop with its
+// progress, and the result headers. A step supplies only its traces, its
+// result header and the per-line formulas of its measure.
 #pragma once
 
+#include <complex>
 #include <cstdint>
+#include <functional>
+#include <initializer_list>
+#include <memory>
 #include <string>
 #include <vector>
 
 #include "tlrx_description_section.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_window_sums.h"
+
+class CResultRaster;
 
 // Codes of the window steps beside those of the raster file.
 constexpr int32_t CTLRX_ERR_SIZE_MISMATCH = 652807; // 10, 6
 // Window rows or columns outside CTLRX_WINDOW_MIN_SIZE .. CTLRX_WINDOW_MAX_SIZE.
 constexpr int32_t CTLRX_ERR_WINDOW_SIZE = 456961; // 7, 0
+// Window sizes of the exact rule below 2 (or above the maximum).
+constexpr int32_t CTLRX_ERR_EXACT_WINDOW_SIZE = 456962; // 7, 1
 constexpr int32_t CTLRX_WINDOW_MIN_SIZE = 3;
 constexpr int32_t CTLRX_WINDOW_MAX_SIZE = 500;
 
-// Raises CTLRX_ERR_WINDOW_SIZE (no message) unless both sizes lie in 3 .. 500.
-void fdfCheckWindowSize(int32_t theRows, int32_t theCols);
+// Window rule of a step: how the window meets the edges (tlrx_window_sums.h),
+// the limits of its sizes and the code raised, without a message, for a size
+// outside them (and, with a message, for a size that is not an integer).
+struct SWindowRule {
+  ETLRXWindowBorder mBorder;
+  int32_t mMinSize;
+  int32_t mMaxSize;
+  int32_t mSizeCode;
+};
+// Clipped windows of 3 .. 500, K + 1 columns for an even K: the texture and
+// intensity correlation steps.
+constexpr SWindowRule CTLRX_CLIPPED_WINDOW_RULE{ETLRXWindowBorder::kClipped, CTLRX_WINDOW_MIN_SIZE,
+                                                CTLRX_WINDOW_MAX_SIZE, CTLRX_ERR_WINDOW_SIZE};
+// Exact R x K windows of at least 2 with border pixels set to the null value,
+// as coherence estimation wants them. The maximum bounds the ring's memory.
+constexpr SWindowRule CTLRX_EXACT_WINDOW_RULE{ETLRXWindowBorder::kNull, 2, CTLRX_WINDOW_MAX_SIZE,
+                                              CTLRX_ERR_EXACT_WINDOW_SIZE};
+
+// Raises theRule's code (no message) unless both sizes lie in its limits.
+void fdfCheckWindowSize(int32_t theRows, int32_t theCols, const SWindowRule &theRule = CTLRX_CLIPPED_WINDOW_RULE);
 
 // Whether the line read delivers intensities for a raster of this header:
 // "DataUnits" "POWER", or a complex cell type (whose cells are read as
@@ -27,15 +57,20 @@ void fdfCheckWindowSize(int32_t theRows, int32_t theCols);
 bool fdfDeliversIntensity(const CDescription &theHeader);
 
 // One input raster of a window step: its header (missing: 261122 with the
-// header name), size and whether it delivers intensities, then the open raster and one line of
-// values with their validity flags.
+// header name), size and whether it delivers intensities, then the open raster
+// and one line of values with their validity flags. A complex input asked for
+// its parts gives the cells themselves instead of their intensities.
 class CWindowInput {
 public:
   explicit CWindowInput(const char *theName);
 
+  // Complex cells read as parts (cells()) rather than intensities (values());
+  // no effect on real cells. Before open().
+  void readParts();
   // Opens the raster for reading (after every header check of the step).
   void open();
-  // Reads line theLine into values() and mask() (1 valid, 0 no data).
+  // Reads line theLine into values() (or cells()) and mask() (1 valid, 0 no
+  // data; a complex cell is no data when both its parts are).
   void readLine(int32_t theLine);
   // Line theLine as floats into theValues (no-data cells hold nullValue()),
   // for steps that test validity themselves.
@@ -48,7 +83,9 @@ public:
   int32_t lines() const { return mLines; }
   int32_t pixels() const { return mPixels; }
   bool deliversIntensity() const { return mIntensity; }
+  bool readsParts() const { return mParts; }
   const double *values() const { return mValues.data(); }
+  const std::complex<double> *cells() const { return mCells.data(); }
   const int32_t *mask() const { return mMask.data(); }
 
 private:
@@ -57,8 +94,11 @@ private:
   int32_t mLines = 0;
   int32_t mPixels = 0;
   bool mIntensity = false;
+  bool mParts = false;
   CRasterFile mRaster;
   std::vector<double> mValues;
+  std::vector<std::complex<double>> mCells;
+  std::vector<uint8_t> mValid;
   std::vector<int32_t> mMask;
 };
 
@@ -85,3 +125,61 @@ void fdfTracePairStepUsage(int theArgc, char **theArgv, bool theWithNorm);
 
 // "Number of significant value (no equal to <null> one) = <count>" to the trace.
 void fdfTraceSignificantCount(double theNull, int64_t theCount);
+
+// How a window step starts: the banner traced first, the number of arguments
+// it needs after the program name, the usage traced and the code raised
+// (without a message) when fewer are given, and its window rule.
+struct SWindowStepSyntax {
+  const char *mBanner;
+  int mArguments;
+  void (*mUsage)(int theArgc, char **theArgv);
+  int32_t mMissingCode;
+  SWindowRule mRule;
+};
+
+// Fills the terms and centre flags of a line from the inputs' current lines.
+using TLRXWindowTerms = std::function<void(double *const *theTerms, uint8_t *theCentre)>;
+// Turns the window sums and centre flags of a line into an output line.
+using TLRXWindowValues = std::function<void(const double *const *theSums, const uint8_t *theCentre, float *theOut)>;
+
+// One run of a window step: arguments, window, inputs, the line loop.
+class CWindowStep {
+public:
+  // Traces the banner; with fewer arguments than the syntax needs, traces its
+  // usage and raises its code.
+  CWindowStep(int theArgc, char **theArgv, const SWindowStepSyntax &theSyntax);
+
+  // Window size argument theIndex, read whole: anything but an integer
+  // raises the rule's code with "theWhat: not an integer [token]".
+  int32_t windowArgument(int theIndex, const char *theWhat) const;
+  // Real argument theIndex, read whole and finite (theCode otherwise).
+  double realArgument(int theIndex, const char *theWhat, int32_t theCode) const;
+  // The window of the run, checked against the rule's limits.
+  void setWindow(int32_t theRows, int32_t theCols);
+
+  // The rasters named by the arguments theIndices as inputs, in that order:
+  // every header is read (missing: 261122), then each must have the first
+  // one's size (652807).
+  void addInputs(std::initializer_list<int> theIndices);
+  CWindowInput &input(size_t theIndex) { return *mInputs[theIndex]; }
+  // Opens every input raster, after the step's header checks.
+  void openInputs();
+
+  // The line loop over the first input's lines: each input line of every
+  // input is read once, in order, and handed to theTerms with the ring's
+  // terms and centre flags; each output line comes from theValues and is
+  // written to theOutput. Progress 2 .. 99 before each line (the host's
+  // interruption stops the run there); the inputs are closed at the end.
+  void runLines(CResultRaster &theOutput, int theChannels, const TLRXWindowTerms &theTerms,
+                const TLRXWindowValues &theValues);
+  // Traces "writing the output parameter file <name>" and commits the
+  // result with its header (failure: 261123 with the header name).
+  void commit(CResultRaster &theOutput, CDescription &theHeader);
+
+private:
+  int mArgc;
+  char **mArgv;
+  SWindowRule mRule;
+  SWindowShape mShape;
+  std::vector<std::unique_ptr<CWindowInput>> mInputs;
+};

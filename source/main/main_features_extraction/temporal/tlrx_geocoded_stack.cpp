@@ -36,12 +36,11 @@ struct CGeocodedImageStack::SInput {
   bool mRowInside = false;
   std::vector<SKernelTaps> mRowTaps; // per level
 
-  double mNullLow = 0.0, mNullHigh = 0.0; // no-data interval (NaN bounds for a NaN null)
+  SNoData mNoData;
 
-  // No data, or not a number: nothing to interpolate from.
-  bool isNull(double theValue) const {
-    return theValue != theValue || (theValue >= mNullLow && theValue <= mNullHigh);
-  }
+  // No data, or not a number whatever the null value (as the temporal
+  // features count it): nothing to interpolate from.
+  bool isNull(double theValue) const { return mNoData.isNullOrNaN(theValue); }
   int32_t *nullsBefore(int32_t theLine) {
     return &mNullsBefore[static_cast<size_t>(theLine % mSlots) * (static_cast<size_t>(mGrid.mPixels) + 1)];
   }
@@ -128,8 +127,7 @@ bool CGeocodedImageStack::addInput(const std::string &theName) {
   }
   aIn.mFile.open_read(theName.c_str(), aHeader);
   aIn.mNull = aIn.mFile.getDummyVal();
-  aIn.mNullLow = aIn.mNull - CTLRX_RF_NULL_TOLERANCE;
-  aIn.mNullHigh = aIn.mNull + CTLRX_RF_NULL_TOLERANCE;
+  aIn.mNoData = aIn.mFile.getNoData();
   // The header's size is the one the raster file checked against the data.
   aIn.mGrid.mLines = aIn.mFile.getNrOfLinesPerImage();
   aIn.mGrid.mPixels = aIn.mFile.getNrOfPixelsPerLine();

@@ -172,7 +172,7 @@ void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, co
 // Days of the inputs, ordered in time with their names, and the trace of
 // their distances from the reference.
 std::vector<long> fdfOrderInTime(std::vector<std::string> &theNames) {
-  const std::vector<STLRXDate> aDates = fdfOrderChronologically(theNames);
+  const std::vector<STLRXDate> aDates = fdfOrderByDayNumber(theNames);
   std::vector<long> aDays;
   for (const STLRXDate &aDate : aDates)
     aDays.push_back(aDate.mDay);
@@ -296,8 +296,8 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
 
   CDescription aGridHeader;
   fdfReadStandardHeader(aGrid.c_str(), aGridHeader);
-  const int32_t aLines = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfLinesPerImage");
-  const int32_t aPixels = fdfHeaderInteger(aGridHeader, "RasterInfo.NrOfPixelsPerLine");
+  const int32_t aLines = fdfHeaderSize(aGridHeader, "RasterInfo.NrOfLinesPerImage", CTLRX_RASTER_FILE_MAX_ROWS);
+  const int32_t aPixels = fdfHeaderSize(aGridHeader, "RasterInfo.NrOfPixelsPerLine", CTLRX_RASTER_FILE_MAX_ROWS);
   aSettings.mNull = fdfHeaderNullValue(aGridHeader);
 
   std::unique_ptr<CInputRows> aSource;

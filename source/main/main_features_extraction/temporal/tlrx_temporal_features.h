@@ -27,6 +27,7 @@ struct STemporalRequest {
   std::vector<std::string> mInputs; // any order
   std::string mRoot;                // output root R
   std::string mInterpolation;       // kernel of geocoded inputs
+  std::string mInterpolationText;   // "interp_type" as the parameter file gave it (logged)
   double mMaxIncrementThrDb = 1000.0;
   double mMaxDecrementThrTime = 1.0;
   bool mNormalize = false;

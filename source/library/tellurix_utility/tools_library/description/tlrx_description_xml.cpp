@@ -2,6 +2,7 @@
 // of an existing file, the reader that maps an element tree onto declared
 // fields, the header file names and the values stamped before writing.
 #include "tlrx_description_xml.h"
+#include "tlrx_header_numbers.h"
 
 #include "tlrx_description_file_lines.h"
 #include "tlrx_description_text.h"
@@ -497,19 +498,6 @@ CDescriptionField *findScalar(const CDescription &theDescription, const char *th
   return aField != nullptr && aField->getShape() == CTLRX_DS_SCALAR ? aField : nullptr;
 }
 
-bool numberOf(const CDescription &theDescription, const char *theKey, double &theValue) {
-  const CDescriptionField *aField = findScalar(theDescription, theKey);
-  if (aField == nullptr || !aField->holdsValue())
-    return false;
-  if (aField->getValueType() == CTLRX_DS_DOUBLE)
-    theValue = aField->getDouble();
-  else if (aField->getValueType() == CTLRX_DS_INTEGER)
-    theValue = aField->getInteger();
-  else
-    return false;
-  return true;
-}
-
 void setNumber(const CDescription &theDescription, const char *theKey, double theValue) {
   CDescriptionField *aField = findScalar(theDescription, theKey);
   if (aField == nullptr)
@@ -629,20 +617,19 @@ bool fdfDeriveDemBox(CDescription &theDescription) {
   if (aGeocoded == nullptr || aGeocoded->getValueType() != CTLRX_DS_STRING || !aGeocoded->holdsValue() ||
       strcasecmp(aGeocoded->getString(), "OK") != 0)
     return false;
-  double aSpacingLat = 0, aSpacingLon = 0, aLines = 0, aPixels = 0, aNorthing = 0, aEasting = 0;
-  if (!numberOf(theDescription, "RegistrationCoordinates.PixelSpacingLatNorth", aSpacingLat) ||
-      !numberOf(theDescription, "RegistrationCoordinates.PixelSpacingLonEast", aSpacingLon) ||
-      !numberOf(theDescription, "RasterInfo.NrOfLinesPerImage", aLines) ||
-      !numberOf(theDescription, "RasterInfo.NrOfPixelsPerLine", aPixels) ||
-      !numberOf(theDescription, "RegistrationCoordinates.LatNorthing", aNorthing) ||
-      !numberOf(theDescription, "RegistrationCoordinates.LonEasting", aEasting))
+  SMapRegistration aMap;
+  std::string aKey, aProblem;
+  int32_t aLines = 0, aPixels = 0;
+  if (!fdfReadMapRegistration(theDescription, aMap, aKey, aProblem) ||
+      !fdfReadHeaderInteger(theDescription, "RasterInfo.NrOfLinesPerImage", aLines).empty() ||
+      !fdfReadHeaderInteger(theDescription, "RasterInfo.NrOfPixelsPerLine", aPixels).empty())
     return false;
-  setNumber(theDescription, "DEMCoordinates.NorthingCoordinateBegin", aNorthing + aLines * aSpacingLat);
-  setNumber(theDescription, "DEMCoordinates.NorthingGridSize", -aSpacingLat);
-  setNumber(theDescription, "DEMCoordinates.NorthingCoordinateEnd", aNorthing);
-  setNumber(theDescription, "DEMCoordinates.EastingCoordinateBegin", aEasting);
-  setNumber(theDescription, "DEMCoordinates.EastingGridSize", aSpacingLon);
-  setNumber(theDescription, "DEMCoordinates.EastingCoordinateEnd", aEasting + aPixels * aSpacingLon);
+  setNumber(theDescription, "DEMCoordinates.NorthingCoordinateBegin", aMap.mNorthing + aLines * aMap.mNorthSpacing);
+  setNumber(theDescription, "DEMCoordinates.NorthingGridSize", -aMap.mNorthSpacing);
+  setNumber(theDescription, "DEMCoordinates.NorthingCoordinateEnd", aMap.mNorthing);
+  setNumber(theDescription, "DEMCoordinates.EastingCoordinateBegin", aMap.mEasting);
+  setNumber(theDescription, "DEMCoordinates.EastingGridSize", aMap.mEastSpacing);
+  setNumber(theDescription, "DEMCoordinates.EastingCoordinateEnd", aMap.mEasting + aPixels * aMap.mEastSpacing);
   return true;
 }
 

@@ -10,6 +10,7 @@
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_read_write_map_info.h"
 #include "tlrx_standard_header.h"
 
@@ -85,13 +86,13 @@ const CDescriptionField *scalarWithValue(const CDescription &theHeader, const ch
   return aField;
 }
 
-// An integer header value; false when absent or not a whole number in range.
+// An integer header value read by the header accessors; false when absent
+// or not a whole 32-bit number (the caller names the field in its error).
 bool integerField(const CDescription &theHeader, const char *theKey, int64_t &theValue) {
-  double aValue = 0.0;
-  if (!fdfEnviFieldNumber(theHeader, theKey, aValue) || !(std::fabs(aValue) < 9.0e15) ||
-      aValue != std::floor(aValue))
+  int32_t aValue = 0;
+  if (!fdfReadHeaderInteger(theHeader, theKey, aValue).empty())
     return false;
-  theValue = static_cast<int64_t>(aValue);
+  theValue = aValue;
   return true;
 }
 
@@ -490,18 +491,10 @@ std::string fdfEnviDouble(double theValue) {
 }
 
 bool fdfEnviFieldNumber(const CDescription &theHeader, const char *theKey, double &theValue) {
-  const CDescriptionField *aField = scalarWithValue(theHeader, theKey);
-  if (aField == nullptr)
+  if (!fdfHeaderHolds(theHeader, theKey))
     return false;
-  if (aField->getValueType() == CTLRX_DS_INTEGER) {
-    theValue = aField->getInteger();
-    return true;
-  }
-  if (aField->getValueType() == CTLRX_DS_DOUBLE) {
-    theValue = aField->getDouble();
-    return true;
-  }
-  return false;
+  theValue = fdfHeaderReal(theHeader, theKey);
+  return true;
 }
 
 const char *fdfEnviFieldText(const CDescription &theHeader, const char *theKey) {

@@ -38,9 +38,10 @@ std::string fdfEnviVocabularyFileName(const char *theProfile);
 // Doubles of ENVI headers: 30 significant digits, "NaN" for not-a-number.
 std::string fdfEnviDouble(double theValue);
 
-// Header lookups of the ENVI lines (also used by the map lines): the value of
-// a scalar integer or double field that holds one (false otherwise), and the
-// text of a scalar string field that holds one (nullptr otherwise).
+// Header lookups of the ENVI lines (also used by the map lines): the number
+// of a scalar field that holds one, read by the header accessors (false when
+// it holds none; a text that is not a number raises 848642 naming it), and
+// the text of a scalar string field that holds one (nullptr otherwise).
 bool fdfEnviFieldNumber(const CDescription &theHeader, const char *theKey, double &theValue);
 const char *fdfEnviFieldText(const CDescription &theHeader, const char *theKey);
 

@@ -1,6 +1,7 @@
 #include "tlrx_map_grid.h"
 
 #include "tlrx_description_section.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_raster_file.h"
 
 #include <algorithm>
@@ -11,30 +12,14 @@ namespace {
 
 constexpr double CTLRX_GRID_SNAP = 1e-9;
 
-bool fdfReadNumber(const CDescription &theHeader, const char *theKey, double &theValue, std::string &theProblem) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  if (aField == nullptr || !aField->holdsValue() || aField->getShape() != CTLRX_DS_SCALAR ||
-      (aField->getValueType() != CTLRX_DS_DOUBLE && aField->getValueType() != CTLRX_DS_INTEGER)) {
-    theProblem = theKey;
-    return false;
-  }
-  theValue = aField->getValueType() == CTLRX_DS_DOUBLE ? aField->getDouble() : aField->getInteger();
-  if (!std::isfinite(theValue)) {
-    theProblem = theKey;
-    return false;
-  }
-  return true;
-}
-
+// A count of the header: an integer in 1..CTLRX_RASTER_FILE_MAX_ROWS.
 bool fdfReadCount(const CDescription &theHeader, const char *theKey, int32_t &theCount, std::string &theProblem) {
-  double aValue = 0.0;
-  if (!fdfReadNumber(theHeader, theKey, aValue, theProblem))
-    return false;
-  if (aValue < 1 || aValue > CTLRX_RASTER_FILE_MAX_ROWS || aValue != std::floor(aValue)) {
+  int32_t aValue = 0;
+  if (!fdfReadHeaderInteger(theHeader, theKey, aValue).empty() || aValue < 1 || aValue > CTLRX_RASTER_FILE_MAX_ROWS) {
     theProblem = theKey;
     return false;
   }
-  theCount = static_cast<int32_t>(aValue);
+  theCount = aValue;
   return true;
 }
 
@@ -63,12 +48,16 @@ bool fdfReadRasterSize(const CDescription &theHeader, int32_t &theLines, int32_t
 }
 
 bool fdfReadMapGrid(const CDescription &theHeader, SMapGrid &theGrid, std::string &theProblem) {
-  if (!fdfReadRasterSize(theHeader, theGrid.mLines, theGrid.mPixels, theProblem) ||
-      !fdfReadNumber(theHeader, "RegistrationCoordinates.LatNorthing", theGrid.mNorth0, theProblem) ||
-      !fdfReadNumber(theHeader, "RegistrationCoordinates.LonEasting", theGrid.mEast0, theProblem) ||
-      !fdfReadNumber(theHeader, "RegistrationCoordinates.PixelSpacingLatNorth", theGrid.mNorthStep, theProblem) ||
-      !fdfReadNumber(theHeader, "RegistrationCoordinates.PixelSpacingLonEast", theGrid.mEastStep, theProblem))
+  if (!fdfReadRasterSize(theHeader, theGrid.mLines, theGrid.mPixels, theProblem))
     return false;
+  SMapRegistration aRegistration;
+  std::string aWhy;
+  if (!fdfReadMapRegistration(theHeader, aRegistration, theProblem, aWhy))
+    return false;
+  theGrid.mNorth0 = aRegistration.mNorthing;
+  theGrid.mEast0 = aRegistration.mEasting;
+  theGrid.mNorthStep = aRegistration.mNorthSpacing;
+  theGrid.mEastStep = aRegistration.mEastSpacing;
   // The union and the cell mapping assume north-up rasters.
   if (!(theGrid.mNorthStep < 0.0)) {
     theProblem = "RegistrationCoordinates.PixelSpacingLatNorth";

@@ -27,7 +27,6 @@ std::vector<std::string> fdfHeaderFiles(const std::string &theName) {
 
 CPendingFiles::CPendingFiles() : mEnclosing(theInnermostGuard), mUncaught(std::uncaught_exceptions()) {
   theInnermostGuard = this;
-  fdfSetErrorHook(&CPendingFiles::onError);
 }
 
 CPendingFiles::~CPendingFiles() {
@@ -39,8 +38,6 @@ CPendingFiles::~CPendingFiles() {
       if (aGuard->mEnclosing == this)
         aGuard->mEnclosing = mEnclosing;
   }
-  if (theInnermostGuard == nullptr)
-    fdfSetErrorHook(nullptr);
   if (std::uncaught_exceptions() > mUncaught)
     removeAll();
 }
@@ -89,13 +86,6 @@ void CPendingFiles::removeAll() {
     if (fdfExistFile(aFile.c_str()))
       fdfRemoveFile(aFile.c_str());
   mFiles.clear();
-}
-
-void CPendingFiles::onError(int32_t theCode) {
-  if (theCode == 0 || theCode == CTLRX_WARNING_STATUS)
-    return;
-  for (CPendingFiles *aGuard = theInnermostGuard; aGuard != nullptr; aGuard = aGuard->mEnclosing)
-    aGuard->removeAll();
 }
 
 void fdfAddPendingFile(const std::string &theName) {

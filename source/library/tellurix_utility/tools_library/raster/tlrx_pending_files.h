@@ -1,10 +1,8 @@
 // Files of a run that must not outlive its failure: temporary files, results
 // that are not complete yet, and the results of a run that has not finished.
-// While a guard is alive, raising an error removes the files still
-// registered with it, so a failed run leaves no result that a reader could
-// take for a finished one. With report-and-exit on, the removal runs from the
-// error hook before the process ends; in throw mode, when the unwinding
-// exception destroys the guard. Guards nest: the run holds the outermost, a
+// A guard destroyed by a raised error on its way to the entry point removes
+// the files still registered with it, so a failed run leaves no result that
+// a reader could take for a finished one. Guards nest: the run holds the outermost, a
 // result in progress its own, which hands its files over to the run's once
 // complete.
 #pragma once
@@ -37,8 +35,6 @@ public:
   static CPendingFiles *outermost();
 
 private:
-  static void onError(int32_t theCode);
-
   std::vector<std::string> mFiles;
   CPendingFiles *mEnclosing;
   int mUncaught;

@@ -15,6 +15,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_standard_header.h"
 
 static_assert(sizeof(off_t) >= 8, "raster files need 64-bit offsets");
@@ -58,34 +59,16 @@ const CDescriptionField *presentField(const CDescription &theHeader, const char 
   return aField;
 }
 
-// Whatever the declared value type, the field read as a number; a text that
-// is not a number gives NaN.
-double fieldAsDouble(const CDescriptionField &theField) {
-  switch (theField.getValueType()) {
-  case CTLRX_DS_INTEGER: return theField.getInteger();
-  case CTLRX_DS_DOUBLE: return theField.getDouble();
-  case CTLRX_DS_STRING: {
-    const char *aText = theField.getString();
-    char *aEnd = nullptr;
-    const double aValue = std::strtod(aText, &aEnd);
-    return aEnd == aText ? std::nan("") : aValue;
-  }
-  default: return std::nan("");
-  }
-}
+// "RasterInfo." + theName, read whole by the header accessors: a text that is
+// not a number, or a number a count cannot hold, raises 848642 naming it.
+std::string rasterInfoKey(const char *theName) { return std::string("RasterInfo.") + theName; }
 
 int32_t integerField(const CDescription &theHeader, const char *theName, int32_t theDefault) {
-  const CDescriptionField *aField = presentField(theHeader, theName);
-  if (aField == nullptr)
-    return theDefault;
-  if (aField->getValueType() == CTLRX_DS_INTEGER)
-    return aField->getInteger();
-  return saturateToInt32(fieldAsDouble(*aField));
+  return fdfHeaderIntegerOr(theHeader, rasterInfoKey(theName).c_str(), theDefault);
 }
 
 double doubleField(const CDescription &theHeader, const char *theName, double theDefault) {
-  const CDescriptionField *aField = presentField(theHeader, theName);
-  return aField == nullptr ? theDefault : fieldAsDouble(*aField);
+  return fdfHeaderRealOr(theHeader, rasterInfoKey(theName).c_str(), theDefault);
 }
 
 const char *stringField(const CDescription &theHeader, const char *theName) {
@@ -972,19 +955,31 @@ const uint8_t *CRasterFile::typedLineCells(int32_t theRow, int32_t &theColStart,
                     mNrOfPixelsPerLine);
     TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
   }
-  if (theRow < 0 || theRow >= mNrOfLinesPerImage) {
-    print(" ");
-    fdfTraceMessage("File name : %s\ntheRow : %d\nmNrOfLinesPerImage : %d\n", mFileName.c_str(), theRow,
-                    mNrOfLinesPerImage);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
-  }
-  const int32_t aFileRow = mLinesReversed ? mNrOfLinesPerImage - 1 - theRow : theRow;
+  const int32_t aFileRow = typedFileRow(theRow);
   if (mPixelsReversed) {
     const int32_t aFirst = mNrOfPixelsPerLine - 1 - theColEnd;
     theColEnd = mNrOfPixelsPerLine - 1 - theColStart;
     theColStart = aFirst;
   }
   return static_cast<const uint8_t *>(getLineBuffer(aFileRow, theColStart, theColEnd));
+}
+
+int32_t CRasterFile::typedFileRow(int32_t theRow) const {
+  if (theRow < 0 || theRow >= mNrOfLinesPerImage) {
+    print(" ");
+    fdfTraceMessage("File name : %s\ntheRow : %d\nmNrOfLinesPerImage : %d\n", mFileName.c_str(), theRow,
+                    mNrOfLinesPerImage);
+    TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
+  }
+  return mLinesReversed ? mNrOfLinesPerImage - 1 - theRow : theRow;
+}
+
+void CRasterFile::requireComplexCells() const {
+  if (fdfIsComplexCellType(mCellType))
+    return;
+  fdfTraceMessage("Error: complex line of the raster file %s, whose cells are %s\n", mFileName.c_str(),
+                  fdfCellTypeName(mCellType));
+  TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
 }
 
 void CRasterFile::failUnknownCellType() const {
@@ -994,17 +989,16 @@ void CRasterFile::failUnknownCellType() const {
 
 template void CRasterFile::getLine<float>(float *, int32_t, int32_t, int32_t, bool);
 template void CRasterFile::getLine<double>(double *, int32_t, int32_t, int32_t, bool);
+template void CRasterFile::getComplexLine<float>(std::complex<float> *, int32_t, int32_t, int32_t, uint8_t *);
+template void CRasterFile::getComplexLine<double>(std::complex<double> *, int32_t, int32_t, int32_t, uint8_t *);
+template void CRasterFile::putComplexLine<float>(int32_t, const std::complex<float> *);
+template void CRasterFile::putComplexLine<double>(int32_t, const std::complex<double> *);
 
 void CRasterFile::getValidMask(double *theDest, int32_t *theMask, int32_t theRow, bool theAmplitude) {
   getLine<double>(theDest, theRow, 0, -1, theAmplitude);
-  const bool aNullIsNaN = std::isnan(mDummyVal);
-  const double aLow = mDummyVal - CTLRX_RF_NULL_TOLERANCE;
-  const double aHigh = mDummyVal + CTLRX_RF_NULL_TOLERANCE;
-  for (int32_t i = 0; i < mNrOfPixelsPerLine; ++i) {
-    const double aValue = theDest[i];
-    const bool aNull = (aNullIsNaN && std::isnan(aValue)) || (aValue >= aLow && aValue <= aHigh);
-    theMask[i] = aNull ? 0 : 1;
-  }
+  const SNoData aNoData = getNoData();
+  for (int32_t i = 0; i < mNrOfPixelsPerLine; ++i)
+    theMask[i] = aNoData.isNull(theDest[i]) ? 0 : 1;
 }
 
 // ----------------------------------------------------------------- printing

@@ -2,7 +2,8 @@
 // per image line, described by the raster's XML header. Opens in read, write
 // or update mode, positions with 64-bit offsets, reads and writes blocks of
 // records with byte swapping, keeps an optional line cache and converts cells
-// to float or double with the raster's no-data value and scale factors.
+// to float, double or complex values with the raster's no-data value and
+// scale factors.
 //
 // File layout: HeaderOffset bytes, then NrOfLinesPerImage records of
 // RowPrefix bytes + the cells + RowSuffix bytes, then FooterLen bytes. The
@@ -10,12 +11,14 @@
 #pragma once
 
 #include <cstdint>
+#include <complex>
 #include <cstdio>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include "tlrx_cell_types.h"
+#include "tlrx_no_data.h"
 
 class CDescription;
 
@@ -37,10 +40,6 @@ constexpr int32_t CTLRX_ERR_RF_USAGE = 261121; // 4, 0 mode misuse, missing name
 constexpr int32_t CTLRX_ERR_RF_OPEN = 261122;  // 4, 1 data file (or its header) cannot be opened for reading
 constexpr int32_t CTLRX_ERR_RF_WRITE = 261124; // 4, 3 write-side failures, failed initial positioning
 constexpr int32_t CTLRX_ERR_RF_READ = 261125;  // 4, 4 read-side failures, short files, unknown cell type
-
-// Half-width of the no-data interval: v is no data when D - tol <= v <= D + tol
-// (or when v and D are both NaN).
-constexpr double CTLRX_RF_NULL_TOLERANCE = 1.1754943508222875e-38;
 
 // Layout of a raster as its header gives it, or as a caller sets it before
 // opening a file for writing.
@@ -150,6 +149,22 @@ public:
   // The whole line as double, and theMask 0 for no-data cells, 1 elsewhere.
   void getValidMask(double *theDest, int32_t *theMask, int32_t theRow, bool theAmplitude = false);
 
+  // Complex cell types only (261121 otherwise), T float or double, in the
+  // caller's line and pixel order; the file's byte order and scale factors
+  // are applied here. Reading: columns theColStart..theColEnd (below 0: the
+  // last), each part times its scale factor; a no-data cell (both parts no
+  // data as stored) gives (D, D) and, when theValid is given, 0 there and 1
+  // elsewhere. Writing (write or update mode): one whole line; a value that
+  // is no data (both parts) is stored as D in both parts, other parts are
+  // divided by their scale factor, rounded to the nearest integer and
+  // saturated for integer parts (NaN as 0). Columns or line outside the
+  // image raise 261121.
+  template <typename T>
+  void getComplexLine(std::complex<T> *theDest, int32_t theRow, int32_t theColStart = 0, int32_t theColEnd = -1,
+                      uint8_t *theValid = nullptr);
+  template <typename T>
+  void putComplexLine(int32_t theRow, const std::complex<T> *theSource);
+
   int32_t getNrOfPixelsPerLine() const { return mNrOfPixelsPerLine; }
   int32_t getNrOfLinesPerImage() const { return mNrOfLinesPerImage; }
   int32_t getCellType() const { return mCellType; }
@@ -157,6 +172,7 @@ public:
   int32_t getRasterStatus() const { return mRasterStatus; }
   int32_t getDataNbr() const { return mDataNbr; }
   double getDummyVal() const { return mDummyVal; }
+  SNoData getNoData() const { return SNoData(mDummyVal); }
   const char *getFileName() const { return mFileName.c_str(); }
   int32_t getBytesPerPixel() const { return mBytesPerPixel; }
   int32_t getRecordLen() const { return mRecordLen; }
@@ -209,6 +225,9 @@ private:
 
   // The line's raw cells for typed access (mode and range checked).
   const uint8_t *typedLineCells(int32_t theRow, int32_t &theColStart, int32_t &theColEnd);
+  // File line of the caller's line theRow for typed access (261121 outside).
+  int32_t typedFileRow(int32_t theRow) const;
+  void requireComplexCells() const;
   [[noreturn]] void failUnknownCellType() const;
 
   std::string mFileName;

@@ -12,6 +12,7 @@
 #include "tlrx_envi_util.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_header_numbers.h"
 
 #include <strings.h>
 
@@ -67,36 +68,25 @@ const SProjection *findProjection(const char *theState) {
   return nullptr;
 }
 
-// The fields the map lines read; a missing one raises 261121 naming the ENVI
-// file and the key.
+// The fields the map lines read; a missing or unusable one raises 261121
+// naming the ENVI file and the key.
 class CMapFields {
 public:
-  CMapFields(const CDescription &theHeader, const char *theEnviFile) : mHeader(theHeader), mEnviFile(theEnviFile) {}
+  CMapFields(const CDescription &theHeader, const char *theEnviFile)
+      : mHeader(theHeader), mEnviFile(theEnviFile), mReader{CTLRX_ERR_ENVI_WRITE, theEnviFile} {}
 
-  double number(const char *theKey) const {
-    double aValue = 0.0;
-    if (!fdfEnviFieldNumber(mHeader, theKey, aValue) || std::isnan(aValue))
-      fail(theKey, "holds no value");
-    return aValue;
-  }
+  double number(const char *theKey) const { return fdfHeaderFiniteReal(mHeader, theKey, mReader); }
   double numberOr(const char *theKey, double theDefault) const {
-    double aValue = 0.0;
-    return fdfEnviFieldNumber(mHeader, theKey, aValue) ? aValue : theDefault;
+    return fdfHeaderHolds(mHeader, theKey) ? number(theKey) : theDefault;
   }
-  // A pixel size: its magnitude, which must not be zero.
-  double spacing(const char *theKey) const {
-    const double aValue = std::fabs(number(theKey));
-    if (aValue == 0.0 || std::isinf(aValue))
-      fail(theKey, "is not a usable pixel spacing");
-    return aValue;
+  SMapRegistration registration() const {
+    SMapRegistration aRegistration;
+    std::string aKey, aProblem;
+    if (!fdfReadMapRegistration(mHeader, aRegistration, aKey, aProblem))
+      fail(aKey.c_str(), aProblem.c_str());
+    return aRegistration;
   }
   const char *text(const char *theKey) const { return fdfEnviFieldText(mHeader, theKey); }
-  const char *requiredText(const char *theKey) const {
-    const char *aText = text(theKey);
-    if (aText == nullptr)
-      fail(theKey, "holds no value");
-    return aText;
-  }
   [[noreturn]] void fail(const char *theKey, const char *theWhat) const {
     TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: %s %s", mEnviFile, theKey, theWhat);
   }
@@ -104,25 +94,28 @@ public:
 private:
   const CDescription &mHeader;
   const char *mEnviFile;
+  SHeaderReader mReader;
 };
 
 // Upper-left corner and pixel sizes: ", E, N, sx, sy".
 std::string cornerAndSpacings(const CMapFields &theFields) {
+  const SMapRegistration aRegistration = theFields.registration();
   std::string aText;
-  aText.append(", ").append(fdfEnviDouble(theFields.number("RegistrationCoordinates.LonEasting")));
-  aText.append(", ").append(fdfEnviDouble(theFields.number("RegistrationCoordinates.LatNorthing")));
-  aText.append(", ").append(fdfEnviDouble(theFields.spacing("RegistrationCoordinates.PixelSpacingLonEast")));
-  aText.append(", ").append(fdfEnviDouble(theFields.spacing("RegistrationCoordinates.PixelSpacingLatNorth")));
+  aText.append(", ").append(fdfEnviDouble(aRegistration.mEasting));
+  aText.append(", ").append(fdfEnviDouble(aRegistration.mNorthing));
+  aText.append(", ").append(fdfEnviDouble(std::fabs(aRegistration.mEastSpacing)));
+  aText.append(", ").append(fdfEnviDouble(std::fabs(aRegistration.mNorthSpacing)));
   return aText;
 }
 
-void appendUtm(const CMapFields &theFields, std::string &theOut) {
-  const double aZone = theFields.number("CartographicSystem.Zone");
-  if (aZone < 1.0 || aZone > 60.0 || aZone != std::floor(aZone))
-    theFields.fail("CartographicSystem.Zone", "is not a UTM zone (1 to 60)");
-  const bool aNorth = strcasecmp(theFields.requiredText("CartographicSystem.Hemisphere"), "NORTH") == 0;
+void appendUtm(const CMapFields &theFields, const CDescription &theHeader, std::string &theOut) {
+  int32_t aZone = 0;
+  bool aNorth = false;
+  std::string aKey, aProblem;
+  if (!fdfReadUtmZone(theHeader, aZone, aNorth, aKey, aProblem))
+    theFields.fail(aKey.c_str(), aProblem.c_str());
   theOut.append("map info = {UTM, 1, 1").append(cornerAndSpacings(theFields));
-  theOut.append(",\n ").append(std::to_string(static_cast<int>(aZone)));
+  theOut.append(",\n ").append(std::to_string(aZone));
   theOut.append(aNorth ? ", North" : ", South").append(", WGS-84, units=Meters }\n");
 }
 
@@ -174,9 +167,11 @@ bool fdfHasEnviMapPosition(const CDescription &theHeader) {
 
 bool fdfAppendEnviMapInfo(const CDescription &theHeader, const char *theEnviFile, std::string &theOut) {
   const CMapFields aFields(theHeader, theEnviFile);
-  const char *aState = aFields.requiredText("CartographicSystem.State");
+  const char *aState = aFields.text("CartographicSystem.State");
+  if (aState == nullptr)
+    aFields.fail("CartographicSystem.State", "holds no value");
   if (strcasecmp(aState, "UTM-GLOBAL") == 0) {
-    appendUtm(aFields, theOut);
+    appendUtm(aFields, theHeader, theOut);
     return true;
   }
   if (strcasecmp(aState, "GEO-GLOBAL") == 0) {

@@ -9,6 +9,12 @@
 
 class CDescription;
 
+// UTM zone ("CartographicSystem.Zone", 1 to 60) and hemisphere
+// ("CartographicSystem.Hemisphere", "NORTH" in any letter case is north,
+// another text south); false like fdfReadMapRegistration.
+bool fdfReadUtmZone(const CDescription &theHeader, int32_t &theZone, bool &theNorth, std::string &theKey,
+                    std::string &theProblem);
+
 // ENVI projection code of a named cartographic state ("LAMBERT", "MERCATOR",
 // ...; compared ignoring case); -1 for a name outside the table. "UTM-GLOBAL"
 // and "GEO-GLOBAL" are not named projections and give -1 too.

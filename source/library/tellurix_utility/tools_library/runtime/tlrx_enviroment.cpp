@@ -371,7 +371,6 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   theTracing = false;
   if (theFullSet)
     fdfInstallInterruptionHandlers();
-  fdfSetReportAndExit(true);
   fdfReserveStdDescriptors();
   fdfSetBanner(theBanner);
   fdfInstallAllocationFailureHandler();
@@ -433,7 +432,7 @@ void fdfStartProcess(const char *const *theArgv, int theArgc, const char *theNam
 }
 
 void fdfEndBanner() {
-  fdfStarsLine(true, true, "\n%s\nEND : %s  -  %s%s\n\n", theStars.c_str(), theBanner.c_str(), fdfGetAscTime().c_str(),
+  fdfStarsLine(true, true, "\n%s\nEND : %s  -  %s\n%s\n\n", theStars.c_str(), theBanner.c_str(), fdfGetAscTime().c_str(),
                theStars.c_str());
 }
 
@@ -540,7 +539,7 @@ void getAndSetPerc(int thePrevious, int theNew, const char *theText) {
   std::fclose(aFile);
 }
 
-void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
+int32_t fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   std::string aDir;
   fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR");
   if (theFinalText) {
@@ -576,10 +575,10 @@ void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
     if (std::rename(aLog.c_str(), aAside.c_str()) != 0)
       fdfTraceMessage("fdfEndProcess - cannot move %s aside : %s\n", aLog.c_str(), std::strerror(errno));
   }
-  if (fdfGetWarningCount() > 0)
-    fdfExitProcess(CTLRX_WARNING_STATUS);
+  // A run that failed after warnings ends as the failure it is.
   if (theCode != 0)
-    fdfExitProcess(theCode);
+    return theCode;
+  return fdfGetWarningCount() > 0 ? CTLRX_WARNING_STATUS : 0;
 }
 
 void fdfAddDeferredDeletion(const char *theFileName) { theDeferredDeletions.emplace_back(theFileName); }

@@ -11,8 +11,8 @@ constexpr long CTLRX_MAX_LOG_SIZE = 1000000;
 constexpr int CTLRX_CONFIGURATION_LINES = 14;
 constexpr int CTLRX_MAX_LEN_CONFIGURATION_LINE = 511;
 
-// Start-up: settings, catalogues, trace and log. Returns false only when
-// report-and-exit is off and a step failed without raising.
+// Start-up: settings, catalogues, trace and log. Failures raise; returns
+// true.
 bool fdfInitEnvironment(bool theFullSet, const char *theBanner);
 
 // Settings table. Reading reports whether the name was found.
@@ -67,8 +67,10 @@ void fdfCheckInterruption();
 // for an interruption (a value above 100 in the first line) or a signal did.
 void getAndSetPerc(int thePrevious, int theNew, const char *theText = nullptr);
 
-// Closing step of every run; ends the process after warnings or on error.
-void fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText);
+// Closing step of every run: texts, END banner, trace copy, working file,
+// log rotation. Returns the run's final code: theCode when it failed, else
+// the warning status after warnings, else 0.
+int32_t fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText);
 
 // Files removed by a separate process when this one exits.
 void fdfAddDeferredDeletion(const char *theFileName);

@@ -20,10 +20,8 @@ constexpr const char *CTLRX_INIT_ERROR_TEXT = "AN ERROR OCCUR DURING Tellurix IN
 constexpr const char *CTLRX_WRONG_CODE_TEXT = "GENERIC ERROR WRONG CODE";
 constexpr int CTLRX_ERROR_FILE_CHARS = CTLRX_MAX_LEN_IN_ERROR * CTLRX_MAX_LINE_IN_ERROR;
 
-bool theReportAndExit = false;
 int32_t theWarningCount = 0;
-int theRaiseDepth = 0;
-TLRXErrorHook theErrorHook = nullptr;
+bool theReporting = false;
 
 void fdfCopyText(char *theOut, size_t theSize, const char *theText) {
   std::snprintf(theOut, theSize, "%s", theText != nullptr ? theText : "");
@@ -181,39 +179,43 @@ CErrorExceptionManager::CErrorExceptionManager(int32_t theCode, int32_t theLine,
   fdfLookupErrorTexts(fdfErrorCatalogue(), theCode, mPrimaryText, mSecondaryText);
 }
 
-void fdfSetReportAndExit(bool theOn) { theReportAndExit = theOn; }
-bool fdfIsReportAndExit() { return theReportAndExit; }
 int32_t fdfGetWarningCount() { return theWarningCount; }
 void fdfResetWarningCount() { theWarningCount = 0; }
-void fdfSetErrorHook(TLRXErrorHook theHook) { theErrorHook = theHook; }
 
 void fdfRaiseError(int32_t theCode, const char *theMessage, const char *theFile, int theLine) {
-  if (!theReportAndExit)
-    throw CErrorExceptionManager(theCode, theLine, theFile, fdfGetProcessName(), theMessage);
   const int aErrno = errno;
   // A failure while an error is being reported must not report again.
-  if (++theRaiseDepth > 1)
+  if (theReporting)
     fdfExitProcess(theCode);
+  CErrorExceptionManager aError(theCode, theLine, theFile, fdfGetProcessName(), theMessage);
+  aError.mErrno = aErrno;
+  throw aError;
+}
+
+int fdfReportError(const CErrorExceptionManager &theError) {
+  const int32_t aCode = theError.mCode;
+  if (theReporting || !fdfEnvironmentExists())
+    return fdfExitStatus(aCode);
+  theReporting = true;
   char aPrimary[CTLRX_MAX_LEN_ERROR_TEXT];
   char aSecondary[CTLRX_MAX_LEN_ERROR_TEXT];
-  fdfLookupErrorTexts(fdfErrorCatalogue(), theCode, aPrimary, aSecondary);
-  if (!fdfEnvironmentExists())
-    fdfExitProcess(theCode);
-  const char *aMessage = theMessage != nullptr ? theMessage : "";
-  if (theCode == 0)
+  fdfLookupErrorTexts(fdfErrorCatalogue(), aCode, aPrimary, aSecondary);
+  const char *aMessage = theError.mMessage;
+  if (aCode == 0)
     fdfRemoveFile(fdfGetWorkingFilePath().c_str());
   else
-    fdfWriteErrorFile(theCode, aMessage, static_cast<const char *>(nullptr));
+    fdfWriteErrorFile(aCode, aMessage, static_cast<const char *>(nullptr));
   fdfTraceMessage("\nERROR : %s [%s] (%s) \n %s   %s\n    FILE=%s   LINE=%d  (errno = %d)", aPrimary, aSecondary,
-                  aMessage, fdfGetProcessName(), fdfGetBanner(), theFile, theLine, aErrno);
-  if (theCode != 0)
-    fdfLogMessage("\n\n%s [ERROR ID : %d]\n  %s [%s]\n  %s \n\n", fdfGetBanner(), theCode, aPrimary, aSecondary,
+                  aMessage, theError.mContext, fdfGetBanner(), theError.mFile, theError.mLine, theError.mErrno);
+  if (aCode != 0)
+    fdfLogMessage("\n\n%s [ERROR ID : %d]\n  %s [%s]\n  %s \n\n", fdfGetBanner(), aCode, aPrimary, aSecondary,
                   aMessage);
   else
     fdfLogMessage("\n\nSUCCESSFULL\n\n\n");
-  fdfEndProcess(theCode, true, true);
+  const int32_t aFinal = fdfEndProcess(aCode, true, true);
   fdfDeleteEnvironment();
-  fdfExitProcess(theCode);
+  theReporting = false;
+  return fdfExitStatus(aFinal);
 }
 
 void fdfRaiseErrorF(int32_t theCode, const char *theFile, int theLine, const char *theFormat, ...) {
@@ -359,8 +361,6 @@ bool fdfWriteWorkingStatus(int32_t theCode, const std::string &theBlock) {
 } // namespace
 
 bool fdfWriteErrorFile(int32_t theCode, ...) {
-  if (theErrorHook != nullptr)
-    theErrorHook(theCode);
   std::vector<const char *> aMessages;
   va_list aArgs;
   va_start(aArgs, theCode);

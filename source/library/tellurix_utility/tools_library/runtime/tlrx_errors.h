@@ -59,7 +59,8 @@ void fdfLookupErrorTexts(const CErrorCatalogue &theCatalogue, int32_t theCode, c
 void fdfErrorFilePrimaryText(const CErrorCatalogue &theCatalogue, int32_t theCode, char *theOut);
 void fdfErrorFileSecondaryText(const CErrorCatalogue &theCatalogue, int32_t theCode, char *theOut);
 
-// Thrown by value where report-and-exit is off (library use and unit tests).
+// The one error of the program: every raise throws it by value; the entry
+// point reports it (fdfReportError), library callers and tests catch it.
 class CErrorExceptionManager {
 public:
   char mContext[CTLRX_MAX_LEN_CONTEXT];
@@ -71,18 +72,20 @@ public:
   char mPrimaryText[CTLRX_MAX_LEN_ERROR_TEXT];
   char mSecondaryText[CTLRX_MAX_LEN_ERROR_TEXT];
   char mMessage[CTLRX_MAX_LEN_MESSAGE];
+  int mErrno = 0; // errno when it was raised, for the trace
 
   CErrorExceptionManager(int32_t theCode, int32_t theLine, const char *theFile, const char *theContext,
                          const char *theMessage);
 };
 
-// Report-and-exit switch: on from start-up; off (throwing) for library callers.
-void fdfSetReportAndExit(bool theOn);
-bool fdfIsReportAndExit();
-
-// Raises an error: throws CErrorExceptionManager when report-and-exit is off,
-// otherwise writes every report and ends the process.
+// Raises an error: throws CErrorExceptionManager with the code, the message,
+// the source file and line and the current process name. A raise while an
+// error is being reported ends the process at once.
 [[noreturn]] void fdfRaiseError(int32_t theCode, const char *theMessage, const char *theFile, int theLine);
+// Reports an error that reached the entry point: the error file and the
+// working-file status, the trace and log blocks, the closing step with its
+// END banner. Returns the exit status of the run.
+int fdfReportError(const CErrorExceptionManager &theError);
 // The same with a printf-style message, formatted into a bounded buffer.
 [[noreturn]] void fdfRaiseErrorF(int32_t theCode, const char *theFile, int theLine, const char *theFormat, ...)
     __attribute__((format(printf, 4, 5)));
@@ -96,10 +99,6 @@ void fdfResetWarningCount();
 // Writes the error file and the error status of the working file; the
 // message list ends with nullptr. Reports whether the last file opened.
 bool fdfWriteErrorFile(int32_t theCode, ...);
-
-// Optional hook called with the code before the error file is written.
-using TLRXErrorHook = void (*)(int32_t theCode);
-void fdfSetErrorHook(TLRXErrorHook theHook);
 
 #define TLRX_RAISE(theCode, theMessage) fdfRaiseError((theCode), (theMessage), __FILE__, __LINE__)
 #define TLRX_RAISE_F(theCode, ...) fdfRaiseErrorF((theCode), __FILE__, __LINE__, __VA_ARGS__)

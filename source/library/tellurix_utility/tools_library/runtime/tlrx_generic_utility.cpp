@@ -32,12 +32,6 @@ const char *const theStemCompanions[] = {".TellurixParameterExtracted.sml", ".hd
 const char *const theHeaderCompanions[] = {"_hdr.old.hdr", "_hdr.old.sml", "_tmp_hdr.hdr",
                                            "_tmp_hdr.sml", "_hdr_tmp.hdr", "_hdr_tmp.sml"};
 
-struct SDeletionEntry {
-  std::string mName;
-  bool mWithCompanions;
-};
-std::vector<SDeletionEntry> theDeletionList;
-
 bool fdfEndsWith(const std::string &theText, const char *theSuffix) {
   const size_t aLen = std::strlen(theSuffix);
   return theText.size() >= aLen && theText.compare(theText.size() - aLen, aLen, theSuffix) == 0;
@@ -171,25 +165,6 @@ int NTLRX_UTILITY_SpawnDeleteFile(const char *theName) {
   return fdfSpawnDetached(aExe.c_str(), "main_delete_file", theName);
 }
 
-void fdfAddToDeletionList(const char *theName, bool theWithCompanions) {
-  theDeletionList.push_back({theName, theWithCompanions});
-}
-
-void fdfRunDeletionList(bool theExecute) {
-  fdfTraceMessage("NUMBER of file to delete : %d\n", static_cast<int>(theDeletionList.size()));
-  for (size_t i = 0; i < theDeletionList.size(); ++i) {
-    const SDeletionEntry &aEntry = theDeletionList[i];
-    const char *aFlag = aEntry.mWithCompanions ? "true" : "false";
-    if (theExecute) {
-      fdfTraceMessage("%d] deleteFile(%s, %s)\n", static_cast<int>(i), aEntry.mName.c_str(), aFlag);
-      fdfDeleteRaster(aEntry.mName.c_str(), aEntry.mWithCompanions, true);
-    } else {
-      fdfTraceMessage("%d] NO deleteFile(%s, %s)\n", static_cast<int>(i), aEntry.mName.c_str(), aFlag);
-    }
-  }
-  theDeletionList.clear();
-}
-
 namespace {
 
 std::string fdfTrim(const std::string &theLine) {
@@ -308,13 +283,6 @@ std::string fdfIntToText(long theValue) {
   else
     std::snprintf(aText, sizeof aText, "%ld%04ld", theValue / 10000, theValue % 10000);
   return aText;
-}
-
-bool fdfIsNull(double theValue, double theNull) {
-  constexpr double aTolerance = 1.1754943508222875e-38;
-  if (std::isnan(theNull))
-    return std::isnan(theValue);
-  return theNull - aTolerance <= theValue && theValue <= theNull + aTolerance;
 }
 
 bool fdfIsSwitchOn(const std::string &theText) { return theText == "OK"; }

@@ -24,10 +24,6 @@ void fdfAllocationFailure(unsigned long long theSize);
 
 int NTLRX_UTILITY_SpawnDeleteFile(const char *theName);
 
-// Temporary files of a command, removed (or only traced) in one go.
-void fdfAddToDeletionList(const char *theName, bool theWithCompanions);
-void fdfRunDeletionList(bool theExecute);
-
 // Lines of a text file up to the first "#" line; raises 261122 when the file
 // is found neither under its name nor in the working directory.
 std::vector<std::string> fdfReadLineList(const char *theFileName, bool theTrim);
@@ -61,6 +57,4 @@ bool fdfIsRegularFile(const char *theName);
 // lines skipped (a trailing empty line names no file).
 std::vector<std::string> fdfReadNameList(const char *theFileName);
 
-// No-data rule shared by the commands: both NaN, or within FLT_MIN of D.
-bool fdfIsNull(double theValue, double theNull);
 bool fdfIsSwitchOn(const std::string &theText); // exactly "OK"

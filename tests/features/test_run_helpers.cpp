@@ -1,0 +1,66 @@
+// Helpers of the commands: the orders of dated inputs (the temporal command
+// compares day numbers only, min and max the seconds of equal days too) and
+// the setters of result headers.
+#include "tlrx_acquisition_dates.h"
+#include "tlrx_description_test_support.h"
+#include "tlrx_features_common.h"
+
+#include <gtest/gtest.h>
+
+#include <functional>
+
+namespace {
+
+STLRXDate date(long theDay, double theSeconds) {
+  STLRXDate aDate;
+  aDate.mDay = theDay;
+  aDate.mSeconds = theSeconds;
+  return aDate;
+}
+
+} // namespace
+
+// Guards the temporal command's order: it once shared the min-and-max order,
+// which moves an afternoon image before a morning one of the same day.
+TEST(AcquisitionDates, ExchangeSortComparesDaysOrDaysThenSeconds) {
+  const struct {
+    ETLRXDateOrder mOrder;
+    std::vector<std::string> mExpected;
+  } aCases[] = {
+      {ETLRXDateOrder::kDayNumber, {"d1_pm", "d1_am", "d2", "d5"}},
+      {ETLRXDateOrder::kDayThenSeconds, {"d1_am", "d1_pm", "d2", "d5"}},
+  };
+  for (const auto &aCase : aCases) {
+    std::vector<STLRXDate> aDates = {date(5, 0), date(1, 50000), date(2, 10), date(1, 100)};
+    std::vector<std::string> aNames = {"d5", "d1_pm", "d2", "d1_am"};
+    fdfSortByDate(aDates, aNames, aCase.mOrder);
+    EXPECT_EQ(aNames, aCase.mExpected);
+    for (size_t i = 0; i + 1 < aDates.size(); ++i)
+      EXPECT_LE(aDates[i].mDay, aDates[i + 1].mDay);
+  }
+}
+
+// Guards the setters: a key the header does not declare was once skipped,
+// leaving a result header without the value and no word about it.
+TEST(ResultHeaderSetters, AnUndeclaredKeyIsAMissingFieldNamingTheKey) {
+  CTempDir aDir;
+  tlrxStartLibraryEnvironment(aDir.path());
+  CDescription aHeader;
+  tlrxDeclare(aHeader, aDir.path(), "[RasterInfo]\nCellType = S\nLines = I\nNames = VS\n", {"RasterInfo"});
+  const struct {
+    const char *mKey;
+    std::function<void(const char *)> mSet;
+  } aCases[] = {
+      {"RasterInfo.CellType", [&](const char *theKey) { fdfSetHeaderText(aHeader, theKey, "FLOAT"); }},
+      {"RasterInfo.Lines", [&](const char *theKey) { fdfSetHeaderNumber(aHeader, theKey, 12); }},
+      {"RasterInfo.Names", [&](const char *theKey) { fdfSetHeaderList(aHeader, theKey, {"a", "b"}); }},
+  };
+  for (const auto &aCase : aCases) {
+    EXPECT_EQ(tlrxCodeOf([&] { aCase.mSet(aCase.mKey); }), 0) << aCase.mKey;
+    EXPECT_TRUE(aHeader.findField(aCase.mKey)->holdsValue()) << aCase.mKey;
+    std::string aMessage;
+    EXPECT_EQ(tlrxCodeOf([&] { aCase.mSet("RasterInfo.Undeclared"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
+    EXPECT_EQ(aMessage, "RasterInfo.Undeclared");
+  }
+  EXPECT_EQ(tlrxCodeOf([&] { fdfSetHeaderNumber(aHeader, "RasterInfo.Lines", 1e10); }), CTLRX_ERR_DS_TYPE);
+}
