@@ -124,11 +124,11 @@ TEST_F(ParameterFileTest, UnreadableParameterFileRaisesTheParseError) {
   std::string aMessage;
   EXPECT_EQ(
       codeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aBroken.c_str(), aParameters); }, &aMessage),
-      CTLRX_ERR_XML_PARSE);
+      CTLRX_ERR_FILE_PARSE);
   EXPECT_EQ(aMessage, aBroken);
   const std::string aMissing = mDir.file("missing.xml");
   EXPECT_EQ(codeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aMissing.c_str(), aParameters); }),
-            CTLRX_ERR_XML_PARSE);
+            CTLRX_ERR_FILE_PARSE);
 }
 
 TEST_F(ParameterFileTest, SchemaProblemsFailTheInitialisation) {

@@ -264,7 +264,7 @@ TEST_F(SchemaTest, UnparsableSchemaRaisesWithItsPath) {
     tlrxWriteFile(aPath, aText);
     CXmlSchema aSchema;
     std::string aMessage;
-    EXPECT_EQ(codeOf([&] { aSchema.load(nullptr, aPath.c_str()); }, &aMessage), CTLRX_ERR_XML_PARSE) << aText;
+    EXPECT_EQ(codeOf([&] { aSchema.load(nullptr, aPath.c_str()); }, &aMessage), CTLRX_ERR_FILE_PARSE) << aText;
     EXPECT_EQ(aMessage, aPath);
   }
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);

@@ -592,7 +592,7 @@ TEST_F(RasterFileTest, ComplexLinesRefuseRealCellsAndLinesOutside) {
     CRasterFile aFile;
     aFile.open_write(param("c" + std::to_string(aCellType), aCellType, 1, 2));
     const int32_t aRow = aCellType == CTLRX_CELL_FLOAT ? 0 : 1;
-    expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.putComplexLine(aRow, aLine); }, fdfCellTypeName(aCellType));
+    expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.putComplexLine(aRow, aLine); }, fdfCellTypeName(aCellType));
     aFile.close();
   }
 }
@@ -632,7 +632,7 @@ TEST_F(RasterFileTest, ReadCacheServesItsLinesInBothDirections) {
       expectSameValues(aLine, aExpectedLine(aReversed ? 9 - r : r), "cached line " + std::to_string(r));
     }
     // The next line needs a refill, which finds the file short.
-    expectCode(CTLRX_ERR_RF_READ, [&] { aFile.getLine(aLine.data(), 4); }, "refill of a truncated file");
+    expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.getLine(aLine.data(), 4); }, "refill of a truncated file");
   }
   // Without a cache the very next line is read from the file.
   tlrxWriteFile(aParam.mFileName, aImage);
@@ -642,7 +642,7 @@ TEST_F(RasterFileTest, ReadCacheServesItsLinesInBothDirections) {
   std::vector<float> aLine(aCols);
   aFile.getLine(aLine.data(), 0);
   ASSERT_EQ(truncate(aParam.mFileName.c_str(), 0), 0);
-  expectCode(CTLRX_ERR_RF_READ, [&] { aFile.getLine(aLine.data(), 1); });
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.getLine(aLine.data(), 1); });
 }
 
 TEST_F(RasterFileTest, ReadCacheRefillsWhenTheColumnsChange) {
@@ -827,7 +827,7 @@ TEST_F(RasterFileTest, ClosedObjectsCanBeReopened) {
   aFile.getLine(aLine.data(), 1);
   EXPECT_EQ(aLine, (std::vector<float>{3, 4}));
   aFile.close();
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.close(); }, "second close");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.close(); }, "second close");
 }
 
 // ------------------------------------------------------------- clamping
@@ -1058,7 +1058,7 @@ TEST_F(RasterFileTest, SizesOutsideTheLimitAreRefused) {
       CRasterFileParam aParam = param("size.raw", CTLRX_CELL_FLOAT, aSize.first, aSize.second);
       tlrxWriteFile(aParam.mFileName, "keep");
       CRasterFile aFile;
-      expectCode(CTLRX_ERR_RF_USAGE, [&] {
+      expectCode(CTLRX_ERR_FILE_PARSE, [&] {
         if (aMode == CTLRX_RF_OPEN_READ)
           aFile.open_read(aParam);
         else if (aMode == CTLRX_RF_OPEN_WRITE)
@@ -1082,7 +1082,7 @@ TEST_F(RasterFileTest, SizesOutsideTheLimitAreRefused) {
 TEST_F(RasterFileTest, UnknownCellTypesAndNegativeLayoutsAreRefused) {
   for (int32_t aType : {-1, 15, 1000}) {
     CRasterFile aFile;
-    expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_write(param("t.raw", aType, 2, 2)); }, std::to_string(aType));
+    expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_write(param("t.raw", aType, 2, 2)); }, std::to_string(aType));
   }
   CRasterFileParam aParam = param("neg.raw", CTLRX_CELL_FLOAT, 2, 2);
   tlrxWriteFile(aParam.mFileName, std::string(64, '\0'));
@@ -1091,14 +1091,14 @@ TEST_F(RasterFileTest, UnknownCellTypesAndNegativeLayoutsAreRefused) {
     (aField == 0 ? aBad.mHeaderOffset : aField == 1 ? aBad.mRowPrefix : aField == 2 ? aBad.mRowSuffix : aBad.mFooterLen) =
         -4;
     CRasterFile aFile;
-    expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read(aBad); }, "negative field " + std::to_string(aField));
+    expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_read(aBad); }, "negative field " + std::to_string(aField));
   }
   // Records longer than 2^31 - 1 bytes cannot be addressed by the layout.
   CRasterFileParam aLong = aParam;
   aLong.mRowPrefix = 2147483000;
   aLong.mRowSuffix = 1000;
   CRasterFile aLongFile;
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aLongFile.open_write(aLong); }, "record too long");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aLongFile.open_write(aLong); }, "record too long");
   // A header naming a cell type outside the vocabulary.
   CDescription aHeader;
   fdfDeclareStandardHeader(aHeader);
@@ -1106,7 +1106,7 @@ TEST_F(RasterFileTest, UnknownCellTypesAndNegativeLayoutsAreRefused) {
   aHeader.getField("RasterInfo.NrOfPixelsPerLine").setInteger(2);
   aHeader.getField("RasterInfo.CellType").setString("float");
   CRasterFile aFile;
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read(aParam.mFileName.c_str(), aHeader); });
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_read(aParam.mFileName.c_str(), aHeader); });
 }
 
 TEST_F(RasterFileTest, FilesShorterThanTheirHeaderAreNeverReadAsZeros) {
@@ -1128,7 +1128,7 @@ TEST_F(RasterFileTest, FilesShorterThanTheirHeaderAreNeverReadAsZeros) {
     aBad.mRowPrefix = aCase.mPrefix;
     tlrxWriteFile(aBad.mFileName, aFull.substr(0, aCase.mBytes));
     CRasterFile aFile;
-    expectCode(CTLRX_ERR_RF_READ, [&] { aFile.open_read(aBad); },
+    expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.open_read(aBad); },
                "header " + std::to_string(aCase.mHeader) + " prefix " + std::to_string(aCase.mPrefix));
     EXPECT_EQ(aFile.getRasterStatus(), CTLRX_RF_CLOSE);
   }
@@ -1138,28 +1138,28 @@ TEST_F(RasterFileTest, FilesShorterThanTheirHeaderAreNeverReadAsZeros) {
   aFile.open_read(aParam);
   ASSERT_EQ(truncate(aParam.mFileName.c_str(), 40), 0);
   std::vector<float> aBlock(16, -5.0f);
-  expectCode(CTLRX_ERR_RF_READ, [&] { aFile.readRecords(0, 4, 0, 3, aBlock.data()); });
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.readRecords(0, 4, 0, 3, aBlock.data()); });
   std::vector<float> aLine(4);
   aFile.getLine(aLine.data(), 1); // lines still in the file read normally
-  expectCode(CTLRX_ERR_RF_READ, [&] { aFile.getLine(aLine.data(), 3); });
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.getLine(aLine.data(), 3); });
   // Update mode on a file shorter than the image: reading a missing line fails.
   aFile.close();
   aFile.open_read_write(aParam);
-  expectCode(CTLRX_ERR_RF_READ, [&] { aFile.getLine(aLine.data(), 3); });
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aFile.getLine(aLine.data(), 3); });
 }
 
 TEST_F(RasterFileTest, MissingFilesAndUnwritableFolders) {
   CRasterFile aFile;
-  expectCode(CTLRX_ERR_RF_OPEN, [&] { aFile.open_read(param("absent.raw", CTLRX_CELL_FLOAT, 2, 2)); });
-  expectCode(CTLRX_ERR_RF_OPEN, [&] { aFile.open_read(mDir.file("absent.raw").c_str()); }, "no header");
+  expectCode(CTLRX_ERR_FILE_OPEN, [&] { aFile.open_read(param("absent.raw", CTLRX_CELL_FLOAT, 2, 2)); });
+  expectCode(CTLRX_ERR_FILE_OPEN, [&] { aFile.open_read(mDir.file("absent.raw").c_str()); }, "no header");
   CRasterFileParam aDirectory = param("", CTLRX_CELL_FLOAT, 1, 1);
   aDirectory.mFileName = mDir.path();
-  expectCode(CTLRX_ERR_RF_OPEN, [&] { aFile.open_read(aDirectory); }, "a folder");
+  expectCode(CTLRX_ERR_FILE_OPEN, [&] { aFile.open_read(aDirectory); }, "a folder");
   const std::string aMissingFolder = mDir.file("no/such/folder/out.raw");
   for (bool aUpdate : {false, true}) {
     CRasterFileParam aParam = param("", CTLRX_CELL_FLOAT, 2, 2);
     aParam.mFileName = aMissingFolder;
-    expectCode(CTLRX_ERR_RF_WRITE, [&] { aUpdate ? aFile.open_read_write(aParam) : aFile.open_write(aParam); });
+    expectCode(CTLRX_ERR_FILE_WRITE, [&] { aUpdate ? aFile.open_read_write(aParam) : aFile.open_write(aParam); });
     EXPECT_EQ(aFile.getRasterStatus(), CTLRX_RF_CLOSE);
   }
   // A folder that refuses new files (permissions for ordinary users; /proc
@@ -1168,14 +1168,14 @@ TEST_F(RasterFileTest, MissingFilesAndUnwritableFolders) {
   ASSERT_EQ(mkdir(aLocked.c_str(), 0555), 0);
   CRasterFileParam aParam = param("", CTLRX_CELL_FLOAT, 2, 2);
   aParam.mFileName = geteuid() == 0 ? std::string("/proc/tlrx_raster_test.raw") : aLocked + "/out.raw";
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aFile.open_write(aParam); }, aParam.mFileName);
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aFile.open_read_write(aParam); }, aParam.mFileName);
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aFile.open_write(aParam); }, aParam.mFileName);
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aFile.open_read_write(aParam); }, aParam.mFileName);
   chmod(aLocked.c_str(), 0755);
   // Writing needs a name.
   CRasterFileParam aNameless = param("", CTLRX_CELL_FLOAT, 2, 2);
   aNameless.mFileName.clear();
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_write(aNameless); });
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read_write(aNameless); });
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_write(aNameless); });
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_read_write(aNameless); });
 }
 
 TEST_F(RasterFileTest, ModesRefuseWhatTheyDoNotAllow) {
@@ -1183,32 +1183,32 @@ TEST_F(RasterFileTest, ModesRefuseWhatTheyDoNotAllow) {
   tlrxWriteFile(aParam.mFileName, std::string(24, '\0'));
   float aCells[6] = {0};
   CRasterFile aClosed;
-  expectCode(CTLRX_ERR_RF_READ, [&] { aClosed.readRecords(0, 1, 0, 2, aCells); }, "read when closed");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aClosed.writeRecords(0, 1, aCells); }, "write when closed");
-  expectCode(CTLRX_ERR_RF_READ, [&] { aClosed.getLineBuffer(0); }, "line buffer when closed");
-  expectCode(CTLRX_ERR_RF_READ, [&] { aClosed.getLine(aCells, 0); }, "getLine when closed");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aClosed.putLine(0); }, "putLine when closed");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aClosed.readRecords(0, 1, 0, 2, aCells); }, "read when closed");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aClosed.writeRecords(0, 1, aCells); }, "write when closed");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aClosed.getLineBuffer(0); }, "line buffer when closed");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aClosed.getLine(aCells, 0); }, "getLine when closed");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aClosed.putLine(0); }, "putLine when closed");
   EXPECT_FALSE(aClosed.seekLinePosition(0));
 
   CRasterFile aReader;
   aReader.open_read(aParam);
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aReader.writeRecords(0, 1, aCells); }, "write in read mode");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aReader.putLine(0, aCells); }, "putLine in read mode");
-  expectCode(CTLRX_ERR_RF_READ, [&] { aReader.readRecords(0, 0, 0, 2, aCells); }, "no lines");
-  expectCode(CTLRX_ERR_RF_READ, [&] { aReader.readRecords(0, -2, 0, 2, aCells); }, "negative lines");
-  expectCode(CTLRX_ERR_RF_READ, [&] { aReader.readRecords(0, 1, 2, 1, aCells); }, "columns crossed");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aReader.writeRecords(0, 1, aCells); }, "write in read mode");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aReader.putLine(0, aCells); }, "putLine in read mode");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aReader.readRecords(0, 0, 0, 2, aCells); }, "no lines");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aReader.readRecords(0, -2, 0, 2, aCells); }, "negative lines");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aReader.readRecords(0, 1, 2, 1, aCells); }, "columns crossed");
   for (const auto &aColumns : std::vector<std::pair<int, int>>{{2, 1}, {-1, 2}, {0, 3}, {3, 3}})
-    expectCode(CTLRX_ERR_RF_USAGE, [&] { aReader.getLine(aCells, 0, aColumns.first, aColumns.second); },
+    expectCode(CTLRX_ERR_FILE_PARSE, [&] { aReader.getLine(aCells, 0, aColumns.first, aColumns.second); },
                "getLine columns " + std::to_string(aColumns.first) + ".." + std::to_string(aColumns.second));
   for (int aRow : {-1, 2})
-    expectCode(CTLRX_ERR_RF_USAGE, [&] { aReader.getLine(aCells, aRow); }, "getLine row " + std::to_string(aRow));
+    expectCode(CTLRX_ERR_FILE_PARSE, [&] { aReader.getLine(aCells, aRow); }, "getLine row " + std::to_string(aRow));
 
   CRasterFileParam aOut = param("modes_out.raw", CTLRX_CELL_FLOAT, 2, 3);
   CRasterFile aWriter;
   aWriter.open_write(aOut);
   startTrace();
-  expectCode(CTLRX_ERR_RF_READ, [&] { aWriter.readRecords(0, 1, 0, 2, aCells); }, "read in write mode");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aReader.writeRecords(0, 1, aCells); }, "write in read mode");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aWriter.readRecords(0, 1, 0, 2, aCells); }, "read in write mode");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aReader.writeRecords(0, 1, aCells); }, "write in read mode");
   const std::string aTrace = traceText();
   EXPECT_NE(aTrace.find("Error: attempting to read from the raster file " + aOut.mFileName +
                         " while it was open in write mode\n"),
@@ -1216,9 +1216,9 @@ TEST_F(RasterFileTest, ModesRefuseWhatTheyDoNotAllow) {
   EXPECT_NE(aTrace.find("Error: attempting to write to the raster file " + aParam.mFileName +
                         " while it was open in read mode\n"),
             std::string::npos);
-  expectCode(CTLRX_ERR_RF_READ, [&] { aWriter.getLine(aCells, 0); }, "getLine in write mode");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aWriter.writeRecords(0, 0, aCells); }, "no lines");
-  expectCode(CTLRX_ERR_RF_WRITE, [&] { aWriter.writeRecords(0, 1, aCells, 2, 1); }, "columns crossed");
+  expectCode(CTLRX_ERR_FILE_READ, [&] { aWriter.getLine(aCells, 0); }, "getLine in write mode");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aWriter.writeRecords(0, 0, aCells); }, "no lines");
+  expectCode(CTLRX_ERR_FILE_WRITE, [&] { aWriter.writeRecords(0, 1, aCells, 2, 1); }, "columns crossed");
   aWriter.writeRecords(0, 2, aCells);
   aWriter.close();
 }
@@ -1230,10 +1230,10 @@ TEST_F(RasterFileTest, OpeningAnOpenObjectIsRefusedForEveryMode) {
   aFile.open_read(aParam);
   startTrace();
   CRasterFileParam aOther = param("other.raw", CTLRX_CELL_FLOAT, 2, 3);
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_write(aOther); }, "write");
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read_write(aOther); }, "update");
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_read(aParam); }, "read");
-  expectCode(CTLRX_ERR_RF_USAGE, [&] { aFile.open_write(aOther.mFileName.c_str()); }, "write by name");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_write(aOther); }, "write");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_read_write(aOther); }, "update");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_read(aParam); }, "read");
+  expectCode(CTLRX_ERR_FILE_PARSE, [&] { aFile.open_write(aOther.mFileName.c_str()); }, "write by name");
   const std::string aTrace = traceText();
   EXPECT_NE(aTrace.find("Error: attempting to open the raster file " + aOther.mFileName +
                         " in input mode while it was not closed\n"),

@@ -3,7 +3,7 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_geotiff_codes.h"
+#include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_platform.h"
 

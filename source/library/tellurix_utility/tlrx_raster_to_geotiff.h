@@ -18,7 +18,7 @@
 
 #include <cstdint>
 
-#include "tlrx_geotiff_codes.h"
+#include "tlrx_errors.h"
 
 // Positions in the argument vector of make_tiff.
 constexpr int CTLRXGC_INPUT_POS = 1;

@@ -54,7 +54,7 @@ std::vector<std::string> fdfCorrelationArguments(const std::vector<std::string> 
 int32_t fdfRunCorrelation(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Correlation");
   if (aTokens.size() < CTLRX_CORR_TOKENS)
-    return 456962;
+    return CTLRX_ERR_ARGUMENTS;
   fdfTraceTokens(aTokens, CTLRX_CORR_TOKENS);
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_CORR_TIFF]);
   if (aTiff) // a bad saturation stops the run before anything is computed
@@ -65,7 +65,7 @@ int32_t fdfRunCorrelation(const char *theArguments) {
   aFiles.addInput(aTokens[CTLRX_CORR_INPUT2]);
   aFiles.addResult(aTokens[CTLRX_CORR_ROOT] + theNormSuffix, false);
   aFiles.addResult(aTokens[CTLRX_CORR_ROOT], aTiff);
-  aFiles.refuseClashes(456962);
+  aFiles.refuseClashes(CTLRX_ERR_ARGUMENTS);
   CStepRunner aRunner(fdfCorrelationSteps(fdfIsSwitchOn(aTokens[CTLRX_CORR_CLOSE])), "INT");
   std::vector<int> aPlan = {CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP};
   if (aTiff)

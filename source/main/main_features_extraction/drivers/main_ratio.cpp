@@ -27,7 +27,7 @@ int32_t fdfRunRatio(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Ratio");
   CStepRunner aRunner(theRatioSteps, "RATIO");
   if (aTokens.size() < CTLRX_RATIO_TOKENS)
-    return 456962;
+    return CTLRX_ERR_ARGUMENTS;
   fdfTraceTokens(aTokens, CTLRX_RATIO_TOKENS);
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_RATIO_TIFF]);
   // Bad numbers stop the run before any result is written.
@@ -39,7 +39,7 @@ int32_t fdfRunRatio(const char *theArguments) {
   // Nothing to compute is not a success the host could mistake for results.
   if (aFiles.size() < 2) {
     fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aFiles.size()));
-    TLRX_RAISE(456962, aTokens[CTLRX_RATIO_LIST].c_str());
+    TLRX_RAISE(CTLRX_ERR_ARGUMENTS, aTokens[CTLRX_RATIO_LIST].c_str());
   }
   CRunFiles aRunFiles;
   aRunFiles.addRead(theArguments);
@@ -49,7 +49,7 @@ int32_t fdfRunRatio(const char *theArguments) {
     if (k + 1 < aFiles.size())
       aRunFiles.addResult(fdfRatioPairName(aTokens[CTLRX_RATIO_ROOT], static_cast<int>(k), aFiles.size()), aTiff);
   }
-  aRunFiles.refuseClashes(456962);
+  aRunFiles.refuseClashes(CTLRX_ERR_ARGUMENTS);
   int aPair = -1;
   return aRunner.run(fdfRatioPlan(aFiles.size(), aTiff), [&](int, int theStep) -> std::vector<std::string> {
     if (theStep == 0) {

@@ -85,7 +85,7 @@ void fdfMakeDateHeader(CDescription &theHeader, const std::vector<STLRXDate> &th
 int32_t fdfRunMinMax(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Min and Max");
   if (aTokens.size() < CTLRX_MINMAX_TOKENS)
-    TLRX_RAISE(456962, fdfJoin(aTokens).c_str());
+    TLRX_RAISE(CTLRX_ERR_ARGUMENTS, fdfJoin(aTokens).c_str());
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_MINMAX_TIFF]);
   // A bad saturation stops the run before any result is written.
   const double aSaturation =
@@ -93,7 +93,7 @@ int32_t fdfRunMinMax(const char *theArguments) {
   std::vector<std::string> aNames = fdfReadNameList(aTokens[CTLRX_MINMAX_LIST].c_str());
   if (aNames.size() < 2) {
     fdfTraceMessage("aNumberOfFiles = %d\n", static_cast<int>(aNames.size()));
-    TLRX_RAISE(456962, aTokens[CTLRX_MINMAX_LIST].c_str());
+    TLRX_RAISE(CTLRX_ERR_ARGUMENTS, aTokens[CTLRX_MINMAX_LIST].c_str());
   }
   const int32_t aInputs = static_cast<int32_t>(aNames.size());
   const int32_t aBuffer = 4000 / (aInputs + 4);
@@ -113,7 +113,7 @@ int32_t fdfRunMinMax(const char *theArguments) {
   }
   for (const std::string &aName : aNames)
     aFiles.addInput(aName);
-  aFiles.refuseClashes(456962);
+  aFiles.refuseClashes(CTLRX_ERR_ARGUMENTS);
   fdfMakeValueHeader(aValueHeader);
   CDescription aDateHeader;
   fdfDeclareStandardHeader(aDateHeader);
@@ -129,9 +129,9 @@ int32_t fdfRunMinMax(const char *theArguments) {
     aIn[i]->setBuffer(aBuffer);
     aNulls.push_back(aIn[i]->getDummyVal());
     if (aIn[i]->getNrOfLinesPerImage() != aIn[0]->getNrOfLinesPerImage())
-      TLRX_RAISE(652803, aNames[i].c_str());
+      TLRX_RAISE(CTLRX_ERR_LINES_DIFFER, aNames[i].c_str());
     if (aIn[i]->getNrOfPixelsPerLine() != aIn[0]->getNrOfPixelsPerLine())
-      TLRX_RAISE(652802, aNames[i].c_str());
+      TLRX_RAISE(CTLRX_ERR_PIXELS_DIFFER, aNames[i].c_str());
   }
   const int32_t aLines = aIn[0]->getNrOfLinesPerImage();
   const int32_t aPixels = aIn[0]->getNrOfPixelsPerLine();
@@ -159,7 +159,7 @@ int32_t fdfRunMinMax(const char *theArguments) {
   for (auto &aRaster : aIn)
     aRaster->close();
   for (int k = 0; k < 4; ++k)
-    aOut[k]->commit(*aHeaders[k], 261124);
+    aOut[k]->commit(*aHeaders[k], CTLRX_ERR_FILE_WRITE);
 
   if (aTiff)
     for (const std::string &aResult : aResults) {

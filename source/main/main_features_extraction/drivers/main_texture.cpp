@@ -32,7 +32,7 @@ int32_t fdfRunTexture(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Texture");
   CStepRunner aRunner(theTextureSteps, "TEXTURE");
   if (aTokens.size() < CTLRX_TEXTURE_TOKENS)
-    return 456962;
+    return CTLRX_ERR_ARGUMENTS;
   fdfTraceTokens(aTokens, CTLRX_TEXTURE_TOKENS);
   const bool aTiff = fdfIsSwitchOn(aTokens[CTLRX_TEXTURE_TIFF]);
   if (aTiff) // a bad saturation stops the run before the texture is computed
@@ -41,7 +41,7 @@ int32_t fdfRunTexture(const char *theArguments) {
   aFiles.addRead(theArguments);
   aFiles.addInput(aTokens[CTLRX_TEXTURE_INPUT]);
   aFiles.addResult(aTokens[CTLRX_TEXTURE_OUTPUT], aTiff);
-  aFiles.refuseClashes(456962);
+  aFiles.refuseClashes(CTLRX_ERR_ARGUMENTS);
   std::vector<int> aPlan = {CTLRX_TEXTURE_STEP};
   if (aTiff)
     aPlan.push_back(CTLRX_TEXTURE_TIFF_STEP);

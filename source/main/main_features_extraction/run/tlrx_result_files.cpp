@@ -62,7 +62,7 @@ CResultRaster::CResultRaster(const std::string &theName, const CDescription &the
   // Found now rather than when the finished raster cannot be moved there.
   if (fdfIsDirectory(mName)) {
     fdfTraceMessage("Error: cannot open the file: %s  (a directory)\n", mName.c_str());
-    TLRX_RAISE(CTLRX_ERR_RF_WRITE, mName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mName.c_str());
   }
   fdfRemoveStaleTemporaries(mName, CTLRX_PART_TAG, 0);
   mPending.addFile(mTemporary);

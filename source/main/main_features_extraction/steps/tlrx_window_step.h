@@ -14,6 +14,7 @@
 #include <memory>
 #include <string>
 #include <vector>
+#include "tlrx_error_codes.h"
 
 #include "tlrx_description_section.h"
 #include "tlrx_raster_file.h"
@@ -21,12 +22,9 @@
 
 class CResultRaster;
 
-// Codes of the window steps beside those of the raster file.
-constexpr int32_t CTLRX_ERR_SIZE_MISMATCH = 652807; // 10, 6
-// Window rows or columns outside CTLRX_WINDOW_MIN_SIZE .. CTLRX_WINDOW_MAX_SIZE.
-constexpr int32_t CTLRX_ERR_WINDOW_SIZE = 456961; // 7, 0
-// Window sizes of the exact rule below 2 (or above the maximum).
-constexpr int32_t CTLRX_ERR_EXACT_WINDOW_SIZE = 456962; // 7, 1
+// Window rows or columns outside CTLRX_WINDOW_MIN_SIZE .. CTLRX_WINDOW_MAX_SIZE
+// raise CTLRX_ERR_WINDOW_SIZE; sizes of the exact rule below 2 (or above the
+// maximum) raise CTLRX_ERR_ARGUMENTS.
 constexpr int32_t CTLRX_WINDOW_MIN_SIZE = 3;
 constexpr int32_t CTLRX_WINDOW_MAX_SIZE = 500;
 
@@ -46,7 +44,7 @@ constexpr SWindowRule CTLRX_CLIPPED_WINDOW_RULE{ETLRXWindowBorder::kClipped, CTL
 // Exact R x K windows of at least 2 with border pixels set to the null value,
 // as coherence estimation wants them. The maximum bounds the ring's memory.
 constexpr SWindowRule CTLRX_EXACT_WINDOW_RULE{ETLRXWindowBorder::kNull, 2, CTLRX_WINDOW_MAX_SIZE,
-                                              CTLRX_ERR_EXACT_WINDOW_SIZE};
+                                              CTLRX_ERR_ARGUMENTS};
 
 // Raises theRule's code (no message) unless both sizes lie in its limits.
 void fdfCheckWindowSize(int32_t theRows, int32_t theCols, const SWindowRule &theRule = CTLRX_CLIPPED_WINDOW_RULE);

@@ -358,7 +358,7 @@ double CGeocodedImageStack::evaluate(const SInput &theInput, int32_t theColumn) 
 
 double CGeocodedImageStack::value(int32_t theInput, int32_t theLine, int32_t thePixel) {
   if (theInput < 0 || theInput >= getInputCount())
-    TLRX_RAISE_F(CTLRX_ERR_RF_USAGE, "geocoded stack input %d of %d", theInput, getInputCount());
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "geocoded stack input %d of %d", theInput, getInputCount());
   SInput &aIn = *mInputs[theInput];
   if (theLine < 0 || theLine >= mGrid.mLines || thePixel < 0 || thePixel >= mGrid.mPixels)
     return aIn.mNull;
@@ -369,7 +369,7 @@ double CGeocodedImageStack::value(int32_t theInput, int32_t theLine, int32_t the
 
 void CGeocodedImageStack::getLine(int32_t theInput, int32_t theLine, double *theDest) {
   if (theInput < 0 || theInput >= getInputCount() || theLine < 0 || theLine >= mGrid.mLines)
-    TLRX_RAISE_F(CTLRX_ERR_RF_USAGE, "geocoded stack input %d line %d", theInput, theLine);
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "geocoded stack input %d line %d", theInput, theLine);
   SInput &aIn = *mInputs[theInput];
   if (aIn.mLine != theLine)
     prepareLine(aIn, theLine);

@@ -93,7 +93,7 @@ STemporalGridInfo fdfBuildTemporalGrid(const std::vector<std::string> &theInputs
     if (!fdfUnionMapGrid(aGrids, aUnion)) {
       const std::string aName = fdfHeaderFileName(theGrid);
       fdfTraceMessage("Error: the union of the input extents is not a usable grid %s\n", aName.c_str());
-      TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName.c_str());
     }
     aLines = aUnion.mLines;
     aPixels = aUnion.mPixels;

@@ -12,6 +12,7 @@
 #include <memory>
 #include <string>
 #include <vector>
+#include "tlrx_error_codes.h"
 
 // ---------------------------------------------------------------- constants
 
@@ -34,16 +35,6 @@ constexpr int32_t CTLRX_DS_STRING = 2;
 constexpr int32_t CTLRX_DS_FIELD_POINTER = 3; // value type of a struct field
 // Shape or value type that a declaration did not recognise.
 constexpr int32_t CTLRX_DS_UNRECOGNISED = -1;
-
-// Error codes of the description model and its files.
-constexpr int32_t CTLRX_ERR_DS_DECLARATION = 848640;   // 13, -1 bad declaration, failed description copy
-constexpr int32_t CTLRX_ERR_DS_CHECK = 848641;         // 13, 0  is-set on a field without storage, mandatory check
-constexpr int32_t CTLRX_ERR_DS_FIELD_MISSING = 848642; // 13, 1  key names no field, element without value
-constexpr int32_t CTLRX_ERR_DS_TYPE = 848644;          // 13, 3  shape or value type not accepted
-constexpr int32_t CTLRX_ERR_DS_NOT_SET = 848645;       // 13, 4  value never set
-constexpr int32_t CTLRX_ERR_DS_RANGE = 848646;         // 13, 5  index outside storage, no scratch buffer
-constexpr int32_t CTLRX_ERR_XML_PARSE = 261121;        // 4, 0   XML file cannot be parsed or opened
-constexpr int32_t CTLRX_ERR_FILE_WRITE = 261124;       // 4, 3   header section cannot be written
 
 // Names printed for shapes ("SCALAR", "VECTOR", "MARTIX", "MULTIPLE") and
 // value types ("Integer", "Double", "String", "Field Of Section pointer");

@@ -691,7 +691,7 @@ bool CDescription::readXML(const char *theFileName, bool theRaiseIfMissing) {
   if (!aParsed) {
     mReadError = aTree.getErrorText();
     if (theRaiseIfMissing)
-      TLRX_RAISE(CTLRX_ERR_XML_PARSE, theFileName);
+      TLRX_RAISE(CTLRX_ERR_FILE_PARSE, theFileName);
     return false;
   }
   clearValues();
@@ -709,7 +709,7 @@ bool CDescription::readXML(const char *theFileName, bool theRaiseIfMissing) {
       mReadError = std::string("counts of section ") + aSection.getName() + " disagree with its elements in " +
                    theFileName;
       if (theRaiseIfMissing)
-        TLRX_RAISE(CTLRX_ERR_XML_PARSE, theFileName);
+        TLRX_RAISE(CTLRX_ERR_FILE_PARSE, theFileName);
       return false;
     }
   }
@@ -722,7 +722,7 @@ bool fdfReadXMLSection(CDescriptionSection &theSection, const char *theFile, boo
   CXmlElementTree aTree;
   if (!aTree.parseFile(theFile, CTLRX_XML_SECTION_MAX_LINE)) {
     if (theRaise)
-      TLRX_RAISE(CTLRX_ERR_XML_PARSE, theFile);
+      TLRX_RAISE(CTLRX_ERR_FILE_PARSE, theFile);
     return false;
   }
   const CXmlElement *aRoot = aTree.getRoot();

@@ -214,7 +214,7 @@ bool CXmlSchema::load(const char *theRootName, const char *theSchemaName) {
   }
   CXmlElementTree aTree;
   if (!aTree.parseFile(aPath.c_str(), CTLRX_SCHEMA_MAX_LINE)) {
-    TLRX_RAISE(CTLRX_ERR_XML_PARSE, aPath.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aPath.c_str());
   }
 
   const CXmlElement *aRoot = nullptr;

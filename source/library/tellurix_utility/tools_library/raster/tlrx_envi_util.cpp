@@ -143,7 +143,7 @@ public:
     const CDescriptionField *aField = field(theField);
     if (aField == nullptr || aField->getShape() != CTLRX_DS_VECTOR || aField->getValueType() != CTLRX_DS_STRING ||
         !aField->isSet(theIndex) || *aField->getString(theIndex) == '\0')
-      TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: vocabulary %s has no %s entry %d", mEnviFile.c_str(), mFile.c_str(),
+      TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: vocabulary %s has no %s entry %d", mEnviFile.c_str(), mFile.c_str(),
                    theField, theIndex);
     return aField->getString(theIndex);
   }
@@ -161,7 +161,7 @@ private:
     return aSection != nullptr ? aSection->findField(theField) : nullptr;
   }
   [[noreturn]] void lacks(const char *theField) const {
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: vocabulary %s lacks %s", mEnviFile.c_str(), mFile.c_str(), theField);
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: vocabulary %s lacks %s", mEnviFile.c_str(), mFile.c_str(), theField);
   }
 
   CDescription mDescription;
@@ -185,7 +185,7 @@ struct SRasterLayout {
 SRasterLayout readLayout(const CDescription &theHeader, const std::string &theEnviFile) {
   SRasterLayout aLayout;
   auto aFail = [&](const char *theKey, const char *theWhat) {
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: %s %s", theEnviFile.c_str(), theKey, theWhat);
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: %s %s", theEnviFile.c_str(), theKey, theWhat);
   };
   if (!integerField(theHeader, "RasterInfo.NrOfPixelsPerLine", aLayout.mPixels) || aLayout.mPixels < 1)
     aFail("RasterInfo.NrOfPixelsPerLine", "is not a positive number");
@@ -196,7 +196,7 @@ SRasterLayout readLayout(const CDescription &theHeader, const std::string &theEn
     aFail("RasterInfo.CellType", "holds no value");
   aLayout.mCellType = fdfCellTypeFromName(aCellType);
   if (aLayout.mCellType == CTLRX_CELL_UNKNOWN)
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: unknown cell type %s", theEnviFile.c_str(), aCellType);
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: unknown cell type %s", theEnviFile.c_str(), aCellType);
   const struct {
     const char *mKey;
     int64_t *mValue;
@@ -441,13 +441,13 @@ std::string composeHeader(const CDescription &theHeader, const SRasterLayout &th
 void writeWholeFile(const std::string &theFile, const std::string &theText) {
   FILE *aFile = std::fopen(theFile.c_str(), "wb");
   if (aFile == nullptr)
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: cannot be created (%s)", theFile.c_str(), std::strerror(errno));
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: cannot be created (%s)", theFile.c_str(), std::strerror(errno));
   const bool aWritten = std::fwrite(theText.data(), 1, theText.size(), aFile) == theText.size();
   const bool aClosed = std::fclose(aFile) == 0;
   if (!aWritten || !aClosed) {
     const int aError = errno;
     std::remove(theFile.c_str());
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: cannot be written (%s)", theFile.c_str(), std::strerror(aError));
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: cannot be written (%s)", theFile.c_str(), std::strerror(aError));
   }
 }
 

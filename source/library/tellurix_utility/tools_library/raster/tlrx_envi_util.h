@@ -11,12 +11,12 @@
 
 #include <cstdint>
 #include <string>
+#include "tlrx_error_codes.h"
 
 class CDescription;
 
 // Codes raised here (261122 and 913920 are the runtime's CTLRX_ERR_FILE_OPEN
 // and CTLRX_ERR_UNEXPECTED).
-constexpr int32_t CTLRX_ERR_ENVI_WRITE = 261121; // 4, 0  the ENVI header cannot be written
 
 // Vocabulary: the section its key file declares, and the profile used when
 // the caller names none.

@@ -288,7 +288,7 @@ void CRasterFile::refuseWhenOpen(const char *theFileName) const {
     return;
   const char *aName = theFileName != nullptr ? theFileName : "";
   fdfTraceMessage("Error: attempting to open the raster file %s in input mode while it was not closed\n", aName);
-  TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+  TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
 }
 
 // The layout is checked before the data file is touched, so a bad layout
@@ -307,7 +307,7 @@ void CRasterFile::openWith(const CRasterFileParam &theParam, int32_t theMode) {
   guarded(__LINE__, [&] {
     if (theMode != CTLRX_RF_OPEN_READ && theParam.mFileName.empty()) {
       fdfTraceMessage("You have to set the file name in CRasterFileParam \n");
-      TLRX_RAISE(CTLRX_ERR_RF_USAGE, "");
+      TLRX_RAISE(CTLRX_ERR_FILE_PARSE, "");
     }
     validateLayout(theParam, theMode);
     openStream(theParam.mFileName.c_str(), theMode);
@@ -317,7 +317,7 @@ void CRasterFile::openWith(const CRasterFileParam &theParam, int32_t theMode) {
     if (fseeko(mFile.get(), static_cast<off_t>(mHeaderLen), SEEK_SET) != 0) {
       fdfTraceMessage("Error: cannot position the file %s on its first record  errno = %d\n", mFileName.c_str(),
                       errno);
-      TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
     }
   });
   aUndo.mDone = true;
@@ -334,15 +334,15 @@ void CRasterFile::validateLayout(const CRasterFileParam &theParam, int32_t theMo
     else
       fdfTraceMessage("mNrOfPixelsPerLine = %d\n", theParam.mNrOfPixelsPerLine);
     fdfTraceMessage("CTLRX_RASTER_FILE_MAX_ROWS = %d\n", CTLRX_RASTER_FILE_MAX_ROWS);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
   }
   if (fdfCellTypeSize(theParam.mCellType, nullptr) < 0)
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
   if (theParam.mHeaderOffset < 0 || theParam.mRowPrefix < 0 || theParam.mRowSuffix < 0 || theParam.mFooterLen < 0) {
     fdfTraceMessage("Error: negative layout of %s: mHeaderLen = %d mRowPrefix = %d mRowSuffix = %d "
                     "mFooterLen = %d\n",
                     aName, theParam.mHeaderOffset, theParam.mRowPrefix, theParam.mRowSuffix, theParam.mFooterLen);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
   }
   const int64_t aRecordLen = static_cast<int64_t>(theParam.mRowPrefix) +
                              fdfCellLineBytes(theParam.mCellType, theParam.mNrOfPixelsPerLine) +
@@ -350,7 +350,7 @@ void CRasterFile::validateLayout(const CRasterFileParam &theParam, int32_t theMo
   if (aRecordLen > INT32_MAX) {
     fdfTraceMessage("Error: record length %lld of %s exceeds %d bytes\n", static_cast<long long>(aRecordLen), aName,
                     INT32_MAX);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
   }
 }
 
@@ -361,7 +361,7 @@ void CRasterFile::openStream(const char *theFileName, int32_t theMode) {
     // are regular files (or links to them), asked before the open.
     if (fdfExistFile(theFileName) && !fdfIsRegularFile(theFileName)) {
       fdfTraceMessage("Error: %s is not a regular file\n", theFileName);
-      TLRX_RAISE_F(CTLRX_ERR_RF_OPEN, "%s is not a regular file", theFileName);
+      TLRX_RAISE_F(CTLRX_ERR_FILE_OPEN, "%s is not a regular file", theFileName);
     }
     aFile = std::fopen(theFileName, "rb");
   } else if (theMode == CTLRX_RF_OPEN_WRITE) {
@@ -381,7 +381,7 @@ void CRasterFile::openStream(const char *theFileName, int32_t theMode) {
   }
   if (aFile == nullptr) {
     fdfTraceMessage("Error: cannot open the file: %s  errno = %d\n", theFileName, errno);
-    TLRX_RAISE(theMode == CTLRX_RF_OPEN_READ ? CTLRX_ERR_RF_OPEN : CTLRX_ERR_RF_WRITE, theFileName);
+    TLRX_RAISE(theMode == CTLRX_RF_OPEN_READ ? CTLRX_ERR_FILE_OPEN : CTLRX_ERR_FILE_WRITE, theFileName);
   }
   mFile.reset(aFile);
   if (!mStreamBuffer)
@@ -434,7 +434,7 @@ void CRasterFile::checkFileCoversImage(const CRasterFileParam &theParam) const {
                   "NrOfLinesPerImage = %d)\n",
                   theParam.mFileName.c_str(), static_cast<long long>(aSize), static_cast<long long>(aNeeded),
                   theParam.mHeaderOffset, static_cast<long long>(aRecordLen), theParam.mNrOfLinesPerImage);
-  TLRX_RAISE(CTLRX_ERR_RF_READ, theParam.mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_READ, theParam.mFileName.c_str());
 }
 
 void CRasterFile::resetState() {
@@ -459,7 +459,7 @@ void CRasterFile::close() {
     fdfTraceMessage("mRasterStatus %d\n", mRasterStatus);
     const char *aName = mFileName.empty() ? "no file name" : mFileName.c_str();
     fdfTraceMessage("Error: attempting to close a raster file %s while it was not open\n", aName);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, aName);
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aName);
   }
   // Whatever happens below, the object ends closed and its file released.
   struct SCloseOnExit {
@@ -474,7 +474,7 @@ void CRasterFile::close() {
       FILE *aFile = mFile.release();
       if (std::fclose(aFile) != 0) {
         fdfTraceMessage("Error: impossible to close the file %s  errno = %d\n", mFileName.c_str(), errno);
-        TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+        TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
       }
     }
   });
@@ -488,7 +488,7 @@ void CRasterFile::padMissingLines() {
     TLRX_SHORT_WARNING(CTLRX_WARN_LINES_PADDED, mFileName.c_str());
     fdfTraceMessage("\nWARNING NULL line writed : %d in file : %s\n", mNrOfLinesPerImage - mMaxLineWritten,
                     mFileName.c_str());
-    positionOnRecordOrRaise(mMaxLineWritten, CTLRX_ERR_RF_WRITE);
+    positionOnRecordOrRaise(mMaxLineWritten, CTLRX_ERR_FILE_WRITE);
     const std::vector<uint8_t> aZeros(std::min<size_t>(CTLRX_RF_PADDING_CHUNK, static_cast<size_t>(mRecordLen) *
                                                            (mNrOfLinesPerImage - mMaxLineWritten)),
                                       0);
@@ -506,7 +506,7 @@ void CRasterFile::padMissingLines() {
       (aStat.st_size < aFullSize && ftruncate(fileno(mFile.get()), static_cast<off_t>(aFullSize)) != 0)) {
     fdfTraceMessage("Error: impossible to complete the file %s to %lld bytes  errno = %d\n", mFileName.c_str(),
                     static_cast<long long>(aFullSize), errno);
-    TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
   }
 }
 
@@ -570,7 +570,7 @@ void CRasterFile::switchDirection(bool theWriting) {
     return;
   if (fseeko(mFile.get(), 0, SEEK_CUR) != 0) {
     fdfTraceMessage("Error: cannot change direction on %s  errno = %d\n", mFileName.c_str(), errno);
-    TLRX_RAISE(theWriting ? CTLRX_ERR_RF_WRITE : CTLRX_ERR_RF_READ, mFileName.c_str());
+    TLRX_RAISE(theWriting ? CTLRX_ERR_FILE_WRITE : CTLRX_ERR_FILE_READ, mFileName.c_str());
   }
   mLastWasWrite = theWriting;
 }
@@ -588,7 +588,7 @@ void CRasterFile::checkReadable(int32_t theRowNbr) const {
   if (aReason == nullptr)
     return;
   fdfTraceMessage("Error: attempting to read from the raster file %s %s", mFileName.c_str(), aReason);
-  TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
 }
 
 void CRasterFile::checkWritable(int32_t theRowNbr) const {
@@ -602,7 +602,7 @@ void CRasterFile::checkWritable(int32_t theRowNbr) const {
   if (aReason == nullptr)
     return;
   fdfTraceMessage("Error: attempting to write to the raster file %s %s", mFileName.c_str(), aReason);
-  TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
 }
 
 // The block keeps its first line inside the image and never grows: the
@@ -667,7 +667,7 @@ void CRasterFile::readBytes(void *theDest, size_t theBytes, int32_t theRow) {
                   "Read file : STATUS %d\n",
                   mFileName.c_str(), aEof ? "end of file" : "read error", aRead, theBytes, aErrno, CTLRX_RF_CLOSE,
                   theRow, aHere, aHere / 1000, static_cast<long long>(mRecordLen) * theRow, mRasterStatus);
-  TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
 }
 
 void CRasterFile::writeBytes(const void *theSource, size_t theBytes, int32_t theRow) {
@@ -679,7 +679,7 @@ void CRasterFile::writeBytes(const void *theSource, size_t theBytes, int32_t the
   mLinePosition = -1;
   fdfTraceMessage("Error: impossible to write record %d LEN : %zu  on file %s  errno = %d\n", theRow, theBytes,
                   mFileName.c_str(), aErrno);
-  TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
 }
 
 // ------------------------------------------------------------------ reading
@@ -697,7 +697,7 @@ int32_t CRasterFile::readRecords(int32_t theRowStart, int32_t theRowNbr, int32_t
     if (aColStart > aColEnd) {
       fdfTraceMessage("Error: attempting to read from the raster file %s columns %d to %d\n", mFileName.c_str(),
                       aColStart, aColEnd);
-      TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
     }
     if (theTrace)
       fdfTraceMessage("Reading [%d-%d] records [%d]-[%d] from file %s\n", aColStart, aColEnd, aRowStart,
@@ -719,7 +719,7 @@ void CRasterFile::readLines(int32_t theRowStart, int32_t theRowNbr, int32_t theC
                       "mLinePosition = %d\n",
                       mHeaderLen, static_cast<long long>(aLineBytes) * theRowNbr, mBytesPerPixel, mRecordLen,
                       theRowStart, mLinePosition);
-      TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
     }
     readBytes(theDest, static_cast<size_t>(mRecordLen) * theRowNbr, theRowStart);
     mLinePosition += theRowNbr;
@@ -728,7 +728,7 @@ void CRasterFile::readLines(int32_t theRowStart, int32_t theRowNbr, int32_t theC
     for (int32_t i = 0; i < theRowNbr; ++i) {
       if (!seekLinePosition(theRowStart + i)) {
         fdfTraceMessage("%d ERROR LOOP BEFORE seekLinePosition  : %d\n", i, theRowStart + i);
-        TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+        TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
       }
       readBytes(mRecordBuffer.data(), mRecordBuffer.size(), theRowStart + i);
       std::memcpy(theDest + i * aLineBytes, mRecordBuffer.data() + aCellOffset, static_cast<size_t>(aLineBytes));
@@ -755,7 +755,7 @@ int32_t CRasterFile::writeRecords(int32_t theRowStart, int32_t theRowNbr, const 
     if (aColStart > aColEnd) {
       fdfTraceMessage("Error: attempting to write to the raster file %s columns %d to %d\n", mFileName.c_str(),
                       aColStart, aColEnd);
-      TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
     }
     if (theTrace)
       fdfTraceMessage("Writing records [%d]-[%d] to file %s\n", aRowStart, aRowStart + aRowNbr - 1,
@@ -770,7 +770,7 @@ int32_t CRasterFile::writeRecords(int32_t theRowStart, int32_t theRowNbr, const 
 // column windows, and every line in update mode, write only their cells.
 void CRasterFile::writeLines(int32_t theRowStart, int32_t theRowNbr, const uint8_t *theSource, int32_t theColStart,
                              int32_t theColEnd) {
-  positionOnRecordOrRaise(theRowStart, CTLRX_ERR_RF_WRITE);
+  positionOnRecordOrRaise(theRowStart, CTLRX_ERR_FILE_WRITE);
   const int64_t aLineBytes = lineBytes(theColStart, theColEnd);
   const int64_t aLineValues = aLineBytes / mBytesPerPixel * mDataNbr;
   const bool aWholeLine = theColStart == 0 && theColEnd == mNrOfPixelsPerLine - 1;
@@ -793,7 +793,7 @@ void CRasterFile::writeLines(int32_t theRowStart, int32_t theRowNbr, const uint8
       if (std::fflush(mFile.get()) != 0 || fseeko(mFile.get(), static_cast<off_t>(aOffset), SEEK_SET) != 0) {
         mLinePosition = -1;
         fdfTraceMessage("theRowStart : %d\n", theRowStart + i);
-        TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+        TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
       }
       mLastWasWrite = true;
       std::memcpy(aCells, theSource + i * aLineBytes, static_cast<size_t>(aLineBytes));
@@ -806,7 +806,7 @@ void CRasterFile::writeLines(int32_t theRowStart, int32_t theRowNbr, const uint8
   if (mRasterStatus == CTLRX_RF_OPEN_READ_WRITE && std::fflush(mFile.get()) != 0) {
     fdfTraceMessage("Error: impossible to write record %d LEN : %lld  on file %s  errno = %d\n", theRowStart,
                     static_cast<long long>(aLineBytes), mFileName.c_str(), errno);
-    TLRX_RAISE(CTLRX_ERR_RF_WRITE, mFileName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
   }
   mMaxLineWritten = std::max(mMaxLineWritten, theRowStart + theRowNbr);
 }
@@ -908,7 +908,7 @@ void *CRasterFile::getLineBuffer(int32_t theRow, int32_t theColStart, int32_t th
     if (aColStart > aColEnd) {
       fdfTraceMessage("Error: attempting to read from the raster file %s columns %d to %d\n", mFileName.c_str(),
                       aColStart, aColEnd);
-      TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
     }
     if (mCacheSize > 0 && mRasterStatus == CTLRX_RF_OPEN_READ) {
       if (aRow < mCacheFirst || aRow > mCacheLast || aColStart != mCacheColStart || aColEnd != mCacheColEnd)
@@ -953,7 +953,7 @@ const uint8_t *CRasterFile::typedLineCells(int32_t theRow, int32_t &theColStart,
     print(" ");
     fdfTraceMessage("theColStart : %d\ntheColEnd : %d\nmNrOfPixelsPerLine : %d\n", theColStart, theColEnd,
                     mNrOfPixelsPerLine);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, mFileName.c_str());
   }
   const int32_t aFileRow = typedFileRow(theRow);
   if (mPixelsReversed) {
@@ -969,7 +969,7 @@ int32_t CRasterFile::typedFileRow(int32_t theRow) const {
     print(" ");
     fdfTraceMessage("File name : %s\ntheRow : %d\nmNrOfLinesPerImage : %d\n", mFileName.c_str(), theRow,
                     mNrOfLinesPerImage);
-    TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_PARSE, mFileName.c_str());
   }
   return mLinesReversed ? mNrOfLinesPerImage - 1 - theRow : theRow;
 }
@@ -979,12 +979,12 @@ void CRasterFile::requireComplexCells() const {
     return;
   fdfTraceMessage("Error: complex line of the raster file %s, whose cells are %s\n", mFileName.c_str(),
                   fdfCellTypeName(mCellType));
-  TLRX_RAISE(CTLRX_ERR_RF_USAGE, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_PARSE, mFileName.c_str());
 }
 
 void CRasterFile::failUnknownCellType() const {
   fdfTraceMessage("Cell Type Unknow mCellType =%d\n", mCellType);
-  TLRX_RAISE(CTLRX_ERR_RF_READ, mFileName.c_str());
+  TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
 }
 
 template void CRasterFile::getLine<float>(float *, int32_t, int32_t, int32_t, bool);

@@ -16,6 +16,7 @@
 #include <memory>
 #include <string>
 #include <vector>
+#include "tlrx_error_codes.h"
 
 #include "tlrx_cell_types.h"
 #include "tlrx_no_data.h"
@@ -36,10 +37,6 @@ constexpr int32_t CTLRX_RF_OPEN_TIFF_READ = 4;
 constexpr int32_t CTLRX_RF_OPEN_TIFF_WRITE = 5;
 
 // Codes raised by the raster file.
-constexpr int32_t CTLRX_ERR_RF_USAGE = 261121; // 4, 0 mode misuse, missing name, bad size or layout, bad range
-constexpr int32_t CTLRX_ERR_RF_OPEN = 261122;  // 4, 1 data file (or its header) cannot be opened for reading
-constexpr int32_t CTLRX_ERR_RF_WRITE = 261124; // 4, 3 write-side failures, failed initial positioning
-constexpr int32_t CTLRX_ERR_RF_READ = 261125;  // 4, 4 read-side failures, short files, unknown cell type
 
 // Layout of a raster as its header gives it, or as a caller sets it before
 // opening a file for writing.

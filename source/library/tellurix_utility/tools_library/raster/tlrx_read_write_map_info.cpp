@@ -73,7 +73,7 @@ const SProjection *findProjection(const char *theState) {
 class CMapFields {
 public:
   CMapFields(const CDescription &theHeader, const char *theEnviFile)
-      : mHeader(theHeader), mEnviFile(theEnviFile), mReader{CTLRX_ERR_ENVI_WRITE, theEnviFile} {}
+      : mHeader(theHeader), mEnviFile(theEnviFile), mReader{CTLRX_ERR_FILE_PARSE, theEnviFile} {}
 
   double number(const char *theKey) const { return fdfHeaderFiniteReal(mHeader, theKey, mReader); }
   double numberOr(const char *theKey, double theDefault) const {
@@ -88,7 +88,7 @@ public:
   }
   const char *text(const char *theKey) const { return fdfEnviFieldText(mHeader, theKey); }
   [[noreturn]] void fail(const char *theKey, const char *theWhat) const {
-    TLRX_RAISE_F(CTLRX_ERR_ENVI_WRITE, "%s: %s %s", mEnviFile, theKey, theWhat);
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "%s: %s %s", mEnviFile, theKey, theWhat);
   }
 
 private:

@@ -413,7 +413,7 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
                       std::make_pair(&fdfWarningCatalogue(), "tlrx_warnings_catalog.des")}) {
     const std::string aPath = aDesDir + aEntry.second;
     if (!aEntry.first->load(aPath.c_str()))
-      TLRX_RAISE(261121, aPath.c_str());
+      TLRX_RAISE(CTLRX_ERR_FILE_PARSE, aPath.c_str());
   }
   fdfResetWarningCount();
   fdfOpenTrace(false);

@@ -294,7 +294,7 @@ std::string fdfErrorBlock(int32_t theCode, const std::vector<const char *> &theM
       aWrapped += aMessage[k];
       ++aCopied;
     }
-    if (theCode >= 261120 && theCode <= 261126 && aWrapped.size() >= 4 &&
+    if (theCode >= CTLRX_ERR_WORKING_FILE_REMOVE && theCode <= CTLRX_ERR_FILE_RENAME && aWrapped.size() >= 4 &&
         aWrapped.compare(aWrapped.size() - 4, 4, "_hdr") == 0)
       aWrapped.replace(aWrapped.size() - 4, 4, ".sml");
     fdfTraceMessage("(aTotLen + aLen) [%d]\n(CTLRX_MAX_LEN_IN_ERROR * CTLRX_MAX_LINE_IN_ERROR) [%d]\n",

@@ -6,6 +6,8 @@
 #include <string>
 #include <vector>
 
+#include "tlrx_error_codes.h"
+
 constexpr int32_t CTLRX_PEC_SIZE = 65280;          // codes per primary class
 constexpr int CTLRX_MAX_LEN_IN_ERROR = 48;         // characters per error-file line
 constexpr int CTLRX_MAX_LINE_IN_ERROR = 3;         // message lines in the error file
@@ -21,19 +23,6 @@ constexpr int32_t fdfGetPEC(int32_t theCode) { return theCode / CTLRX_PEC_SIZE; 
 constexpr int32_t fdfGetSEC(int32_t theCode) { return theCode % CTLRX_PEC_SIZE - 1; }
 
 // Codes of the runtime services and the entry point.
-constexpr int32_t CTLRX_ERR_ALLOCATION = 195840;        // 3, -1
-constexpr int32_t CTLRX_WARN_LINES_PADDED = 130561;     // 2, 0
-constexpr int32_t CTLRX_ERR_WORKING_FILE_REMOVE = 261120; // 4, -1
-constexpr int32_t CTLRX_ERR_FILE_OPEN = 261122;         // 4, 1
-constexpr int32_t CTLRX_ERR_FILE_COPY = 261123;         // 4, 2
-constexpr int32_t CTLRX_ERR_INTERRUPTED = 326400;       // 5, -1
-constexpr int32_t CTLRX_ERR_PARAMETER_FILE = 456960;    // 7, -1
-constexpr int32_t CTLRX_ERR_UNKNOWN_COMMAND = 456963;   // 7, 2
-constexpr int32_t CTLRX_ERR_SETTING_MISSING = 783360;   // 12, -1
-constexpr int32_t CTLRX_ERR_UNEXPECTED = 913920;        // 14, -1
-constexpr int32_t CTLRX_ERR_UNEXPECTED_RASTER = 913921; // 14, 0
-constexpr int32_t CTLRX_ERR_UNEXPECTED_EXIT = 913922;   // 14, 1
-constexpr int32_t CTLRX_WARNING_STATUS = 65280;         // completion with warnings
 
 // One catalogue of texts (errors or warnings), read from a catalogue file.
 class CErrorCatalogue {
