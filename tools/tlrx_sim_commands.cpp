@@ -61,7 +61,7 @@ void writeList(const SSimOptions &theOptions, const std::vector<std::string> &th
     aList << aName << "\n";
   aList.close();
   if (!aList)
-    TLRX_RAISE(CTLRX_ERR_RF_WRITE, theOptions.mList.c_str());
+    TLRX_RAISE(CTLRX_ERR_FILE_WRITE, theOptions.mList.c_str());
   std::printf("wrote list %s\n", theOptions.mList.c_str());
 }
 

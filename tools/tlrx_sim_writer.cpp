@@ -115,7 +115,7 @@ void CSimCellEncoder::encode(const double *theRe, const double *theIm, const uin
     encodeComplex<dcomplex, false>(theRe, theIm, theValid, thePixels, reinterpret_cast<dcomplex *>(theCells));
     break;
   default:
-    TLRX_RAISE_F(CTLRX_ERR_RF_USAGE, "cell type %s cannot be simulated", fdfCellTypeName(mCellType));
+    TLRX_RAISE_F(CTLRX_ERR_FILE_PARSE, "cell type %s cannot be simulated", fdfCellTypeName(mCellType));
   }
 }
 
