@@ -58,7 +58,7 @@ void tlrxFuzzWrite(const std::string &thePath, const uint8_t *theData, size_t th
 }
 
 CDescription &tlrxFuzzDescription() {
-  static CDescription *aDescription = [] {
+  static CDescription *sDescription = [] {
     auto *aNew = new CDescription();
     const std::string aKeys = tlrxFuzzPath("sections.key");
     tlrxFuzzWrite(aKeys, reinterpret_cast<const uint8_t *>(CTLRX_FUZZ_KEYS), std::char_traits<char>::length(CTLRX_FUZZ_KEYS));
@@ -69,6 +69,6 @@ CDescription &tlrxFuzzDescription() {
     }
     return aNew;
   }();
-  aDescription->clearValues();
-  return *aDescription;
+  sDescription->clearValues();
+  return *sDescription;
 }

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs what is missing, builds, and runs every test: the unit, process and
-# interoperability tests, the same suite under ASan and UBSan, and the fuzz
-# targets for a bounded time. Ends with one "N passed, N failed" line.
+# interoperability tests, the naming check, the same suite under ASan and
+# UBSan, and the fuzz targets for a bounded time. Ends with one "N passed, N failed" line.
 set -euo pipefail
 top=$(cd "$(dirname "$0")/.." && pwd)
 fuzz_seconds=${TLRX_FUZZ_SECONDS:-60}
@@ -17,6 +17,9 @@ run_ctest() {
 
 "$top/scripts/setup.sh" "$top/build"
 run_ctest "$top/build" main
+
+echo "== naming check"
+"$top/scripts/check_naming.sh" "$top/build"
 
 echo "== sanitizer build (ASan + UBSan)"
 cmake -S "$top" -B "$top/build_sanitize" -DCMAKE_BUILD_TYPE=Debug -DTLRX_SANITIZE=ON >/dev/null

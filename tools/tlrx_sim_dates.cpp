@@ -7,7 +7,7 @@
 
 namespace {
 
-const char *const theMonthNames[12] = {"JAN", "FEB", "MAR", "APR", "MAY", "JUN",
+const char *const sMonthNames[12] = {"JAN", "FEB", "MAR", "APR", "MAY", "JUN",
                                        "JUL", "AUG", "SEP", "OCT", "NOV", "DEC"};
 
 int64_t daysFromCivil(int64_t theYear, int theMonth, int theDay) {
@@ -124,7 +124,7 @@ std::string fdfSimAcquisitionText(int64_t theMicros) {
   const int aMicros = static_cast<int>(aRest % 1000000);
   aRest /= 1000000;
   char aText[64];
-  std::snprintf(aText, sizeof aText, "%02d-%s-%04d %02d:%02d:%02d.%06d", aDay, theMonthNames[aMonth - 1], aYear,
+  std::snprintf(aText, sizeof aText, "%02d-%s-%04d %02d:%02d:%02d.%06d", aDay, sMonthNames[aMonth - 1], aYear,
                 static_cast<int>(aRest / 3600), static_cast<int>(aRest / 60 % 60), static_cast<int>(aRest % 60),
                 aMicros);
   return aText;

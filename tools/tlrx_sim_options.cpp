@@ -144,7 +144,7 @@ struct SSimOptionSpec {
   TSimApply mApply;
 };
 
-const SSimOptionSpec theOptionTable[] = {
+const SSimOptionSpec sOptionTable[] = {
     {nullptr, nullptr, 0, "Output and layout", nullptr},
     {"--out", "ROOT", CTLRX_SIM_ALL,
      "raster name (constant) or root of the names: series ROOT_01 .. ROOT_NN, pair ROOT_1 and ROOT_2",
@@ -364,18 +364,18 @@ struct SSimCommandName {
   const char *mName;
   int mCommand;
 };
-const SSimCommandName theCommands[] = {
+const SSimCommandName sCommands[] = {
     {"series", CTLRX_SIM_SERIES}, {"pair", CTLRX_SIM_PAIR}, {"constant", CTLRX_SIM_CONSTANT}};
 
 const char *commandName(int theCommand) {
-  for (const SSimCommandName &aCommand : theCommands)
+  for (const SSimCommandName &aCommand : sCommands)
     if (aCommand.mCommand == theCommand)
       return aCommand.mName;
   return "?";
 }
 
 const SSimOptionSpec *findOption(const std::string &theName) {
-  for (const SSimOptionSpec &aSpec : theOptionTable)
+  for (const SSimOptionSpec &aSpec : sOptionTable)
     if (aSpec.mName != nullptr && theName == aSpec.mName)
       return &aSpec;
   return nullptr;
@@ -385,10 +385,10 @@ const SSimOptionSpec *findOption(const std::string &theName) {
 
 // Raster names whose header would not land beside them: the header reader
 // takes such a name as the header itself.
-const char *const theHeaderSuffixes[] = {"_hdr", ".sml", "_par", "_map", ".orb", "_orb_hdr", "_orb.sml"};
+const char *const sHeaderSuffixes[] = {"_hdr", ".sml", "_par", "_map", ".orb", "_orb_hdr", "_orb.sml"};
 
 void checkName(const std::string &theName) {
-  for (const char *aSuffix : theHeaderSuffixes)
+  for (const char *aSuffix : sHeaderSuffixes)
     if (fdfEndsWithNoCase(theName, aSuffix))
       throw CSimUsageError("raster name '" + theName + "' ends in '" + aSuffix +
                            "', which names a header file; choose another --out");
@@ -565,7 +565,7 @@ std::string commandsOf(int theMask) {
   if (theMask == CTLRX_SIM_ALL)
     return "";
   std::string aText;
-  for (const SSimCommandName &aCommand : theCommands)
+  for (const SSimCommandName &aCommand : sCommands)
     if ((theMask & aCommand.mCommand) != 0)
       aText += (aText.empty() ? " [" : ", ") + std::string(aCommand.mName);
   return aText + "]";
@@ -590,7 +590,7 @@ SSimOptions fdfSimParseOptions(const std::vector<std::string> &theArgs) {
   SSimOptions aOptions;
   if (theArgs.empty())
     throw CSimUsageError("missing command");
-  for (const SSimCommandName &aCommand : theCommands)
+  for (const SSimCommandName &aCommand : sCommands)
     if (theArgs[0] == aCommand.mName)
       aOptions.mCommand = aCommand.mCommand;
   if (aOptions.mCommand == 0)
@@ -696,7 +696,7 @@ std::string fdfSimHelpText() {
       "etc/tellurix next to the executable. Exit status: 0 success, 1 a failure while writing, 2 a bad\n"
       "command line.\n\n"
       "Options (values also as --option=value; the commands an option is limited to are in brackets):\n";
-  for (const SSimOptionSpec &aSpec : theOptionTable) {
+  for (const SSimOptionSpec &aSpec : sOptionTable) {
     if (aSpec.mName == nullptr) {
       aText += std::string("\n ") + aSpec.mHelp + "\n";
       continue;

@@ -65,8 +65,8 @@ int main(int argc, char **argv) {
   SSimOptions aOptions;
   try {
     aOptions = fdfSimParseOptions(aArgs);
-  } catch (const CSimUsageError &theError) {
-    std::fprintf(stderr, "tlrx_simulate: %s\n%s\n", theError.what(), fdfSimUsageLine());
+  } catch (const CSimUsageError &aError) {
+    std::fprintf(stderr, "tlrx_simulate: %s\n%s\n", aError.what(), fdfSimUsageLine());
     return CTLRX_SIM_EXIT_USAGE;
   }
   const std::string aConfiguration = configurationDir() + CTLRX_SIM_CONFIGURATION;
@@ -82,11 +82,11 @@ int main(int argc, char **argv) {
     fdfSetProcessName("tlrx_simulate");
     loadCatalogues();
     fdfSimRun(aOptions);
-  } catch (const CErrorExceptionManager &theError) {
-    printRuntimeError(theError);
+  } catch (const CErrorExceptionManager &aError) {
+    printRuntimeError(aError);
     return CTLRX_SIM_EXIT_FAILURE;
-  } catch (const std::exception &theError) {
-    std::fprintf(stderr, "tlrx_simulate: error: %s\n", theError.what());
+  } catch (const std::exception &aError) {
+    std::fprintf(stderr, "tlrx_simulate: error: %s\n", aError.what());
     return CTLRX_SIM_EXIT_FAILURE;
   }
   return 0;

@@ -18,8 +18,8 @@
 // theDescription, through a key file written into theDir.
 inline void tlrxDeclare(CDescription &theDescription, const std::string &theDir, const std::string &theKeyText,
                         const std::vector<std::string> &theNames) {
-  static int aFileNbr = 0;
-  const std::string aPath = theDir + "decl_" + std::to_string(++aFileNbr) + ".key";
+  static int sFileNbr = 0;
+  const std::string aPath = theDir + "decl_" + std::to_string(++sFileNbr) + ".key";
   tlrxWriteFile(aPath, theKeyText);
   for (const std::string &aName : theNames) {
     auto aSection = std::make_unique<CDescriptionSection>();

@@ -18,14 +18,14 @@ inline std::string tlrxAcquisitionText(int theDay, int theHour = 10) {
                                         "JUL", "AUG", "SEP", "OCT", "NOV", "DEC"};
   // Civil date from days since 1970-01-01 (Howard Hinnant's algorithm).
   long z = 18262 + theDay + 719468;
-  const long era = (z >= 0 ? z : z - 146096) / 146097;
-  const long doe = z - era * 146097;
-  const long yoe = (doe - doe / 1460 + doe / 36524 - doe / 146096) / 365;
-  const long doy = doe - (365 * yoe + yoe / 4 - yoe / 100);
-  const long mp = (5 * doy + 2) / 153;
-  const long d = doy - (153 * mp + 2) / 5 + 1;
+  const long aEra = (z >= 0 ? z : z - 146096) / 146097;
+  const long aDoe = z - aEra * 146097;
+  const long aYoe = (aDoe - aDoe / 1460 + aDoe / 36524 - aDoe / 146096) / 365;
+  const long aDoy = aDoe - (365 * aYoe + aYoe / 4 - aYoe / 100);
+  const long mp = (5 * aDoy + 2) / 153;
+  const long d = aDoy - (153 * mp + 2) / 5 + 1;
   const long m = mp < 10 ? mp + 3 : mp - 9;
-  const long y = yoe + era * 400 + (m <= 2 ? 1 : 0);
+  const long y = aYoe + aEra * 400 + (m <= 2 ? 1 : 0);
   char aText[64];
   std::snprintf(aText, sizeof aText, "%02ld-%s-%04ld %02d:00:00.000000", d, aMonths[m - 1], y, theHour);
   return aText;

@@ -537,9 +537,9 @@ TEST_F(DescriptionXmlTest, ReadFromFileTriesSmlFirstThenHdr) {
 }
 
 TEST_F(DescriptionXmlTest, WriteToFileWritesXmlTextAndCallsTheEnviHook) {
-  static std::vector<std::string> aCalls;
-  aCalls.clear();
-  const TLRXEnviHeaderWriter aPrevious = fdfSetEnviHeaderWriter([](const char *theName) { aCalls.push_back(theName); });
+  static std::vector<std::string> sCalls;
+  sCalls.clear();
+  const TLRXEnviHeaderWriter aPrevious = fdfSetEnviHeaderWriter([](const char *theName) { sCalls.push_back(theName); });
   CDescription aDescription;
   declare(aDescription, {"Sensor", "RasterInfo"});
   fillSmall(aDescription);
@@ -547,7 +547,7 @@ TEST_F(DescriptionXmlTest, WriteToFileWritesXmlTextAndCallsTheEnviHook) {
   const bool aWritten = aDescription.writeToFile(path("res").c_str(), true, true);
   fdfSetEnviHeaderWriter(aPrevious);
   ASSERT_TRUE(aWritten);
-  ASSERT_EQ(aCalls, std::vector<std::string>{path("res")});
+  ASSERT_EQ(sCalls, std::vector<std::string>{path("res")});
   EXPECT_TRUE(tlrxFileExists(path("res.sml")));
   const std::string aText = tlrxReadFile(path("res_hdr"));
   EXPECT_EQ(aText.substr(0, 9), "[Sensor]\n");
@@ -589,7 +589,8 @@ TEST_F(DescriptionXmlTest, MalformedTruncatedAndGarbageFilesAreRejected) {
     declare(aRead);
     EXPECT_FALSE(aRead.readXML(path(aName.c_str()).c_str(), false));
     std::string aMessage;
-    EXPECT_EQ(tlrxCodeOf([&] { aRead.readXML(path(aName.c_str()).c_str(), true); }, &aMessage), 261121);
+    const std::string aPath = path(aName.c_str());
+    EXPECT_EQ(tlrxCodeOf([&] { aRead.readXML(aPath.c_str(), true); }, &aMessage), 261121);
     EXPECT_EQ(aMessage, path(aName.c_str()));
   }
   CDescription aRead;
@@ -683,7 +684,8 @@ TEST_F(DescriptionXmlTest, MissingValuesAndUnusableFieldsRaise) {
     CDescription aRead;
     declare(aRead);
     std::string aMessage;
-    EXPECT_EQ(tlrxCodeOf([&] { aRead.readXML(path(aName).c_str(), false); }, &aMessage), 848642);
+    const std::string aPath = path(aName);
+    EXPECT_EQ(tlrxCodeOf([&] { aRead.readXML(aPath.c_str(), false); }, &aMessage), 848642);
   }
   // A field whose value type no rule recognised.
   CDescription aRead;

@@ -20,8 +20,8 @@ struct SCase {
   const char *mError; // message of 848642, nullptr when the value is read
 };
 
-const double theNaN = std::nan("");
-const double theInf = std::numeric_limits<double>::infinity();
+const double sNaN = std::nan("");
+const double sInf = std::numeric_limits<double>::infinity();
 
 const char *const CTLRX_KEYS = "[RasterInfo]\nLines = I\nNullCellValue = D\nText = S\nVec = VD\n";
 
@@ -82,18 +82,18 @@ TEST_F(HeaderNumberAccessors, ReadWholeNumbersAndNameTheFieldOfAnyOther) {
       {"RasterInfo.Lines", "0", EAccessor::kSize, 0, "RasterInfo.Lines is not in 1 to 900000 [0]"},
       {"RasterInfo.Text", "900001", EAccessor::kSize, 0, "RasterInfo.Text is not in 1 to 900000 [900001]"},
       {"RasterInfo.Lines", "3", EAccessor::kReal, 3, nullptr},
-      {"RasterInfo.Text", "-NaN", EAccessor::kReal, theNaN, nullptr},
-      {"RasterInfo.Text", "nan(0x7)", EAccessor::kReal, theNaN, nullptr},
+      {"RasterInfo.Text", "-NaN", EAccessor::kReal, sNaN, nullptr},
+      {"RasterInfo.Text", "nan(0x7)", EAccessor::kReal, sNaN, nullptr},
       {"RasterInfo.Text", "2.5e3", EAccessor::kReal, 2500, nullptr},
       {"RasterInfo.Text", "2.5 m", EAccessor::kReal, 0, "RasterInfo.Text is not a number [2.5 m]"},
       {"RasterInfo.Text", "1e999", EAccessor::kReal, 0, "RasterInfo.Text is not a number [1e999]"},
-      {"RasterInfo.Text", "inf", EAccessor::kReal, theInf, nullptr},
+      {"RasterInfo.Text", "inf", EAccessor::kReal, sInf, nullptr},
       {"RasterInfo.Text", "inf", EAccessor::kFinite, 0, "RasterInfo.Text is not a finite number [inf]"},
       {"RasterInfo.NullCellValue", "NaN", EAccessor::kFinite, 0, "RasterInfo.NullCellValue is not a finite number [nan]"},
       {"RasterInfo.NullCellValue", "-2.5", EAccessor::kFinite, -2.5, nullptr},
       {"RasterInfo.NullCellValue", nullptr, EAccessor::kRealOr, -1, nullptr},
       {"RasterInfo.NullCellValue", nullptr, EAccessor::kNull, 0, nullptr},
-      {"RasterInfo.NullCellValue", "NaN", EAccessor::kNull, theNaN, nullptr},
+      {"RasterInfo.NullCellValue", "NaN", EAccessor::kNull, sNaN, nullptr},
       {"RasterInfo.NullCellValue", "-9999", EAccessor::kNull, -9999, nullptr},
   };
   for (const SCase &aCase : aCases) {

@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr double theInf = std::numeric_limits<double>::infinity();
+constexpr double sInf = std::numeric_limits<double>::infinity();
 
 struct SIntegerCase {
   const char *mText;
@@ -84,7 +84,7 @@ TEST(WholeNumbers, IntegersAreTheWholeTextWithinInt32) {
 TEST(WholeNumbers, RealsAreTheWholeTextWithoutOverflow) {
   const SRealCase aCases[] = {
       {"0.25", true, true, 0.25},     {" -1e3 ", true, true, -1000.0}, {"16e1", true, true, 160.0},
-      {"1e-400", true, true, 0.0},    {"inf", false, true, theInf},    {"-Infinity", false, true, -theInf},
+      {"1e-400", true, true, 0.0},    {"inf", false, true, sInf},    {"-Infinity", false, true, -sInf},
       {"inf", true, false, 0},        {"nan", true, false, 0},         {"1e999", false, false, 0},
       {"-1e999", false, false, 0},    {"0.3x", true, false, 0},        {"garbage", false, false, 0},
       {"", false, false, 0},          {" ", false, false, 0},          {"1 2", false, false, 0},

@@ -15,15 +15,15 @@
 
 namespace {
 
-constexpr double theNull = -9999.0; // program-wide dummy value of the test configuration
-constexpr double theNormNull = -5.0; // dummy value given to the normalisation
+constexpr double sNull = -9999.0; // program-wide dummy value of the test configuration
+constexpr double sNormNull = -5.0; // dummy value given to the normalisation
 
 class CorrelationStepTest : public WindowStepTest {
 protected:
   // Normalisation then coherence of inputs theA and theB into "coh".
   std::vector<double> coherence(const std::string &theA, const std::string &theB, int theNormRows, int theNormCols,
                                 int theRows, int theCols) {
-    EXPECT_EQ(run(normalize_images, {file(theA), file(theB), file("norm"), std::to_string(theNormNull),
+    EXPECT_EQ(run(normalize_images, {file(theA), file(theB), file("norm"), std::to_string(sNormNull),
                                      std::to_string(theNormRows), std::to_string(theNormCols)}),
               0);
     EXPECT_EQ(run(quick_and_dirty, {file(theA), file(theB), file("norm"), file("coh"), "0",
@@ -39,7 +39,7 @@ protected:
     aNorm.mPixels = thePixels;
     aNorm.mValues = tlrxReadTestRaster(file("norm"));
     for (double aValue : aNorm.mValues)
-      aNorm.mValid.push_back(aValue != theNormNull ? 1 : 0);
+      aNorm.mValid.push_back(aValue != sNormNull ? 1 : 0);
     return aNorm;
   }
 };
@@ -81,12 +81,12 @@ TEST_F(CorrelationStepTest, BothStepsMatchDirectWindowsWithNoDataOddAndEvenWindo
       const std::vector<double> aCoherence =
           coherence("a", "b", aNormWindow.first, aNormWindow.second, aWindow.first, aWindow.second);
       expectMatches(tlrxReadTestRaster(file("norm")),
-                    refNormalize(aA, false, aB, true, aNormWindow.first, aNormWindow.second, theNormNull),
-                    theNormNull, "normalisation " + aWhat);
+                    refNormalize(aA, false, aB, true, aNormWindow.first, aNormWindow.second, sNormNull),
+                    sNormNull, "normalisation " + aWhat);
       // The reference reads the normalisation as written (float).
       expectMatches(aCoherence,
-                    refCoherence(aA, false, aB, true, normImage(7, 9), aWindow.first, aWindow.second, theNull),
-                    theNull, "coherence " + aWhat);
+                    refCoherence(aA, false, aB, true, normImage(7, 9), aWindow.first, aWindow.second, sNull),
+                    sNull, "coherence " + aWhat);
     }
 }
 
@@ -113,7 +113,7 @@ TEST_F(CorrelationStepTest, IdenticalSpeckleImagesGiveOneWhateverTheirNoData) {
   const std::vector<double> aOut = coherence("a", "h", 5, 5, 7, 7);
   for (size_t i = 0; i < aOut.size(); ++i) {
     if (aHoles.mValid[i] == 0)
-      EXPECT_EQ(aOut[i], theNull) << i;
+      EXPECT_EQ(aOut[i], sNull) << i;
     else
       EXPECT_NEAR(aOut[i], 1.0, 1e-6) << i;
   }
@@ -154,7 +154,7 @@ TEST_F(CorrelationStepTest, ZeroNormalisationMakesThePixelNoData) {
       for (int j = 21; j < 31; ++j) {
         const size_t i = static_cast<size_t>(l) * 32 + j;
         EXPECT_EQ(aNorm[i], 0.0) << aHigh << " at " << l << ", " << j;
-        EXPECT_EQ(aOut[i], theNull) << aHigh << " at " << l << ", " << j;
+        EXPECT_EQ(aOut[i], sNull) << aHigh << " at " << l << ", " << j;
       }
     EXPECT_NEAR(aOut[0], 1.0, 1e-6) << aHigh;
   }
@@ -168,10 +168,10 @@ TEST_F(CorrelationStepTest, HeadersOfTheNormalisationAndTheCoherence) {
   fdfReadStandardHeader(file("norm").c_str(), aNorm);
   fdfReadStandardHeader(file("coh").c_str(), aCoherence);
   EXPECT_STREQ(aNorm.getField("RasterInfo.CellType").getString(), "FLOAT");
-  EXPECT_EQ(aNorm.getField("RasterInfo.NullCellValue").getDouble(), theNormNull);
+  EXPECT_EQ(aNorm.getField("RasterInfo.NullCellValue").getDouble(), sNormNull);
   EXPECT_STREQ(aCoherence.getField("RasterInfo.CellType").getString(), "FLOAT");
   EXPECT_STREQ(aCoherence.getField("RasterInfo.DataUnits").getString(), "COHERENCE");
-  EXPECT_EQ(aCoherence.getField("RasterInfo.NullCellValue").getDouble(), theNull);
+  EXPECT_EQ(aCoherence.getField("RasterInfo.NullCellValue").getDouble(), sNull);
   const CDescriptionField &aFiles = aCoherence.getField("RasterInfo.FilesList");
   ASSERT_EQ(aFiles.getNumberOfElements(), 2);
   EXPECT_EQ(std::string(aFiles.getString(0)), file("a"));

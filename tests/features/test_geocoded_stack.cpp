@@ -16,7 +16,7 @@
 
 namespace {
 
-constexpr double theNull = -99;
+constexpr double sNull = -99;
 
 class GeocodedStackTest : public ::testing::Test {
 protected:
@@ -31,7 +31,7 @@ protected:
     aRaster.mPixels = thePixels;
     aRaster.mCellType = "DOUBLE";
     aRaster.mHasNull = true;
-    aRaster.mNull = theNull;
+    aRaster.mNull = sNull;
     aRaster.mAcquisitionTime = tlrxAcquisitionText(0);
     for (int l = 0; l < theLines; ++l)
       for (int p = 0; p < thePixels; ++p)
@@ -91,21 +91,21 @@ TEST_F(GeocodedStackTest, UnionGridOfTwoOverlappingInputsAndTheirCells) {
 
   CGeocodedImageStack aStack;
   open(aStack, {"A", "B"}, "grid", "nearest_neighbour");
-  EXPECT_EQ(aStack.getNullValues(), std::vector<double>({theNull, theNull}));
+  EXPECT_EQ(aStack.getNullValues(), std::vector<double>({sNull, sNull}));
   for (int r = 0; r < 9; ++r)
     for (int c = 0; c < 11; ++c) {
       // A: the same cell; B: the 25 m cell holding the centre of (r, c), a
       // centre on B's upper edge belonging to B's first line.
       const double aE = 505 + 10 * c, aN = 8995 - 10 * r;
-      const double aA = r < 4 && c < 6 ? 100 * r + c : theNull;
+      const double aA = r < 4 && c < 6 ? 100 * r + c : sNull;
       const int aBl = static_cast<int>(std::floor((8985 - aN) / 25)), aBp = static_cast<int>(std::floor((aE - 540) / 25));
-      const double aB = aN <= 8985 && aBl < 3 && aE > 540 && aBp < 3 ? 1000 + 10 * aBl + aBp : theNull;
+      const double aB = aN <= 8985 && aBl < 3 && aE > 540 && aBp < 3 ? 1000 + 10 * aBl + aBp : sNull;
       EXPECT_EQ(aStack.value(0, r, c), aA) << r << "," << c;
       EXPECT_EQ(aStack.value(1, r, c), aB) << r << "," << c;
     }
   // Cells beyond the grid are no data too.
-  EXPECT_EQ(aStack.value(0, -1, 0), theNull);
-  EXPECT_EQ(aStack.value(1, 0, 11), theNull);
+  EXPECT_EQ(aStack.value(0, -1, 0), sNull);
+  EXPECT_EQ(aStack.value(1, 0, 11), sNull);
 }
 
 TEST_F(GeocodedStackTest, InterpolatorsFollowARampAndFallBackAtTheEdges) {
@@ -155,7 +155,7 @@ TEST_F(GeocodedStackTest, CubicFallsBackToBilinearThenNearestOnAParabola) {
 
 TEST_F(GeocodedStackTest, NoDataInsideASupportFallsBackAndNoDataStaysNoData) {
   auto aRamp = [](double u, double w) { return 3 + 2 * u + 0.5 * w; };
-  raster("holed", 6, 7, 6000, 1000, 20, [&](int l, int p) { return l == 2 && p == 3 ? theNull : aRamp(l, p); });
+  raster("holed", 6, 7, 6000, 1000, 20, [&](int l, int p) { return l == 2 && p == 3 ? sNull : aRamp(l, p); });
   raster("grid", 12, 14, 6000, 1000, 10, [](int, int) { return 0.0; });
   for (const char *aKernel : {"bilinear_interpolation", "4th_order_cc"}) {
     CGeocodedImageStack aStack, aByLine;
@@ -168,7 +168,7 @@ TEST_F(GeocodedStackTest, NoDataInsideASupportFallsBackAndNoDataStaysNoData) {
         const double ju = std::floor(u), jw = std::floor(w);
         const bool aBilinear = ju >= 0 && ju + 1 <= 5 && jw >= 0 && jw + 1 <= 6 && !(ju <= 2 && 2 <= ju + 1 && jw <= 3 && 3 <= jw + 1);
         const int aNu = static_cast<int>(std::floor(u + 0.5)), aNw = static_cast<int>(std::floor(w + 0.5));
-        double aExpected = aNu == 2 && aNw == 3 ? theNull : aRamp(aNu, aNw);
+        double aExpected = aNu == 2 && aNw == 3 ? sNull : aRamp(aNu, aNw);
         if (aBilinear)
           aExpected = aRamp(u, w); // bilinear or a higher kernel: exact on the ramp
         EXPECT_NEAR(aStack.value(0, r, c), aExpected, 1e-9) << aKernel << " " << r << "," << c;

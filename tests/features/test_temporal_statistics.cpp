@@ -13,8 +13,8 @@
 
 namespace {
 
-constexpr double theNaN = std::numeric_limits<double>::quiet_NaN();
-constexpr double N = -1.0; // output null value of these tests
+constexpr double sNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double sN = -1.0; // output null value of these tests
 
 struct SPixel {
   double mValues[CTLRX_TF_VALUE_COUNT];
@@ -26,7 +26,7 @@ struct SPixel {
 // Runs one pixel: theValues in temporal order on theDays, every feature wanted.
 SPixel pixel(const std::vector<double> &theValues, const std::vector<long> &theDays,
              std::vector<double> theNulls = {}, bool theNormalize = false, bool theDb = false,
-             double theRatioTime = 1e100, double theNull = N) {
+             double theRatioTime = 1e100, double theNull = sN) {
   STemporalSettings aSettings;
   aSettings.mRatioTimeThreshold = theRatioTime;
   aSettings.mNormalize = theNormalize;
@@ -43,7 +43,7 @@ SPixel pixel(const std::vector<double> &theValues, const std::vector<long> &theD
   return aPixel;
 }
 
-const std::vector<int> theNeedTwo = {CTLRX_TF_STD, CTLRX_TF_GRADIENT, CTLRX_TF_MAX_INCREMENT, CTLRX_TF_MAX_DECREMENT,
+const std::vector<int> sNeedTwo = {CTLRX_TF_STD, CTLRX_TF_GRADIENT, CTLRX_TF_MAX_INCREMENT, CTLRX_TF_MAX_DECREMENT,
                                      CTLRX_TF_MAX_RATIO, CTLRX_TF_MIN_RATIO};
 
 } // namespace
@@ -73,8 +73,8 @@ TEST(TemporalAccumulator, MatchesTwoPassStatisticsAndSkipsTheNullValue) {
   aAcc.reset(-7.0);
   EXPECT_EQ(aAcc.mean(), -7.0);
   EXPECT_EQ(aAcc.std(), -7.0);
-  aAcc.reset(theNaN);
-  aAcc.add(theNaN);
+  aAcc.reset(sNaN);
+  aAcc.add(sNaN);
   EXPECT_EQ(aAcc.count(), 0);
   EXPECT_TRUE(std::isnan(aAcc.mean()));
 }
@@ -141,10 +141,10 @@ TEST(TemporalSeries, SeriesOfTheExampleGivesTheListedValues) {
 }
 
 TEST(TemporalSeries, PixelWithoutDataOrWithOneSample) {
-  const SPixel aNone = pixel({-1, -1, theNaN}, {0, 5, 9});
+  const SPixel aNone = pixel({-1, -1, sNaN}, {0, 5, 9});
   EXPECT_EQ(aNone.mKept, 0);
   for (double v : aNone.mValues)
-    EXPECT_EQ(v, N);
+    EXPECT_EQ(v, sN);
   EXPECT_EQ(aNone.mDates[0], CTLRX_TF_NO_DATE);
   EXPECT_EQ(aNone.mDates[1], CTLRX_TF_NO_DATE);
 
@@ -154,8 +154,8 @@ TEST(TemporalSeries, PixelWithoutDataOrWithOneSample) {
     EXPECT_EQ(aOne[f], 4.5) << f;
   EXPECT_EQ(aOne[CTLRX_TF_SPAN_DIFFERENCE], 0);
   EXPECT_EQ(aOne[CTLRX_TF_SPAN_RATIO], 1);
-  for (int f : theNeedTwo)
-    EXPECT_EQ(aOne[f], N) << f;
+  for (int f : sNeedTwo)
+    EXPECT_EQ(aOne[f], sN) << f;
   EXPECT_EQ(aOne.mDates[0], 5);
   EXPECT_EQ(aOne.mDates[1], CTLRX_TF_NO_DATE);
 }
@@ -182,7 +182,7 @@ TEST(TemporalSeries, SameDayZeroAndThresholdRejections) {
 }
 
 TEST(TemporalSeries, NegativeValuesEnterAsMagnitudesAndNaNAsNoData) {
-  const SPixel p = pixel({-4, 2, theNaN, -8}, {0, 1, 2, 3});
+  const SPixel p = pixel({-4, 2, sNaN, -8}, {0, 1, 2, 3});
   EXPECT_EQ(p.mKept, 3);
   EXPECT_EQ(p[CTLRX_TF_MIN], 2);
   EXPECT_EQ(p[CTLRX_TF_MAX], 8);
@@ -245,7 +245,7 @@ TEST(TemporalSeries, MedianRulesAndTiesOfTheDates) {
 
 TEST(TemporalSeries, OnlyWantedFeaturesAreComputedAndStridedInputsAreRead) {
   STemporalSettings aSettings;
-  aSettings.mNull = N;
+  aSettings.mNull = sN;
   aSettings.mWanted[CTLRX_TF_MAX] = true;
   aSettings.mNormalize = true;
   aSettings.mDecibels = true;
@@ -256,7 +256,7 @@ TEST(TemporalSeries, OnlyWantedFeaturesAreComputedAndStridedInputsAreRead) {
   double aValues[CTLRX_TF_VALUE_COUNT];
   int32_t aDates[2];
   aSeries.features(aValues, aDates);
-  EXPECT_EQ(aValues[CTLRX_TF_MEDIAN], N);
+  EXPECT_EQ(aValues[CTLRX_TF_MEDIAN], sN);
   EXPECT_DOUBLE_EQ(aValues[CTLRX_TF_MAX], 10 * std::log10(40 / (70.0 / 3)));
   EXPECT_EQ(aDates[0], CTLRX_TF_NO_DATE);
 }
@@ -297,18 +297,18 @@ TEST(TemporalSeries, MedianOfEveryLengthMatchesSorting) {
 
 TEST(TemporalSeries, WholeLinesMatchPixelByPixel) {
   STemporalSettings aSettings;
-  aSettings.mNull = N;
+  aSettings.mNull = sN;
   aSettings.mNormalize = true;
   for (bool &aWanted : aSettings.mWanted)
     aWanted = true;
   const std::vector<long> aDays = {0, 5, 5, 9};
-  const std::vector<double> aNulls = {-1, 0, -1, theNaN};
+  const std::vector<double> aNulls = {-1, 0, -1, sNaN};
   CTemporalSeries aSeries(aSettings, aDays, aNulls);
   const int P = 5;
   const double aRows[4 * P] = {1, -1, 3, 4e39, 0,  //
                                2, 0, 0, 1, 7,      //
                                3, 2, 5, 1e-45, 7,  //
-                               theNaN, 1, 2, 3, 7};
+                               sNaN, 1, 2, 3, 7};
   std::vector<float> aValues(12 * P);
   std::vector<int32_t> aDates(P), aUnused(P, 123);
   STemporalLines aLines;
@@ -355,7 +355,7 @@ TEST(TemporalSeries, BlocksOfPixelsGiveThePixelByPixelResultsBitForBit) {
   } aCases[] = {{{0, 12, 24, 36, 48, 60, 72, 84}, false, false, 1e100, -1},
                 {{0, 12, 24, 36, 48, 60, 72, 84}, true, true, 1e100, 5},
                 {{0, 5, 5, 9, 30}, true, false, 0.3, 0},
-                {{3, 4}, false, true, 2.0, theNaN},
+                {{3, 4}, false, true, 2.0, sNaN},
                 {{0, 7, 14, 21, 28, 35, 42, 49, 56, 63, 70, 77, 84, 91, 98, 105, 112, 119, 126, 133},
                  false, false, 1e100, -1}};
   for (const SCase &aCase : aCases) {
@@ -377,7 +377,7 @@ TEST(TemporalSeries, BlocksOfPixelsGiveThePixelByPixelResultsBitForBit) {
         if (k == 0)
           v = aNulls[i];
         else if (k == 1)
-          v = theNaN;
+          v = sNaN;
         else if (k == 2)
           v = 5.0;
         else if (k == 3)

@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr double theNull = -9999.0;
+constexpr double sNull = -9999.0;
 
 class TextureStepTest : public WindowStepTest {
 protected:
@@ -51,9 +51,9 @@ TEST_F(TextureStepTest, MatchesDirectWindowsOddEvenAndLargerThanTheImage) {
   for (const auto &aWindow : aWindows) {
     const std::string aWhat = std::to_string(aWindow.first) + " x " + std::to_string(aWindow.second);
     expectMatches(texture("amp", aWindow.first, aWindow.second),
-                  refTexture(aImage, false, aWindow.first, aWindow.second, theNull), theNull, "amplitude " + aWhat);
+                  refTexture(aImage, false, aWindow.first, aWindow.second, sNull), sNull, "amplitude " + aWhat);
     expectMatches(texture("pwr", aWindow.first, aWindow.second),
-                  refTexture(aImage, true, aWindow.first, aWindow.second, theNull), theNull, "power " + aWhat);
+                  refTexture(aImage, true, aWindow.first, aWindow.second, sNull), sNull, "power " + aWhat);
   }
 }
 
@@ -65,7 +65,7 @@ TEST_F(TextureStepTest, ResultHeaderIsAFloatNumberRasterWithTheDummyValue) {
   fdfReadStandardHeader(file("tex").c_str(), aHeader);
   EXPECT_STREQ(aHeader.getField("RasterInfo.CellType").getString(), "FLOAT");
   EXPECT_STREQ(aHeader.getField("RasterInfo.DataUnits").getString(), "NUMBER");
-  EXPECT_EQ(aHeader.getField("RasterInfo.NullCellValue").getDouble(), theNull);
+  EXPECT_EQ(aHeader.getField("RasterInfo.NullCellValue").getDouble(), sNull);
   EXPECT_EQ(aHeader.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 7);
   EXPECT_EQ(aHeader.getField("RasterInfo.NrOfPixelsPerLine").getInteger(), 9);
   EXPECT_EQ(aHeader.getField("RasterInfo.HeaderOffset").getInteger(), 0);
@@ -83,7 +83,7 @@ TEST_F(TextureStepTest, ConstantImageGivesZeroExceptAtNoData) {
   const std::vector<double> aOut = texture("five", 3, 3);
   for (int l = 0; l < 12; ++l)
     for (int j = 0; j < 15; ++j)
-      EXPECT_EQ(aOut[static_cast<size_t>(l) * 15 + j], aImage.valid(l, j) ? 0.0 : theNull) << l << ", " << j;
+      EXPECT_EQ(aOut[static_cast<size_t>(l) * 15 + j], aImage.valid(l, j) ? 0.0 : sNull) << l << ", " << j;
   // A value with no exact binary form in the largest window: 0, never NaN.
   write("tenth", constantImage(40, 600, 0.1), "AMPLITUDE");
   for (double aValue : texture("tenth", 500, 500)) {
@@ -105,9 +105,9 @@ TEST_F(TextureStepTest, ZeroWindowAndInvalidCentreGiveTheNullValue) {
   aImage.mValid[6] = 0;        // invalid pixel next to it
   write("z", aImage, "AMPLITUDE", -1.0);
   const std::vector<double> aOut = texture("z", 3, 3);
-  EXPECT_EQ(aOut[0], theNull);  // window all zeros: no division by a zero mean
-  EXPECT_EQ(aOut[6], theNull);  // itself invalid although its window holds 3
-  EXPECT_NE(aOut[12], theNull); // holds the 3
+  EXPECT_EQ(aOut[0], sNull);  // window all zeros: no division by a zero mean
+  EXPECT_EQ(aOut[6], sNull);  // itself invalid although its window holds 3
+  EXPECT_NE(aOut[12], sNull); // holds the 3
 }
 
 // Guards the NaN fault: a NaN cell (with a numeric null value) must stay out
@@ -117,7 +117,7 @@ TEST_F(TextureStepTest, NaNCellCountsAsNoData) {
   STestImage aImage = smallImage(9, 1.0, 4.0);
   aImage.mValues[20] = std::numeric_limits<double>::quiet_NaN();
   write("nan", aImage, "AMPLITUDE");
-  expectMatches(texture("nan", 3, 3), refTexture(aImage, false, 3, 3, theNull), theNull, "NaN cell");
+  expectMatches(texture("nan", 3, 3), refTexture(aImage, false, 3, 3, sNull), sNull, "NaN cell");
 }
 
 // Guards the copied scale factor: the result's values are written unscaled,
@@ -130,7 +130,7 @@ TEST_F(TextureStepTest, InputScaleFactorIsNotCopiedToTheResult) {
   aHeader.getField("RasterInfo.RealScaleFactor").setDouble(3.0);
   ASSERT_TRUE(fdfWriteStandardHeader(file("s").c_str(), aHeader));
   // The coefficient of variation does not change with the scale.
-  expectMatches(texture("s", 3, 5), refTexture(aImage, false, 3, 5, theNull), theNull, "scaled input");
+  expectMatches(texture("s", 3, 5), refTexture(aImage, false, 3, 5, sNull), sNull, "scaled input");
 }
 
 TEST_F(TextureStepTest, ErrorsAndTheirCodes) {
@@ -169,7 +169,7 @@ TEST_F(TextureStepTest, ImageSmallerThanTheWindowUsesClippedWindows) {
   aImage.mValues.resize(18);
   aImage.mValid.resize(18);
   write("two", aImage, "AMPLITUDE");
-  expectMatches(texture("two", 5, 21), refTexture(aImage, false, 5, 21, theNull), theNull, "2 lines");
+  expectMatches(texture("two", 5, 21), refTexture(aImage, false, 5, 21, sNull), sNull, "2 lines");
 }
 
 // The line loop sends progress, and the host's interruption stops it there.

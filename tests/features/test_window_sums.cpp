@@ -14,7 +14,7 @@
 
 namespace {
 
-constexpr double theNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double sNaN = std::numeric_limits<double>::quiet_NaN();
 
 // A 7 x 9 image with no-data pixels on the corners, an edge and inside,
 // among them the first pixel of several lines.
@@ -57,7 +57,7 @@ TEST(RowWindowSum, MatchesDirectSumsForEveryWidthAndLength) {
       aTerm = aEngine() % 4 == 0 ? 0.0 : aValue(aEngine);
     for (int aWidth = 1; aWidth <= 31; ++aWidth) {
       const int aLeft = aWidth / 2;
-      std::vector<double> aSums(aPixels, theNaN);
+      std::vector<double> aSums(aPixels, sNaN);
       std::vector<int32_t> aNonZero(aPixels, -1);
       fdfRowWindowSum(aTerms.data(), aPixels, aLeft, aWidth, aSums.data(), aNonZero.data());
       for (int j = 0; j < aPixels; ++j) {
@@ -280,7 +280,7 @@ TEST(TextureLine, NullsZeroMeanAndRoundingBelowZero) {
 }
 
 TEST(TextureTerms, PowerIsTakenToAmplitudeAndNonFiniteValuesDoNotCount) {
-  const double aValues[5] = {4.0, -9.0, theNaN, std::numeric_limits<double>::infinity(), 2.0};
+  const double aValues[5] = {4.0, -9.0, sNaN, std::numeric_limits<double>::infinity(), 2.0};
   const int32_t aMask[5] = {1, 1, 1, 1, 0};
   std::vector<double> aStore(3 * 5);
   double *aTerms[3] = {&aStore[0], &aStore[5], &aStore[10]};

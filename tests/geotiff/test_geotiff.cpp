@@ -33,8 +33,8 @@
 
 namespace {
 
-constexpr double kPi = 3.14159265358979323846;
-constexpr double kThird = 1.0 / 3.0;
+constexpr double sPi = 3.14159265358979323846;
+constexpr double sThird = 1.0 / 3.0;
 
 void noSleep(double) {}
 
@@ -131,10 +131,10 @@ protected:
 // ---------------------------------------------------------------- pure rules
 
 TEST(GeoTiffRules, ArgumentsOutsideTheirDomainTakeTheDefaults) {
-  EXPECT_DOUBLE_EQ(fdfTiffSaturation(0.0), kThird);
-  EXPECT_DOUBLE_EQ(fdfTiffSaturation(1.0e-39), kThird);
-  EXPECT_DOUBLE_EQ(fdfTiffSaturation(-0.5), kThird);
-  EXPECT_DOUBLE_EQ(fdfTiffSaturation(std::nan("")), kThird);
+  EXPECT_DOUBLE_EQ(fdfTiffSaturation(0.0), sThird);
+  EXPECT_DOUBLE_EQ(fdfTiffSaturation(1.0e-39), sThird);
+  EXPECT_DOUBLE_EQ(fdfTiffSaturation(-0.5), sThird);
+  EXPECT_DOUBLE_EQ(fdfTiffSaturation(std::nan("")), sThird);
   EXPECT_DOUBLE_EQ(fdfTiffSaturation(0.5), 0.5);
   EXPECT_EQ(fdfTiffReductionFactor(0), 1);
   EXPECT_EQ(fdfTiffReductionFactor(-3), 1);
@@ -266,8 +266,9 @@ TEST(GeoTiffRules, InverseMapsEveryLevelBackWithinItsWidth) {
       const int aLevel = aStretch.level(aValue);
       ASSERT_LE(aLevel, 254);
       // The level's width in values, from the documented formula.
+      const STLRXStretch &aShape = aStretch;
       const auto aEdge = [&](double theLevel) {
-        return aStretch.mOrigin + std::pow(std::max(theLevel, 0.0) / aStretch.mScale, 1.0 / aStretch.mExponent);
+        return aShape.mOrigin + std::pow(std::max(theLevel, 0.0) / aShape.mScale, 1.0 / aShape.mExponent);
       };
       const double aWidth = aEdge(aLevel + 0.5) - aEdge(aLevel - 0.5);
       EXPECT_LE(std::fabs(aStretch.value(aLevel) - aValue), aWidth) << aValue << " level " << aLevel;
@@ -279,14 +280,14 @@ TEST(GeoTiffRules, InverseMapsEveryLevelBackWithinItsWidth) {
   STLRXStretchRequest aPhase;
   aPhase.mFamily = ETLRXTiffFamily::kPhase;
   const STLRXStretch aWrap = fdfMakeStretch(aPhase, aAny);
-  for (double aValue = -3 * kPi; aValue < 3 * kPi; aValue += 0.0137) {
+  for (double aValue = -3 * sPi; aValue < 3 * sPi; aValue += 0.0137) {
     const double aBack = aWrap.value(aWrap.level(aValue));
-    const double aDistance = std::fabs(std::remainder(aBack - aValue, 2 * kPi));
-    EXPECT_LE(aDistance, kPi / 255 + 1e-12) << aValue;
+    const double aDistance = std::fabs(std::remainder(aBack - aValue, 2 * sPi));
+    EXPECT_LE(aDistance, sPi / 255 + 1e-12) << aValue;
   }
-  EXPECT_EQ(aWrap.level(-kPi), 0);
+  EXPECT_EQ(aWrap.level(-sPi), 0);
   EXPECT_EQ(aWrap.level(0.0), 127);
-  EXPECT_EQ(aWrap.level(kPi - 1e-9), 254);
+  EXPECT_EQ(aWrap.level(sPi - 1e-9), 254);
 }
 
 TEST(GeoTiffRules, LevelsStayInRangeAndNullAndUnknownClassesGetLevel255) {
@@ -404,7 +405,7 @@ TEST_F(GeoTiffTest, AmplitudeRasterFollowsTheDirectStretchAndReadsBack) {
   tlrxWriteFloatRaster(file("amp"), aRows, aCols, aValues, "AMPLITUDE");
   ASSERT_EQ(convert("amp", "amp.tif"), 0);
 
-  const double aScale = 254.0 * kThird / centralThirdMean(aValues, aRows, aCols);
+  const double aScale = 254.0 * sThird / centralThirdMean(aValues, aRows, aCols);
   const STLRXTiffImage aTiff = tlrxReadTiff(file("amp.tif"));
   ASSERT_EQ(aTiff.mWidth, uint32_t(aCols));
   ASSERT_EQ(aTiff.mLength, uint32_t(aRows));
@@ -438,7 +439,7 @@ TEST_F(GeoTiffTest, AmplitudeRasterFollowsTheDirectStretchAndReadsBack) {
 TEST_F(GeoTiffTest, ArgumentEdgesBehaveAsTheirDefaults) {
   const std::vector<float> aValues = rampValues(18, 15);
   tlrxWriteFloatRaster(file("r"), 18, 15, aValues, "AMPLITUDE");
-  ASSERT_EQ(convert("r", "plain.tif", kThird), 0);
+  ASSERT_EQ(convert("r", "plain.tif", sThird), 0);
   ASSERT_EQ(convert("r", "zero.tif", 0.0, 0, -2, -4.0, -1.0), 0);
   EXPECT_EQ(tlrxReadTiff(file("zero.tif")).mPixels, tlrxReadTiff(file("plain.tif")).mPixels);
   const SHeaderStretch aPlain = readTiffHeader(file("plain.tif"));
@@ -464,7 +465,7 @@ TEST_F(GeoTiffTest, SignedIntensitiesAndNullCells) {
   tlrxWriteFloatRaster(file("db"), aRows, aCols, aSigned, "RATIO", &aNoData);
   ASSERT_EQ(convert("db", "db.tif", 0.0, 1, 1, 1.0, 2.0), 0);
   const double aMean = centralThirdMean(aSigned, aRows, aCols);
-  const double aScale = 0.5 * 254 * kThird / std::fabs(aMean);
+  const double aScale = 0.5 * 254 * sThird / std::fabs(aMean);
   const STLRXTiffImage aDb = tlrxReadTiff(file("db.tif"));
   EXPECT_EQ(aDb.at(0, 0), 127);
   for (size_t i = 0; i < aSigned.size(); ++i)
@@ -510,7 +511,7 @@ TEST_F(GeoTiffTest, ComplexSlcIsShownAsAmplitude) {
   tlrxGeoTiffHeader(aHeader, aRows, aCols, "SHORT_COMPLEX", "SLC");
   tlrxWriteGeoTiffRaster(file("slc"), aHeader, aCells.data());
   ASSERT_EQ(convert("slc", "slc.tif"), 0);
-  const double aScale = 254 * kThird / centralThirdMean(aAmplitude, aRows, aCols);
+  const double aScale = 254 * sThird / centralThirdMean(aAmplitude, aRows, aCols);
   const STLRXTiffImage aTiff = tlrxReadTiff(file("slc.tif"));
   for (size_t i = 0; i < aAmplitude.size(); ++i)
     ASSERT_EQ(aTiff.mPixels[i], std::min(254, roundHalfUp(aScale * aAmplitude[i]))) << i;
@@ -605,7 +606,7 @@ TEST_F(GeoTiffTest, UtmSouthGeographicOtherAndNoState) {
     EXPECT_EQ(aKeys.shortValue(CTLRX_GEOG_ELLIPSOID), 7030);
     EXPECT_EQ(aKeys.shortValue(CTLRX_GEOG_PRIME_MERIDIAN), 8901);
     EXPECT_EQ(aKeys.shortValue(CTLRX_GEOG_ANGULAR_UNITS), 9102);
-    EXPECT_NEAR(aKeys.doubleValue(CTLRX_GEOG_ANGULAR_UNIT_SIZE), kPi / 180.0, 1e-15);
+    EXPECT_NEAR(aKeys.doubleValue(CTLRX_GEOG_ANGULAR_UNIT_SIZE), sPi / 180.0, 1e-15);
     EXPECT_EQ(aKeys.text(CTLRX_GT_CITATION), "Geographic Model WGS 84");
     EXPECT_EQ(aKeys.text(CTLRX_GEOG_CITATION), "WGS 84 Ellipsoid Used");
   }
@@ -645,16 +646,16 @@ TEST_F(GeoTiffTest, InterferogramPhaseThroughTheHeaderPaletteOrAColourWheel) {
   std::vector<float> aCells(size_t(aRows) * aCols * 2);
   std::vector<double> aPhase(size_t(aRows) * aCols);
   for (size_t i = 0; i < aPhase.size(); ++i) {
-    aPhase[i] = -kPi + 0.3 + 0.09 * i; // past pi: wraps round
+    aPhase[i] = -sPi + 0.3 + 0.09 * i; // past pi: wraps round
     const double aMagnitude = 0.2 + 0.01 * (i % 50);
     aCells[2 * i] = static_cast<float>(aMagnitude * std::cos(aPhase[i]));
     aCells[2 * i + 1] = static_cast<float>(aMagnitude * std::sin(aPhase[i]));
   }
   CDescription aHeader;
   tlrxGeoTiffHeader(aHeader, aRows, aCols, "FLOAT_COMPLEX", "INTERFEROGRAMME");
-  const char *kLuts[3] = {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"};
+  const char *aLuts[3] = {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"};
   for (int c = 0; c < 3; ++c) {
-    CDescriptionField &aLut = aHeader.getField(kLuts[c]);
+    CDescriptionField &aLut = aHeader.getField(aLuts[c]);
     aLut.setNumberOfElements(256);
     for (int k = 0; k < 256; ++k)
       aLut.setInteger(k, c == 0 ? k : c == 1 ? 255 - k : k / 2);
@@ -668,14 +669,14 @@ TEST_F(GeoTiffTest, InterferogramPhaseThroughTheHeaderPaletteOrAColourWheel) {
   EXPECT_EQ(aTiff.mGreen[200], 55 * 257);
   EXPECT_EQ(aTiff.mBlue[255], 127 * 257);
   for (size_t i = 0; i < aPhase.size(); ++i) {
-    const double aTurn = (aPhase[i] + kPi) / (2 * kPi);
+    const double aTurn = (aPhase[i] + sPi) / (2 * sPi);
     const int aExpected = int(std::floor((aTurn - std::floor(aTurn)) * 255.0)) % 255;
     const int aApart = std::abs(aTiff.mPixels[i] - aExpected);
     ASSERT_LE(std::min(aApart, 255 - aApart), 1) << i; // float cells blur exact edges; levels wrap
   }
   const SHeaderStretch aStretch = readTiffHeader(file("ifg.tif"));
-  EXPECT_NEAR(aStretch.mMin, -kPi + kPi / 255, 1e-12);
-  EXPECT_NEAR(aStretch.mScale, 255 / (2 * kPi), 1e-12);
+  EXPECT_NEAR(aStretch.mMin, -sPi + sPi / 255, 1e-12);
+  EXPECT_NEAR(aStretch.mScale, 255 / (2 * sPi), 1e-12);
 
   CDescription aBare;
   tlrxGeoTiffHeader(aBare, aRows, aCols, "FLOAT_COMPLEX", "FLATTENED INTERFEROGRAMME");
@@ -882,7 +883,7 @@ TEST_F(GeoTiffTest, ArgumentVectorEntry) {
   char *aTwo[] = {aName.data(), aIn.data(), aOut.data()};
   ASSERT_EQ(make_tiff(3, aTwo), 0);
   const SHeaderStretch aDefaults = readTiffHeader(aOut);
-  EXPECT_NEAR(aDefaults.mScale, 254 * kThird / centralThirdMean(aValues, 12, 20), 1e-9);
+  EXPECT_NEAR(aDefaults.mScale, 254 * sThird / centralThirdMean(aValues, 12, 20), 1e-9);
   const STLRXTiffImage aPlain = tlrxReadTiff(aOut);
 
   // Number arguments are read whole: each of these is refused, naming it.

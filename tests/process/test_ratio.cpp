@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr double theNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double sNaN = std::numeric_limits<double>::quiet_NaN();
 
 class RatioTest : public ::testing::Test {
 protected:
@@ -124,8 +124,8 @@ TEST_F(RatioTest, ResultHeaderNamesItsInputsAndDates) {
 TEST_F(RatioTest, NaNNullsGiveTheNaNDummyValue) {
   const auto aEnv = std::map<std::string, std::string>{{"TELLURIX_INIT_DIR", mDir.path()}};
   tlrxWriteConfiguration(mDir.path(), {{14, "NaN"}});
-  image("a", {theNaN, 1, 2, 3}, true, theNaN);
-  image("b", {1, 1, 1, 1}, true, theNaN);
+  image("a", {sNaN, 1, 2, 3}, true, sNaN);
+  image("b", {1, 1, 1, 1}, true, sNaN);
   ASSERT_EQ(tlrxRunMain(arguments({"a", "b"}, "out"), mDir.path(), aEnv).mExitStatus, 0);
   const std::vector<double> aOut = tlrxReadTestRaster(mDir.file("out_rto"));
   EXPECT_TRUE(std::isnan(aOut[0]));

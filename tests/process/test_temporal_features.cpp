@@ -14,12 +14,12 @@
 
 namespace {
 
-constexpr double theNaN = std::numeric_limits<double>::quiet_NaN();
-constexpr double theTolerance = 1.1754943508222875e-38;
+constexpr double sNaN = std::numeric_limits<double>::quiet_NaN();
+constexpr double sTolerance = 1.1754943508222875e-38;
 
-const char *const theSuffixes[14] = {"_mea",  "_std",  "_med",  "_grad", "_max",  "_min",     "_spanD",
+const char *const sSuffixes[14] = {"_mea",  "_std",  "_med",  "_grad", "_max",  "_min",     "_spanD",
                                      "_maxI", "_maxD", "_spanR", "_maxR", "_minR", "_dateMax", "_dateMinBeforeMax"};
-const char *const theSwitches[14] = {"mean",          "std",           "median",           "gradient",
+const char *const sSwitches[14] = {"mean",          "std",           "median",           "gradient",
                                      "max",           "min",           "span_max_less_min", "max_less_min_sup",
                                      "max_less_min_inf", "span_max_on_min", "max_on_min_sup", "max_on_min_inf",
                                      "date_max",      "date_min_before_max"};
@@ -34,7 +34,7 @@ struct SReference {
 bool isNoData(double theValue, double theNull) {
   if (std::isnan(theNull))
     return std::isnan(theValue);
-  return std::isnan(theValue) || (theNull - theTolerance <= theValue && theValue <= theNull + theTolerance);
+  return std::isnan(theValue) || (theNull - sTolerance <= theValue && theValue <= theNull + sTolerance);
 }
 
 SReference reference(const std::vector<double> &theSeries, const std::vector<double> &theNulls,
@@ -78,24 +78,24 @@ SReference reference(const std::vector<double> &theSeries, const std::vector<dou
     std::sort(aList->begin(), aList->end());
   double *r = aRef.mValue;
   bool aSet[12] = {};
-  auto put = [&](int f, double x) {
+  auto aPut = [&](int f, double x) {
     r[f] = x;
     aSet[f] = true;
   };
-  put(0, M);
-  put(2, k > 2 ? V[(k - 1) / 2] : k == 2 ? (V[0] + V[1]) / 2 : V[0]);
-  put(4, V[k - 1]);
-  put(5, V[0]);
-  put(6, V[k - 1] - V[0]);
-  put(9, V[k - 1] / V[0]);
+  aPut(0, M);
+  aPut(2, k > 2 ? V[(k - 1) / 2] : k == 2 ? (V[0] + V[1]) / 2 : V[0]);
+  aPut(4, V[k - 1]);
+  aPut(5, V[0]);
+  aPut(6, V[k - 1] - V[0]);
+  aPut(9, V[k - 1] / V[0]);
   if (k > 1) {
-    put(7, Dv[k - 2]);
-    put(8, Dv[0]);
-    put(10, Rv[k - 2]);
-    put(11, Rv[0]);
-    put(3, A[k - 2]);
+    aPut(7, Dv[k - 2]);
+    aPut(8, Dv[0]);
+    aPut(10, Rv[k - 2]);
+    aPut(11, Rv[0]);
+    aPut(3, A[k - 2]);
     if (aCount > 0)
-      put(1, std::sqrt(aSquares / aCount));
+      aPut(1, std::sqrt(aSquares / aCount));
   }
   for (int f : {1, 3, 4, 5, 6, 7, 8, 9, 10, 11})
     if (theNormalize && aSet[f]) {
@@ -148,7 +148,7 @@ protected:
       aParameters.mInputs.push_back(mDir.file(aInput));
     aParameters.mRoot = mDir.file("out");
     if (theAll)
-      for (const char *aSwitch : theSwitches)
+      for (const char *aSwitch : sSwitches)
         aParameters.mSettings.push_back({aSwitch, "OK"});
     return aParameters;
   }
@@ -165,7 +165,7 @@ protected:
 
   // No result, temporary grid header or list file left beside the root.
   void expectNothingWritten() {
-    for (const char *aSuffix : theSuffixes)
+    for (const char *aSuffix : sSuffixes)
       for (const char *aCompanion : {"", "_hdr", ".sml", ".hdr"})
         EXPECT_FALSE(tlrxFileExists(mDir.file(std::string("out") + aSuffix + aCompanion))) << aSuffix << aCompanion;
     for (const char *aCompanion : {"_hdr", ".sml", ".hdr", ".txt"})
@@ -215,10 +215,10 @@ TEST_F(TemporalFeaturesTest, SeriesFromTheExamplesGivesEveryFeature) {
       {15, n, n},      {-5, n, n},                {3, n, 1},  {2, n, n},  {0.75, n, n}, {36, -9999, 12},
       {0, -9999, -9999}};
   for (int f = 0; f < 14; ++f) {
-    const std::vector<double> aResult = result(theSuffixes[f]);
+    const std::vector<double> aResult = result(sSuffixes[f]);
     ASSERT_EQ(aResult.size(), 3u);
     for (int x = 0; x < 3; ++x)
-      expectNear(aResult[x], aExpected[f][x], std::string(theSuffixes[f]) + " pixel " + std::to_string(x));
+      expectNear(aResult[x], aExpected[f][x], std::string(sSuffixes[f]) + " pixel " + std::to_string(x));
   }
 }
 
@@ -227,7 +227,7 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
   // data under three different null values; two acquisitions on one day.
   const int aLines = 7, aPixels = 9, aImages = 6;
   const std::vector<int> aDayOf = {30, 0, 12, 12, 47, 60};
-  const std::vector<double> aNullOf = {-1, 0, theNaN, -1, -9999, 0};
+  const std::vector<double> aNullOf = {-1, 0, sNaN, -1, -9999, 0};
   std::mt19937 aRandom(20240611);
   std::gamma_distribution<double> aSpeckle(1.0, 1.0);
   std::uniform_int_distribution<int> aDraw(0, 19);
@@ -263,7 +263,7 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
     const STLRXRun aRun = run(aParameters);
     ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
     std::vector<std::vector<double>> aResults;
-    for (const char *aSuffix : theSuffixes)
+    for (const char *aSuffix : sSuffixes)
       aResults.push_back(result(aSuffix));
     std::vector<double> aNulls;
     std::vector<long> aDays;
@@ -277,9 +277,9 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
         aSeries.push_back(aStack[i][p]);
       const SReference aRef = reference(aSeries, aNulls, aDays, -1, aCase.mRatioTime, aCase.mNormalize, aCase.mDb);
       for (int f = 0; f < 12; ++f)
-        expectNear(aResults[f][p], aRef.mValue[f], std::string(theSuffixes[f]) + " pixel " + std::to_string(p));
+        expectNear(aResults[f][p], aRef.mValue[f], std::string(sSuffixes[f]) + " pixel " + std::to_string(p));
       for (int f = 0; f < 2; ++f)
-        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
+        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << sSuffixes[12 + f] << " pixel " << p;
     }
   }
 }
@@ -513,7 +513,7 @@ TEST_F(TemporalFeaturesTest, SimulatedSeriesMatchesTheDirectComputationWithRejec
     const STLRXRun aRun = run(aParameters);
     ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
     std::vector<std::vector<double>> aResults;
-    for (const char *aSuffix : theSuffixes)
+    for (const char *aSuffix : sSuffixes)
       aResults.push_back(result(aSuffix));
     const double aRatioTime = aStrict ? std::pow(10.0, 0.3) / 20 : 1e100;
     int aRejecting = 0;
@@ -525,9 +525,9 @@ TEST_F(TemporalFeaturesTest, SimulatedSeriesMatchesTheDirectComputationWithRejec
       const SReference aAll = reference(aSeries, aNulls, aDays, -9999, 1e100, aStrict, false);
       aRejecting += aRef.mValue[0] != aAll.mValue[0];
       for (int f = 0; f < 12; ++f)
-        expectNear(aResults[f][p], aRef.mValue[f], std::string(theSuffixes[f]) + " pixel " + std::to_string(p));
+        expectNear(aResults[f][p], aRef.mValue[f], std::string(sSuffixes[f]) + " pixel " + std::to_string(p));
       for (int f = 0; f < 2; ++f)
-        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << theSuffixes[12 + f] << " pixel " << p;
+        EXPECT_EQ(aResults[12 + f][p], aRef.mDate[f]) << sSuffixes[12 + f] << " pixel " << p;
     }
     if (aStrict) {
       EXPECT_GT(aRejecting, 100);
@@ -567,7 +567,7 @@ TEST_F(TemporalFeaturesTest, SimulatedGeocodedSeriesLandsCellForCell) {
   for (const SImage &aImage : aImages)
     aData.push_back(tlrxReadTestRaster(mDir.file(aImage.mName)));
   std::vector<std::vector<double>> aResults;
-  for (const char *aSuffix : theSuffixes)
+  for (const char *aSuffix : sSuffixes)
     aResults.push_back(result(aSuffix));
   // Null of the first listed image (geo_03).
   const double n = -9999;
@@ -583,10 +583,10 @@ TEST_F(TemporalFeaturesTest, SimulatedGeocodedSeriesLandsCellForCell) {
       }
       const SReference aRef = reference(aSeries, {n, n, n}, {0, 12, 24}, n, 1e100, false, false);
       for (int f = 0; f < 12; ++f)
-        expectNear(aResults[f][r * 32 + c], aRef.mValue[f], std::string(theSuffixes[f]) + " " + std::to_string(r) +
+        expectNear(aResults[f][r * 32 + c], aRef.mValue[f], std::string(sSuffixes[f]) + " " + std::to_string(r) +
                                                                  "," + std::to_string(c));
       for (int f = 0; f < 2; ++f)
-        EXPECT_EQ(aResults[12 + f][r * 32 + c], aRef.mDate[f]) << theSuffixes[12 + f] << " " << r << "," << c;
+        EXPECT_EQ(aResults[12 + f][r * 32 + c], aRef.mDate[f]) << sSuffixes[12 + f] << " " << r << "," << c;
     }
 }
 

@@ -20,7 +20,7 @@ struct SCellTypeRow {
 };
 
 // The vocabulary as headers use it, written out independently of the library.
-const std::vector<SCellTypeRow> theCellTypes = {
+const std::vector<SCellTypeRow> sCellTypes = {
     {0, "BYTE", 1, 1},           {1, "BYTE_COMPLEX", 2, 2},   {2, "UNSIGNED_BYTE", 1, 1},
     {3, "UBYTE_COMPLEX", 2, 2},  {4, "SHORT", 2, 1},          {5, "UNSIGNED_SHORT", 2, 1},
     {6, "SHORT_COMPLEX", 4, 2},  {7, "FLOAT", 4, 1},          {8, "FLOAT_COMPLEX", 8, 2},
@@ -28,7 +28,7 @@ const std::vector<SCellTypeRow> theCellTypes = {
     {12, "INT", 4, 1},           {13, "BIT", 1, 1},           {14, "UNSIGNED_SHORT_COMPLEX", 4, 2},
 };
 
-const std::vector<std::string> theDataUnits = {
+const std::vector<std::string> sDataUnits = {
     "POWER",          "AMPLITUDE",        "SQUARE ROOT",        "COHERENCE",
     "INTERFEROGRAMME", "SLC",             "CLASSIFICATION",     "RATIO",
     "NUMBER",         "OPTICAL NUMBER",   "ERS RAW",            "UNWRAPPED PHASE",
@@ -44,8 +44,8 @@ const std::vector<std::string> theDataUnits = {
 } // namespace
 
 TEST(CellTypes, EveryNameHasItsCodeSizeAndValueCount) {
-  ASSERT_EQ(theCellTypes.size(), static_cast<size_t>(CTLRX_NBR_CELL_TYPES));
-  for (const SCellTypeRow &aRow : theCellTypes) {
+  ASSERT_EQ(sCellTypes.size(), static_cast<size_t>(CTLRX_NBR_CELL_TYPES));
+  for (const SCellTypeRow &aRow : sCellTypes) {
     EXPECT_EQ(fdfCellTypeFromName(aRow.mName), aRow.mCode) << aRow.mName;
     EXPECT_STREQ(fdfCellTypeName(aRow.mCode), aRow.mName);
     int32_t aValues = -7;
@@ -89,10 +89,10 @@ TEST(CellTypes, UnsupportedSizeIsTraced) {
 }
 
 TEST(DataUnits, EveryNameHasItsCode) {
-  ASSERT_EQ(theDataUnits.size(), static_cast<size_t>(CTLRX_NBR_DATA_UNITS));
-  for (size_t i = 0; i < theDataUnits.size(); ++i) {
-    EXPECT_EQ(fdfDataUnitsFromName(theDataUnits[i].c_str()), static_cast<int32_t>(i)) << theDataUnits[i];
-    EXPECT_STREQ(fdfDataUnitsName(static_cast<int32_t>(i)), theDataUnits[i].c_str());
+  ASSERT_EQ(sDataUnits.size(), static_cast<size_t>(CTLRX_NBR_DATA_UNITS));
+  for (size_t i = 0; i < sDataUnits.size(); ++i) {
+    EXPECT_EQ(fdfDataUnitsFromName(sDataUnits[i].c_str()), static_cast<int32_t>(i)) << sDataUnits[i];
+    EXPECT_STREQ(fdfDataUnitsName(static_cast<int32_t>(i)), sDataUnits[i].c_str());
   }
   EXPECT_EQ(CTLRX_UNITS_INTERFEROGRAMME, 4);
   EXPECT_EQ(CTLRX_UNITS_FLATTENED_INTERFEROGRAMME, 15);

@@ -23,7 +23,7 @@
 
 namespace {
 
-constexpr double theTolerance = 1.1754943508222875e-38;
+constexpr double sTolerance = 1.1754943508222875e-38;
 
 bool machineIsMSBF() {
   const uint16_t aProbe = 1;
@@ -42,7 +42,7 @@ struct STypeInfo {
   EKind mKind;
 };
 
-const std::vector<STypeInfo> theTypes = {
+const std::vector<STypeInfo> sTypes = {
     {0, 1, 1, EKind::kSigned},   {1, 1, 2, EKind::kSigned},   {2, 1, 1, EKind::kUnsigned},
     {3, 1, 2, EKind::kUnsigned}, {4, 2, 1, EKind::kSigned},   {5, 2, 1, EKind::kUnsigned},
     {6, 2, 2, EKind::kSigned},   {7, 4, 1, EKind::kFloat},    {8, 4, 2, EKind::kFloat},
@@ -132,7 +132,7 @@ double expectedValue(const std::vector<double> &theCell, double theNull, double 
                      bool theAmplitude) {
   const auto aIsNull = [&](double theValue) {
     return (std::isnan(theNull) && std::isnan(theValue)) ||
-           (theNull - theTolerance <= theValue && theValue <= theNull + theTolerance);
+           (theNull - sTolerance <= theValue && theValue <= theNull + sTolerance);
   };
   const bool aScale = !(theRealScale == 1.0 && theImagScale == 1.0);
   if (theCell.size() == 1)
@@ -220,7 +220,7 @@ TEST_F(RasterFileTest, EveryCellTypeRoundTripsInBothByteOrdersAndLayouts) {
       {{7, 3, 5}, true, 1.0, 1.0},
       {{16, 0, 2}, true, 0.5, 1.0},
   };
-  for (const STypeInfo &aType : theTypes) {
+  for (const STypeInfo &aType : sTypes) {
     for (size_t k = 0; k < aCases.size(); ++k) {
       const SRoundTripCase &aCase = aCases[k];
       const std::string aWhat = std::string(fdfCellTypeName(aType.mCode)) + " case " + std::to_string(k);
@@ -348,7 +348,7 @@ TEST_F(RasterFileTest, BitRastersPackEightPixelsPerByte) {
 }
 
 TEST_F(RasterFileTest, ReversedLinesAndPixelsFollowTheCallersOrder) {
-  const STypeInfo &aType = theTypes[7]; // FLOAT
+  const STypeInfo &aType = sTypes[7]; // FLOAT
   const TGrid aGrid = makeGrid(aType, 6, 8, 7.0);
   CRasterFileParam aParam = param("rev.raw", CTLRX_CELL_FLOAT, 6, 8);
   aParam.mNullCellValue = 7.0;
@@ -471,7 +471,7 @@ std::complex<double> expectedComplex(const std::vector<double> &theCell, double 
                                      double theImagScale, bool &theValid) {
   const auto aIsNull = [&](double theValue) {
     return (std::isnan(theNull) && std::isnan(theValue)) ||
-           (theNull - theTolerance <= theValue && theValue <= theNull + theTolerance);
+           (theNull - sTolerance <= theValue && theValue <= theNull + sTolerance);
   };
   theValid = !(aIsNull(theCell[0]) && aIsNull(theCell[1]));
   return theValid ? std::complex<double>(theCell[0] * theRealScale, theCell[1] * theImagScale)
@@ -505,7 +505,7 @@ TEST_F(RasterFileTest, ComplexLinesOfEveryComplexTypeInBothByteOrders) {
   const int aCols = 6;
   const std::vector<SRoundTripCase> aCases = {
       {{0, 0, 0}, false, 2.0, 0.5}, {{5, 2, 3}, true, 2.0, 0.5}, {{0, 0, 0}, true, 1.0, 1.0}};
-  for (const STypeInfo &aType : theTypes) {
+  for (const STypeInfo &aType : sTypes) {
     if (aType.mValues != 2)
       continue;
     for (size_t k = 0; k < aCases.size(); ++k) {
@@ -604,7 +604,7 @@ TEST_F(RasterFileTest, ReadCacheServesItsLinesInBothDirections) {
   // straight into the cache, so what the cache holds is all the object has.
   const int aRows = 10;
   const int aCols = 65536;
-  const STypeInfo &aType = theTypes[7];
+  const STypeInfo &aType = sTypes[7];
   const TGrid aGrid = makeGrid(aType, aRows, aCols, -1.0);
   CRasterFileParam aParam = param("cache.raw", CTLRX_CELL_FLOAT, aRows, aCols);
   aParam.mNullCellValue = -1.0;
@@ -646,7 +646,7 @@ TEST_F(RasterFileTest, ReadCacheServesItsLinesInBothDirections) {
 }
 
 TEST_F(RasterFileTest, ReadCacheRefillsWhenTheColumnsChange) {
-  const STypeInfo &aType = theTypes[4]; // SHORT
+  const STypeInfo &aType = sTypes[4]; // SHORT
   const TGrid aGrid = makeGrid(aType, 6, 9, 7.0);
   CRasterFileParam aParam = param("cols.raw", CTLRX_CELL_SHORT, 6, 9);
   aParam.mNullCellValue = 7.0;
@@ -665,7 +665,7 @@ TEST_F(RasterFileTest, ReadCacheRefillsWhenTheColumnsChange) {
 TEST_F(RasterFileTest, WriteCacheQueuesLinesUntilFullOrClosed) {
   const int aRows = 7;
   const int aCols = 5;
-  const STypeInfo &aType = theTypes[8]; // FLOAT_COMPLEX
+  const STypeInfo &aType = sTypes[8]; // FLOAT_COMPLEX
   const TGrid aGrid = makeGrid(aType, aRows, aCols, 7.0);
   CRasterFileParam aParam = param("wcache.raw", CTLRX_CELL_FLOAT_COMPLEX, aRows, aCols);
   aParam.mMSBF = true;
@@ -700,7 +700,7 @@ TEST_F(RasterFileTest, CacheOnlyInReadOrWriteMode) {
 // ------------------------------------------------------- update in place
 
 TEST_F(RasterFileTest, UpdateWritesOnlyTheCellsAndKeepsPrefixesAndOtherColumns) {
-  const STypeInfo &aType = theTypes[4]; // SHORT
+  const STypeInfo &aType = sTypes[4]; // SHORT
   TGrid aGrid = makeGrid(aType, 4, 6, 7.0);
   CRasterFileParam aParam = param("upd.raw", CTLRX_CELL_SHORT, 4, 6);
   aParam.mRowPrefix = 3;

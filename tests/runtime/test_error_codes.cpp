@@ -13,7 +13,7 @@
 
 namespace {
 
-const std::string theCatalogue = tlrxDataDir() + "/des_files/tlrx_errors_catalog.des";
+const std::string sCatalogue = tlrxDataDir() + "/des_files/tlrx_errors_catalog.des";
 
 // "a-b" for runs of consecutive codes, joined by ", ".
 std::string tlrxCodeRanges(const std::vector<int32_t> &theCodes) {
@@ -33,7 +33,7 @@ std::string tlrxCodeRanges(const std::vector<int32_t> &theCodes) {
 // catalogue's CLASSES block.
 std::vector<std::string> tlrxClassMeanings() {
   std::vector<std::string> aMeanings;
-  const std::vector<std::string> aLines = tlrxReadLines(theCatalogue);
+  const std::vector<std::string> aLines = tlrxReadLines(sCatalogue);
   for (size_t i = 2; i < aLines.size() && aLines[i] != "TEXTS"; ++i)
     aMeanings.push_back(aLines[i].substr(aLines[i].find(" , ") + 3));
   return aMeanings;
@@ -57,7 +57,7 @@ std::string tlrxExitStatusTable() {
 
 TEST(ErrorCodes, TableAndCatalogueNameTheSameCodesOnce) {
   CErrorCatalogue aCatalogue;
-  ASSERT_TRUE(aCatalogue.load(theCatalogue.c_str()));
+  ASSERT_TRUE(aCatalogue.load(sCatalogue.c_str()));
   std::set<int32_t> aTable;
   std::set<std::string> aNames;
   for (const STLRXErrorCode &aEntry : CTLRX_ERROR_CODE_TABLE) {

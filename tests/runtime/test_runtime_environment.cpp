@@ -18,8 +18,8 @@
 
 namespace {
 
-std::vector<double> theSleeps;
-void recordSleep(double theSeconds) { theSleeps.push_back(theSeconds); }
+std::vector<double> sSleeps;
+void recordSleep(double theSeconds) { sSleeps.push_back(theSeconds); }
 
 class EnvironmentTest : public ::testing::Test {
 protected:
@@ -27,7 +27,7 @@ protected:
   TLRXSleepFunction mOldSleep = nullptr;
   void SetUp() override {
     tlrxStartLibraryEnvironment(mDir.path());
-    theSleeps.clear();
+    sSleeps.clear();
     mOldSleep = fdfSetSleepFunction(recordSleep);
   }
   void TearDown() override { fdfSetSleepFunction(mOldSleep); }
@@ -196,7 +196,7 @@ TEST_F(EnvironmentTest, ProgressRewritesValueAndKeepsOrReplacesTheText) {
   EXPECT_FALSE(tlrxFileExists(workingFile() + "_batch_ok"));
   getAndSetPerc(42, 7, "step");
   EXPECT_EQ(tlrxReadFile(workingFile()), "7\nstep\n");
-  EXPECT_TRUE(theSleeps.empty());
+  EXPECT_TRUE(sSleeps.empty());
 }
 
 TEST_F(EnvironmentTest, HostValueAbove100InterruptsTheRun) {
@@ -233,7 +233,7 @@ TEST_F(EnvironmentTest, NeverSeenWorkingFileIsCreatedWithoutWaiting) {
   fdfSetWorkingFilePath(aOther);
   EXPECT_FALSE(fdfWorkingFileSeen());
   getAndSetPerc(-1, 3, "created");
-  EXPECT_TRUE(theSleeps.empty());
+  EXPECT_TRUE(sSleeps.empty());
   EXPECT_EQ(tlrxReadFile(aOther), "3\ncreated\n");
   EXPECT_TRUE(fdfWorkingFileSeen());
 }
@@ -242,7 +242,7 @@ TEST_F(EnvironmentTest, NeverSeenWorkingFileIsCreatedWithoutWaiting) {
 TEST_F(EnvironmentTest, VanishedWorkingFileIsWaitedForThenCreated) {
   ASSERT_EQ(std::remove(workingFile().c_str()), 0);
   getAndSetPerc(-1, 3, "created");
-  EXPECT_EQ(theSleeps, std::vector<double>({0, 1, 2, 3, 4, 5, 6, 7, 8, 9}));
+  EXPECT_EQ(sSleeps, std::vector<double>({0, 1, 2, 3, 4, 5, 6, 7, 8, 9}));
   EXPECT_EQ(tlrxReadFile(workingFile()), "3\ncreated\n");
 }
 
@@ -257,11 +257,11 @@ TEST_F(EnvironmentTest, UncreatableWorkingFileRaisesInterruption) {
     fdfSetWorkingFilePath(aPath);
     std::remove((aFolder + "/Process.working").c_str());
     rmdir(aFolder.c_str());
-    theSleeps.clear();
+    sSleeps.clear();
     std::string aMessage;
     EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 3, nullptr); }, &aMessage), 326400) << aExisted;
     EXPECT_EQ(aMessage, aPath);
-    EXPECT_EQ(theSleeps.size(), aExisted ? 20u : 0u) << aExisted;
+    EXPECT_EQ(sSleeps.size(), aExisted ? 20u : 0u) << aExisted;
   }
 }
 
@@ -298,10 +298,10 @@ TEST_F(EnvironmentTest, WorkingFileThatCannotBeRemovedRaises261120AfterThirtyAtt
   ASSERT_EQ(mkdir(workingFile().c_str(), 0755), 0);
   tlrxWriteFile(workingFile() + "/keep", "x");
   EXPECT_EQ(codeOf([] { fdfEndProcess(0, false, false); }), 261120);
-  EXPECT_EQ(theSleeps.size(), 30u);
-  EXPECT_EQ(theSleeps[9], 0);
-  EXPECT_EQ(theSleeps[10], 1);
-  EXPECT_EQ(theSleeps[29], 2);
+  EXPECT_EQ(sSleeps.size(), 30u);
+  EXPECT_EQ(sSleeps[9], 0);
+  EXPECT_EQ(sSleeps[10], 1);
+  EXPECT_EQ(sSleeps[29], 2);
   // Still a folder that can be entered: its mode was never touched.
   struct stat aStat;
   ASSERT_EQ(stat(workingFile().c_str(), &aStat), 0);

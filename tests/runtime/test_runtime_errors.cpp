@@ -202,7 +202,7 @@ TEST_F(ErrorsTest, WarningStatusIsMinusTwoAndShorterStatusLeavesNoTail) {
 }
 
 TEST_F(ErrorsTest, MissingWorkingFileFallsBackToTmpWaitingOnlyForOneThatExisted) {
-  static std::vector<double> theSleeps;
+  static std::vector<double> sSleeps;
   struct SCase {
     const char *mName;
     bool mExisted;
@@ -214,11 +214,11 @@ TEST_F(ErrorsTest, MissingWorkingFileFallsBackToTmpWaitingOnlyForOneThatExisted)
     fdfSetWorkingFilePath(aPath);
     // Start-up created Process.working; it goes away during the run.
     std::remove(aPath.c_str());
-    theSleeps.clear();
-    TLRXSleepFunction aOld = fdfSetSleepFunction([](double theSeconds) { theSleeps.push_back(theSeconds); });
+    sSleeps.clear();
+    TLRXSleepFunction aOld = fdfSetSleepFunction([](double theSeconds) { sSleeps.push_back(theSeconds); });
     fdfWriteErrorFile(326400, "stopped", static_cast<const char *>(nullptr));
     fdfSetSleepFunction(aOld);
-    EXPECT_EQ(theSleeps, aCase.mSleeps) << aCase.mName;
+    EXPECT_EQ(sSleeps, aCase.mSleeps) << aCase.mName;
     const std::vector<std::string> aTmp = tlrxReadLines(aPath + "_tmp");
     ASSERT_GE(aTmp.size(), 3u) << aCase.mName;
     EXPECT_EQ(aTmp[0], "PROCESSING INTERRUPTED");

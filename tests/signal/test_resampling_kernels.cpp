@@ -17,7 +17,7 @@ double apply(const SKernelTaps &theTaps, F thePolynomial) {
   return aSum;
 }
 
-const double thePositions[] = {-3.0, -0.75, 0.0, 0.1, 0.5, 0.999, 2.25, 7.6, 123.5};
+const double sPositions[] = {-3.0, -0.75, 0.0, 0.1, 0.5, 0.999, 2.25, 7.6, 123.5};
 
 } // namespace
 
@@ -54,7 +54,7 @@ TEST(ResamplingKernels, InterpolatorsReproduceTheirPolynomialsExactly) {
     int32_t mTaps, mBefore;
   } aCases[] = {{ETLRXKernel::BILINEAR, 1, 2, 0}, {ETLRXKernel::CUBIC3, 2, 4, 1}, {ETLRXKernel::CUBIC4, 3, 6, 2}};
   for (const SCase &aCase : aCases)
-    for (double x : thePositions) {
+    for (double x : sPositions) {
       SKernelTaps aTaps;
       fdfInterpolationTaps(aCase.mKernel, x, aTaps);
       ASSERT_EQ(aTaps.mCount, aCase.mTaps);
@@ -71,7 +71,7 @@ TEST(ResamplingKernels, InterpolatorsReproduceTheirPolynomialsExactly) {
 }
 
 TEST(ResamplingKernels, SincIsExactOnSamplesAndConstantsAndCloseOnARamp) {
-  for (double x : thePositions) {
+  for (double x : sPositions) {
     SKernelTaps aTaps;
     fdfInterpolationTaps(ETLRXKernel::SINC, x, aTaps);
     ASSERT_EQ(aTaps.mCount, 8);

@@ -11,8 +11,8 @@
 
 namespace {
 
-constexpr double kRadiansPerDegree = 0.017453292519943295;
-constexpr double kMetresPerMetre = 1.0;
+constexpr double sRadiansPerDegree = 0.017453292519943295;
+constexpr double sMetresPerMetre = 1.0;
 
 const CDescriptionField *scalarField(const CDescription &theHeader, const char *theKey) {
   const CDescriptionField *aField = theHeader.findField(theKey);
@@ -48,7 +48,7 @@ std::vector<STLRXGeoKey> geographicKeys() {
   return {shortKey(CTLRX_GT_MODEL_TYPE, 2),
           textKey(CTLRX_GT_CITATION, "Geographic Model WGS 84"),
           shortKey(CTLRX_GEOG_ANGULAR_UNITS, 9102),
-          doubleKey(CTLRX_GEOG_ANGULAR_UNIT_SIZE, kRadiansPerDegree),
+          doubleKey(CTLRX_GEOG_ANGULAR_UNIT_SIZE, sRadiansPerDegree),
           shortKey(CTLRX_GT_RASTER_TYPE, 1),
           shortKey(CTLRX_GEOGRAPHIC_TYPE, 4326),
           shortKey(CTLRX_GEOG_GEODETIC_DATUM, 6326),
@@ -69,17 +69,17 @@ std::vector<STLRXGeoKey> utmKeys(int theZone, bool theNorth) {
           shortKey(CTLRX_PROJECTED_CS_TYPE, (theNorth ? 32600 : 32700) + theZone),
           textKey(CTLRX_PCS_CITATION, aPcsCitation),
           shortKey(CTLRX_PROJ_LINEAR_UNITS, 9001),
-          doubleKey(CTLRX_PROJ_LINEAR_UNIT_SIZE, kMetresPerMetre)};
+          doubleKey(CTLRX_PROJ_LINEAR_UNIT_SIZE, sMetresPerMetre)};
 }
 
 // The fields present, each after its label; " UNKNOW Data" when none is.
 std::string otherCitation(const CDescription &theHeader) {
-  static const char *const kLabels[][2] = {
+  static const char *const aLabels[][2] = {
       {"| State =", "CartographicSystem.State"},       {"| Hemisphere =", "CartographicSystem.Hemisphere"},
       {"| Projection =", "CartographicSystem.Projection"}, {"| Zone =", "CartographicSystem.Zone"},
       {"| Ellipsoid =", "CartographicSystem.Ellipsoid"}, {"| DatumShift =", "CartographicSystem.DatumShift"}};
   std::string aCitation;
-  for (const auto &aLabel : kLabels) {
+  for (const auto &aLabel : aLabels) {
     std::string aValue;
     if (fieldText(theHeader, aLabel[1], aValue))
       aCitation += std::string(aLabel[0]) + aValue;
@@ -89,7 +89,7 @@ std::string otherCitation(const CDescription &theHeader) {
 
 std::vector<STLRXGeoKey> otherKeys(const CDescription &theHeader) {
   return {shortKey(CTLRX_GT_MODEL_TYPE, 1), shortKey(CTLRX_GT_RASTER_TYPE, 1),
-          shortKey(CTLRX_PROJ_LINEAR_UNITS, 9001), doubleKey(CTLRX_PROJ_LINEAR_UNIT_SIZE, kMetresPerMetre),
+          shortKey(CTLRX_PROJ_LINEAR_UNITS, 9001), doubleKey(CTLRX_PROJ_LINEAR_UNIT_SIZE, sMetresPerMetre),
           textKey(CTLRX_GT_CITATION, otherCitation(theHeader))};
 }
 

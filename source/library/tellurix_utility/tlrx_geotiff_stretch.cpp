@@ -10,7 +10,7 @@
 
 namespace {
 
-constexpr double kPi = 3.14159265358979323846;
+constexpr double sPi = 3.14159265358979323846;
 
 struct SFamilyOfUnits {
   int32_t mUnits;
@@ -18,7 +18,7 @@ struct SFamilyOfUnits {
 };
 
 // Data units with a mapping of their own; every other unit is kGeneral.
-constexpr SFamilyOfUnits kFamilies[] = {
+constexpr SFamilyOfUnits sFamilies[] = {
     {CTLRX_UNITS_POWER, ETLRXTiffFamily::kIntensity},
     {CTLRX_UNITS_CALIBRATED, ETLRXTiffFamily::kIntensity},
     {CTLRX_UNITS_ERS_RAW, ETLRXTiffFamily::kRaw},
@@ -103,7 +103,7 @@ void clipLine(const STLRXStretch &theStretch, const double *theValues, const uin
 } // namespace
 
 ETLRXTiffFamily fdfTiffFamily(int32_t theDataUnits) {
-  for (const SFamilyOfUnits &aEntry : kFamilies)
+  for (const SFamilyOfUnits &aEntry : sFamilies)
     if (aEntry.mUnits == theDataUnits)
       return aEntry.mFamily;
   return ETLRXTiffFamily::kGeneral;
@@ -271,8 +271,8 @@ STLRXStretch fdfMakeStretch(const STLRXStretchRequest &theRequest, const CTiffSa
   case ETLRXTiffFamily::kInterferogram:
   case ETLRXTiffFamily::kPhase:
     aStretch.mShape = ETLRXStretchShape::kWrap;
-    aStretch.mScale = (aLevels + 1) / (2.0 * kPi);
-    aStretch.mOrigin = -kPi + kPi / (aLevels + 1);
+    aStretch.mScale = (aLevels + 1) / (2.0 * sPi);
+    aStretch.mOrigin = -sPi + sPi / (aLevels + 1);
     aStretch.mMean = theSample.mean();
     return aStretch;
   default: break;

@@ -28,9 +28,9 @@
 
 namespace {
 
-constexpr int kSamplePassEnd = 15;  // percent at the end of the sample pass
-constexpr int kWritePassStart = 30; // the histogram pass fills the gap
-constexpr int32_t kSampleStep = 2;
+constexpr int sSamplePassEnd = 15;  // percent at the end of the sample pass
+constexpr int sWritePassStart = 30; // the histogram pass fills the gap
+constexpr int32_t sSampleStep = 2;
 
 // The arguments after their rules.
 struct STiffRequest {
@@ -126,7 +126,7 @@ SSampleWindow sampleWindow(const STiffRequest &theRequest, int32_t theRows, int3
                         boundOr(theRequest.mWindow[3], theCols / 2 + theCols / 6, theCols)};
   fdfTraceMessage("\naSampleRowStart = %d\naSampleRowEnd = %d\naSampleColStart = %d\naSampleColEnd = %d\n"
                   "aSampleInc = %d\n",
-                  aWindow.mRowStart, aWindow.mRowEnd, aWindow.mColStart, aWindow.mColEnd, kSampleStep);
+                  aWindow.mRowStart, aWindow.mRowEnd, aWindow.mColStart, aWindow.mColEnd, sSampleStep);
   return aWindow;
 }
 
@@ -136,13 +136,13 @@ void walkSample(CTiffLineSource &theSource, const SSampleWindow &theWindow, CPro
                 int theLast, F theUse) {
   if (theWindow.mRowStart > theWindow.mRowEnd || theWindow.mColStart > theWindow.mColEnd)
     return;
-  const int64_t aRows = (theWindow.mRowEnd - theWindow.mRowStart) / kSampleStep + 1;
+  const int64_t aRows = (theWindow.mRowEnd - theWindow.mRowStart) / sSampleStep + 1;
   int64_t aDone = 0;
-  for (int32_t aRow = theWindow.mRowStart; aRow <= theWindow.mRowEnd; aRow += kSampleStep, ++aDone) {
+  for (int32_t aRow = theWindow.mRowStart; aRow <= theWindow.mRowEnd; aRow += sSampleStep, ++aDone) {
     theProgress.span(theFirst, theLast, aDone, aRows);
     theSource.read(aRow, theWindow.mColStart, theWindow.mColEnd);
     const int32_t aCount = theWindow.mColEnd - theWindow.mColStart + 1;
-    for (int32_t i = 0; i < aCount; i += kSampleStep) {
+    for (int32_t i = 0; i < aCount; i += sSampleStep) {
       if (theSource.valid()[i] == 0)
         continue;
       if (theSource.isComplex())
@@ -156,7 +156,7 @@ void walkSample(CTiffLineSource &theSource, const SSampleWindow &theWindow, CPro
 CTiffSample takeSample(CTiffLineSource &theSource, const SSampleWindow &theWindow, CProgress &theProgress,
                        const std::string &theInput) {
   CTiffSample aSample;
-  walkSample(theSource, theWindow, theProgress, 0, kSamplePassEnd,
+  walkSample(theSource, theWindow, theProgress, 0, sSamplePassEnd,
              [&aSample](double theValue, double theRe, double theIm, bool theComplex) {
                aSample.add(theValue);
                if (theComplex)
@@ -196,7 +196,7 @@ std::unique_ptr<CTiffHistogramLut> buildHistogram(const STiffRequest &theRequest
   if (!std::isfinite(aLow) || !std::isfinite(aHigh) || aHigh < aLow)
     failHistogram("no usable value range", theRequest.mInput);
   auto aLut = std::make_unique<CTiffHistogramLut>(aLow, aHigh, theRequest.mHistogramSize, theRequest.mLevels);
-  walkSample(theSource, theWindow, theProgress, kSamplePassEnd, kWritePassStart,
+  walkSample(theSource, theWindow, theProgress, sSamplePassEnd, sWritePassStart,
              [&aLut](double theValue, double, double, bool) { aLut->add(theValue); });
   if (!aLut->equalise())
     failHistogram("empty histogram", theRequest.mInput);
@@ -235,9 +235,9 @@ void colourWheel(std::vector<uint16_t> theRgb[3]) {
 
 // 8-bit palette entries of the header, widened to TIFF's 16 bits (x 257).
 bool headerPalette(const CDescription &theHeader, std::vector<uint16_t> theRgb[3]) {
-  static const char *const kKeys[3] = {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"};
+  static const char *const aKeys[3] = {"RasterInfo.TiffLUTRed", "RasterInfo.TiffLUTGreen", "RasterInfo.TiffLUTBlue"};
   for (int c = 0; c < 3; ++c) {
-    const CDescriptionField *aField = theHeader.findField(kKeys[c]);
+    const CDescriptionField *aField = theHeader.findField(aKeys[c]);
     if (aField == nullptr || aField->getShape() != CTLRX_DS_VECTOR || aField->getValueType() != CTLRX_DS_INTEGER ||
         !aField->holdsValue() || aField->getColNbr() < CTLRX_TIFF_PALETTE_SIZE)
       return false;
@@ -274,7 +274,7 @@ void writeRows(CGeoTiffFile &theTiff, CTiffLineSource &theSource, const STLRXTif
   std::vector<uint8_t> aGrey(aOutCols);
   const int32_t aLastCol = theGrid.mOutCols * theGrid.mColFactor - 1;
   for (int32_t aRow = 0; aRow < theGrid.mOutRows; ++aRow) {
-    theProgress.span(kWritePassStart, 100, aRow, theGrid.mOutRows);
+    theProgress.span(sWritePassStart, 100, aRow, theGrid.mOutRows);
     const int32_t aBlock = theGrid.mInvertRows ? theGrid.mOutRows - 1 - aRow : aRow;
     const int32_t aFirst = aBlock * theGrid.mRowFactor;
     aReducer.startBlock();

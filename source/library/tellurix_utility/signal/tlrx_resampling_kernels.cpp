@@ -17,7 +17,7 @@ struct SKernelEntry {
   int32_t mBefore; // cells of the support before j0 = floor(position)
 };
 
-const SKernelEntry theKernels[] = {
+const SKernelEntry sKernels[] = {
     {ETLRXKernel::NEAREST, "nearest_neighbour", ETLRXKernel::NEAREST, 1, 0},
     {ETLRXKernel::BILINEAR, "bilinear_interpolation", ETLRXKernel::NEAREST, 2, 0},
     {ETLRXKernel::CUBIC3, "3th_order_cc", ETLRXKernel::BILINEAR, 4, 1},
@@ -28,10 +28,10 @@ const SKernelEntry theKernels[] = {
 };
 
 const SKernelEntry &fdfEntry(ETLRXKernel theKernel) {
-  for (const SKernelEntry &aEntry : theKernels)
+  for (const SKernelEntry &aEntry : sKernels)
     if (aEntry.mKernel == theKernel)
       return aEntry;
-  return theKernels[0];
+  return sKernels[0];
 }
 
 // Keys (1981), a = -0.5: third-order accurate.
@@ -76,7 +76,7 @@ double fdfKernelWeight(ETLRXKernel theKernel, double theDistance) {
 } // namespace
 
 ETLRXKernel fdfKernelFromName(const std::string &theName, bool &theKnown) {
-  for (const SKernelEntry &aEntry : theKernels)
+  for (const SKernelEntry &aEntry : sKernels)
     if (theName == aEntry.mName) {
       theKnown = true;
       return aEntry.mKernel;

@@ -26,7 +26,7 @@ enum ECorrelationToken { CTLRX_CORR_INPUT1, CTLRX_CORR_INPUT2, CTLRX_CORR_ROOT, 
 
 enum ECorrelationStep { CTLRX_CORR_NORMALIZE_STEP, CTLRX_CORR_CORRELATION_STEP, CTLRX_CORR_TIFF_STEP };
 
-const char *const theNormSuffix = "_norm";
+const char *const sNormSuffix = "_norm";
 
 // The step table; without the closing switch no step closes anything.
 std::vector<STLRXStep> fdfCorrelationSteps(bool theClose) {
@@ -41,10 +41,10 @@ std::vector<std::string> fdfCorrelationArguments(const std::vector<std::string> 
   const std::string &aRoot = theTokens[CTLRX_CORR_ROOT];
   switch (theStep) {
   case CTLRX_CORR_NORMALIZE_STEP:
-    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + theNormSuffix,
+    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + sNormSuffix,
             theTokens[CTLRX_CORR_DUMMY],  theTokens[CTLRX_CORR_NORM_ROWS], theTokens[CTLRX_CORR_NORM_COLS]};
   case CTLRX_CORR_CORRELATION_STEP:
-    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + theNormSuffix, aRoot,
+    return {theTokens[CTLRX_CORR_INPUT1], theTokens[CTLRX_CORR_INPUT2], aRoot + sNormSuffix, aRoot,
             theTokens[CTLRX_CORR_DUMMY],  theTokens[CTLRX_CORR_ROWS],   theTokens[CTLRX_CORR_COLS]};
   default:
     return {aRoot, aRoot + ".tif", theTokens[CTLRX_CORR_SATURATION], "1", "1"};
@@ -63,7 +63,7 @@ int32_t fdfRunCorrelation(const char *theArguments) {
   aFiles.addRead(theArguments);
   aFiles.addInput(aTokens[CTLRX_CORR_INPUT1]);
   aFiles.addInput(aTokens[CTLRX_CORR_INPUT2]);
-  aFiles.addResult(aTokens[CTLRX_CORR_ROOT] + theNormSuffix, false);
+  aFiles.addResult(aTokens[CTLRX_CORR_ROOT] + sNormSuffix, false);
   aFiles.addResult(aTokens[CTLRX_CORR_ROOT], aTiff);
   aFiles.refuseClashes(CTLRX_ERR_ARGUMENTS);
   CStepRunner aRunner(fdfCorrelationSteps(fdfIsSwitchOn(aTokens[CTLRX_CORR_CLOSE])), "INT");

@@ -125,9 +125,9 @@ int32_t main_mean_std_range(const char *theArguments) {
     return fdfRunTemporal(theArguments);
   } catch (const CErrorExceptionManager &) {
     throw;
-  } catch (const std::exception &theException) {
-    fdfTraceMessage("Exception raised: %s\n", theException.what());
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, theException.what());
+  } catch (const std::exception &aException) {
+    fdfTraceMessage("Exception raised: %s\n", aException.what());
+    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, aException.what());
   } catch (...) {
     TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
   }

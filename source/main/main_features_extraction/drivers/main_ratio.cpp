@@ -18,14 +18,14 @@ namespace {
 enum ERatioToken { CTLRX_RATIO_LIST, CTLRX_RATIO_ROOT, CTLRX_RATIO_DB, CTLRX_RATIO_UNUSED, CTLRX_RATIO_TIFF,
                    CTLRX_RATIO_SATURATION, CTLRX_RATIO_TOKENS };
 
-const std::vector<STLRXStep> theRatioSteps = {
+const std::vector<STLRXStep> sRatioSteps = {
     {"Ratio", ratio_images, fdfStepNothingToClose},
     {"ratio to tiff conversion", make_tiff, fdfStepNothingToClose},
 };
 
 int32_t fdfRunRatio(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Ratio");
-  CStepRunner aRunner(theRatioSteps, "RATIO");
+  CStepRunner aRunner(sRatioSteps, "RATIO");
   if (aTokens.size() < CTLRX_RATIO_TOKENS)
     return CTLRX_ERR_ARGUMENTS;
   fdfTraceTokens(aTokens, CTLRX_RATIO_TOKENS);

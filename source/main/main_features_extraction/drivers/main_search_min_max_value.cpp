@@ -32,7 +32,7 @@ constexpr int CTLRX_MINMAX_SATURATION = 8;
 constexpr int CTLRX_PALETTE_SIZE = 256;
 
 // The four results, in the order they are written and converted.
-const char *const theResultSuffixes[4] = {"_min", "_max", "_min_date", "_max_date"};
+const char *const sResultSuffixes[4] = {"_min", "_max", "_min_date", "_max_date"};
 
 std::string fdfJoin(const std::vector<std::string> &theTokens) {
   std::string aText;
@@ -107,7 +107,7 @@ int32_t fdfRunMinMax(const char *theArguments) {
   CRunFiles aFiles;
   aFiles.addRead(theArguments);
   aFiles.addRead(aTokens[CTLRX_MINMAX_LIST]);
-  for (const char *aSuffix : theResultSuffixes) {
+  for (const char *aSuffix : sResultSuffixes) {
     aResults.push_back(aRoot + aSuffix);
     aFiles.addResult(aResults.back(), aTiff);
   }

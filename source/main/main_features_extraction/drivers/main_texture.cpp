@@ -23,14 +23,14 @@ enum ETextureToken { CTLRX_TEXTURE_INPUT, CTLRX_TEXTURE_OUTPUT, CTLRX_TEXTURE_DU
 
 enum ETextureStep { CTLRX_TEXTURE_STEP, CTLRX_TEXTURE_TIFF_STEP };
 
-const std::vector<STLRXStep> theTextureSteps = {
+const std::vector<STLRXStep> sTextureSteps = {
     {"texture", texture, fdfStepNothingToClose},
     {"texture to tiff conversion", make_tiff, fdfStepNothingToClose},
 };
 
 int32_t fdfRunTexture(const char *theArguments) {
   const std::vector<std::string> aTokens = fdfStartArgumentCommand(theArguments, "Texture");
-  CStepRunner aRunner(theTextureSteps, "TEXTURE");
+  CStepRunner aRunner(sTextureSteps, "TEXTURE");
   if (aTokens.size() < CTLRX_TEXTURE_TOKENS)
     return CTLRX_ERR_ARGUMENTS;
   fdfTraceTokens(aTokens, CTLRX_TEXTURE_TOKENS);

@@ -17,14 +17,14 @@ namespace {
 constexpr double CTLRX_RATIO_MIN_DIVISOR = std::numeric_limits<float>::min();
 
 // Counting classes: below each limit in turn, then "Other".
-const double theHistogramLimits[CTLRX_RATIO_COUNTED_CLASSES - 1] = {-10, -1, -0.1, 0.1, 1, 10, 100, 1000, 10000, 100000, 1000000};
+const double sHistogramLimits[CTLRX_RATIO_COUNTED_CLASSES - 1] = {-10, -1, -0.1, 0.1, 1, 10, 100, 1000, 10000, 100000, 1000000};
 using CFloatLimits = std::array<float, CTLRX_RATIO_COUNTED_CLASSES - 1>;
 
 CFloatLimits fdfFloatLimits() {
   CFloatLimits aLimits;
   for (size_t k = 0; k < aLimits.size(); ++k) {
-    aLimits[k] = static_cast<float>(theHistogramLimits[k]);
-    if (static_cast<double>(aLimits[k]) < theHistogramLimits[k])
+    aLimits[k] = static_cast<float>(sHistogramLimits[k]);
+    if (static_cast<double>(aLimits[k]) < sHistogramLimits[k])
       aLimits[k] = std::nextafter(aLimits[k], std::numeric_limits<float>::infinity());
   }
   return aLimits;
@@ -63,13 +63,13 @@ void fdfRatioLine(const float *theA, double theNullA, const float *theB, double 
   // The class is the number of limits not above the value ("Other" for NaN),
   // found with float compares against the limits rounded up to floats, which
   // gives the same answer as comparing the stored float with each limit.
-  static const CFloatLimits theFloatLimits = fdfFloatLimits();
+  static const CFloatLimits aFloatLimits = fdfFloatLimits();
   for (int32_t i = 0; i < thePixels; ++i) {
     const float aValue = theOut[i];
     int aClass = 0;
 #pragma GCC unroll 11
-    for (size_t k = 0; k < theFloatLimits.size(); ++k)
-      aClass += aValue >= theFloatLimits[k];
+    for (size_t k = 0; k < aFloatLimits.size(); ++k)
+      aClass += aValue >= aFloatLimits[k];
     ++theHistogram[aValue != aValue ? CTLRX_RATIO_COUNTED_CLASSES - 1 : aClass];
   }
 }

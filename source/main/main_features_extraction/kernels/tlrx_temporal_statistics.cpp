@@ -17,7 +17,7 @@ using namespace tlrx_temporal_detail;
 constexpr int32_t CTLRX_NETWORK_LIMIT = 32;
 
 // Features defined only from two kept samples on.
-const bool theNeedsTwo[CTLRX_TF_VALUE_COUNT] = {false, true,  false, true, false, false,
+const bool sNeedsTwo[CTLRX_TF_VALUE_COUNT] = {false, true,  false, true, false, false,
                                                 false, true,  true,  false, true, true};
 
 // Whether (theValue / theLast) / theDays < theThreshold, as those divisions
@@ -44,8 +44,8 @@ inline bool fdfBelowRatePerDay(double theValue, double theLast, double theDays, 
 // the random order of one pixel's values keeps mispredicting.
 template <int N>
 struct SBatcherNetwork {
-  static constexpr int CSize = fdfBatcher(N, nullptr);
-  SExchange mPairs[CSize > 0 ? CSize : 1] = {};
+  static constexpr int sSize = fdfBatcher(N, nullptr);
+  SExchange mPairs[sSize > 0 ? sSize : 1] = {};
   constexpr SBatcherNetwork() { fdfBatcher(N, mPairs); }
 };
 
@@ -66,7 +66,7 @@ double fdfNetworkMedian(const double *theValues, std::index_sequence<I...>) {
 
 template <int N>
 double fdfNetworkMedian(const double *theValues) {
-  return fdfNetworkMedian<N>(theValues, std::make_index_sequence<SBatcherNetwork<N>::CSize>());
+  return fdfNetworkMedian<N>(theValues, std::make_index_sequence<SBatcherNetwork<N>::sSize>());
 }
 
 using TLRXMedian = double (*)(const double *);
@@ -75,7 +75,7 @@ constexpr std::array<TLRXMedian, sizeof...(N)> fdfMedianTable(std::integer_seque
   return {&fdfNetworkMedian<N + 1>...};
 }
 // Networks for 1 .. CTLRX_NETWORK_LIMIT values, entry n - 1 for n values.
-constexpr auto theMedianNetworks = fdfMedianTable(std::make_integer_sequence<int, CTLRX_NETWORK_LIMIT>());
+constexpr auto sMedianNetworks = fdfMedianTable(std::make_integer_sequence<int, CTLRX_NETWORK_LIMIT>());
 
 } // namespace
 
@@ -187,7 +187,7 @@ double CTemporalSeries::median() {
   if (mKept == 2)
     return (mValue[0] + mValue[1]) / 2.0;
   if (mKept <= CTLRX_NETWORK_LIMIT)
-    return theMedianNetworks[mKept - 1](mValue.data());
+    return sMedianNetworks[mKept - 1](mValue.data());
   std::copy(mValue.begin(), mValue.begin() + mKept, mScratch.begin());
   const auto aMiddle = mScratch.begin() + (mKept - 1) / 2;
   std::nth_element(mScratch.begin(), aMiddle, mScratch.begin() + mKept);
@@ -268,7 +268,7 @@ void CTemporalSeries::features(double theValues[CTLRX_TF_VALUE_COUNT], int32_t t
   const bool aHasStd = aPairs && aHasMean;
   theValues[CTLRX_TF_STD] = aHasStd && mSettings.mWanted[CTLRX_TF_STD] ? mAccumulator.std() : aNull;
   for (int f : mModified) {
-    const bool aDefined = f == CTLRX_TF_STD ? aHasStd : aPairs || !theNeedsTwo[f];
+    const bool aDefined = f == CTLRX_TF_STD ? aHasStd : aPairs || !sNeedsTwo[f];
     if (!aDefined)
       continue;
     double x = theValues[f];

@@ -18,7 +18,7 @@
 namespace {
 
 // Drivers not built yet stand as nullptr and answer like an unknown command.
-const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
+const STLRXCommand sCommands[CTLRX_COMMAND_COUNT] = {
     {"main_texture#", main_texture},
     {"main_ratio#", main_ratio},
     {"main_correlation#", main_correlation},
@@ -28,10 +28,10 @@ const STLRXCommand theCommands[CTLRX_COMMAND_COUNT] = {
     {"main_min_and_max#", main_search_min_max_value},
 };
 
-const char *const theTrailerMarker = "###Tellurix###";
+const char *const sTrailerMarker = "###Tellurix###";
 
 // The command line as the host gave it, kept for the whole run.
-std::string theCommandLine;
+std::string sCommandLine;
 
 // Anything else escaping a command, reported as 913920 with the process
 // that was running.
@@ -41,18 +41,18 @@ CErrorExceptionManager fdfUnexpected(int theLine) {
 
 } // namespace
 
-const STLRXCommand *fdfCommandTable() { return theCommands; }
+const STLRXCommand *fdfCommandTable() { return sCommands; }
 
 const char *fdfProductBanner() {
-  static const std::string theBanner =
+  static const std::string aBanner =
       std::string("Tellurix Feature Extraction - SAR Edition for Tellurix Workbench  4.3.000") + __DATE__;
-  return theBanner.c_str();
+  return aBanner.c_str();
 }
 
 int fdfMatchCommand(const char *theCommandLine, const char **theArguments) {
   for (int i = 0; i < CTLRX_COMMAND_COUNT; ++i) {
-    const size_t aLen = std::strlen(theCommands[i].mPrefix);
-    if (std::strncmp(theCommandLine, theCommands[i].mPrefix, aLen) == 0) {
+    const size_t aLen = std::strlen(sCommands[i].mPrefix);
+    if (std::strncmp(theCommandLine, sCommands[i].mPrefix, aLen) == 0) {
       *theArguments = theCommandLine + aLen;
       return i;
     }
@@ -61,29 +61,29 @@ int fdfMatchCommand(const char *theCommandLine, const char **theArguments) {
 }
 
 int main_features_extraction(const char *theLine) {
-  theCommandLine = theLine != nullptr ? theLine : "";
+  sCommandLine = theLine != nullptr ? theLine : "";
   try {
     fdfInitEnvironment(true, fdfProductBanner());
     // Every header written from now on gets its ENVI header beside it.
     fdfInstallEnviHeaderWriter();
-    const size_t aTrailer = theCommandLine.find(theTrailerMarker);
+    const size_t aTrailer = sCommandLine.find(sTrailerMarker);
     if (aTrailer != std::string::npos)
-      theCommandLine.erase(aTrailer);
-    fdfTraceMessage("\nlpCmdLine =%s\n", theCommandLine.c_str());
+      sCommandLine.erase(aTrailer);
+    fdfTraceMessage("\nlpCmdLine =%s\n", sCommandLine.c_str());
     const char *aArguments = nullptr;
-    const int aCommand = fdfMatchCommand(theCommandLine.c_str(), &aArguments);
+    const int aCommand = fdfMatchCommand(sCommandLine.c_str(), &aArguments);
     fdfTraceMessage("aCommand =%d\n", aCommand);
     int32_t aStatus = CTLRX_ERR_UNKNOWN_COMMAND;
-    if (aCommand >= 0 && theCommands[aCommand].mDriver != nullptr)
-      aStatus = theCommands[aCommand].mDriver(aArguments);
+    if (aCommand >= 0 && sCommands[aCommand].mDriver != nullptr)
+      aStatus = sCommands[aCommand].mDriver(aArguments);
     // A driver's failing status is reported like any raised error.
     if (aStatus != 0)
       fdfRaiseError(aStatus, nullptr, __FILE__, 100);
     return fdfExitStatus(fdfEndProcess(0, true, true));
-  } catch (const CErrorExceptionManager &theError) {
-    return fdfReportError(theError);
-  } catch (const std::exception &theError) {
-    fdfTraceMessage("Exception raised: %s\n", theError.what());
+  } catch (const CErrorExceptionManager &aError) {
+    return fdfReportError(aError);
+  } catch (const std::exception &aError) {
+    fdfTraceMessage("Exception raised: %s\n", aError.what());
     return fdfReportError(fdfUnexpected(__LINE__));
   } catch (...) {
     return fdfReportError(fdfUnexpected(__LINE__));

@@ -28,7 +28,7 @@ namespace {
 constexpr const char *CTLRX_RATIO_SUFFIX = "_rto";
 
 // Printed classes; "Less than 0.01 " has no counting test and stays 0.
-const char *const theHistogramLabels[CTLRX_RATIO_HISTOGRAM_CLASSES] = {
+const char *const sHistogramLabels[CTLRX_RATIO_HISTOGRAM_CLASSES] = {
     "Less than -10 ",  "Less than - 1 ",   "Less than -0.1 ",   "Less than 0.01 ", "Less than 0.1 ",
     "Less than 1 ",    "Less than 10 ",    "Less than 100 ",    "Less than 1000 ", "Less than 10000 ",
     "Less than 100000 ", "Less than 1000000 ", "Other "};
@@ -100,6 +100,6 @@ int ratio_images(int argc, char **argv) {
   aOut.commit(aHeader, CTLRX_ERR_FILE_COPY);
   // The printed "0.01" line has no class of its own and shows 0.
   for (int i = 0, aClass = 0; i < CTLRX_RATIO_HISTOGRAM_CLASSES; ++i)
-    fdfTraceMessage("%s%lld\n", theHistogramLabels[i], i == 3 ? 0LL : aHistogram[aClass++]);
+    fdfTraceMessage("%s%lld\n", sHistogramLabels[i], i == 3 ? 0LL : aHistogram[aClass++]);
   return 0;
 }

@@ -29,7 +29,7 @@
 
 namespace {
 
-const STemporalOutput theOutputs[CTLRX_TF_COUNT] = {
+const STemporalOutput sOutputs[CTLRX_TF_COUNT] = {
     {"mean", "_mea", false},
     {"std", "_std", false},
     {"median", "_med", false},
@@ -160,7 +160,7 @@ void fdfOpenOutput(SOpenOutput &theOutput, const CDescription &theGridHeader, co
   CDescription &aHeader = theOutput.mHeader;
   fdfDeclareStandardHeader(aHeader);
   aHeader = theGridHeader;
-  if (theOutputs[theOutput.mFeature].mDate) {
+  if (sOutputs[theOutput.mFeature].mDate) {
     fdfSetHeaderText(aHeader, "RasterInfo.CellType", "INT");
     fdfSetHeaderNumber(aHeader, "RasterInfo.NullCellValue", CTLRX_TF_NO_DATE);
     fdfStampOtherInfo(aHeader, CTLRX_TF_REFERENCE_KEY, theReference.c_str());
@@ -192,7 +192,7 @@ std::string fdfReferenceDateText(const std::string &theEarliest) {
 
 } // namespace
 
-const STemporalOutput &fdfTemporalOutput(int theFeature) { return theOutputs[theFeature]; }
+const STemporalOutput &fdfTemporalOutput(int theFeature) { return sOutputs[theFeature]; }
 
 double fdfMaxRatioThreshold(double theMaxIncrementThrDb) { return std::pow(10.0, theMaxIncrementThrDb / 10.0); }
 
@@ -213,8 +213,8 @@ std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest 
       continue;
     auto aOutput = std::make_unique<SOpenOutput>();
     aOutput->mFeature = f;
-    aOutput->mName = theRequest.mRoot + theOutputs[f].mSuffix;
-    if (theOutputs[f].mDate)
+    aOutput->mName = theRequest.mRoot + sOutputs[f].mSuffix;
+    if (sOutputs[f].mDate)
       aOutput->mDates.assign(thePixels, CTLRX_TF_NO_DATE);
     else
       aOutput->mValues.assign(thePixels, 0.0f);
@@ -230,7 +230,7 @@ void fdfWriteFeatureLines(CInputRows &theSource, CTemporalSeries &theSeries, int
                           size_t theInputs, std::vector<std::unique_ptr<SOpenOutput>> &theOpen) {
   STemporalLines aOutputLines;
   for (auto &aOutput : theOpen) {
-    if (theOutputs[aOutput->mFeature].mDate)
+    if (sOutputs[aOutput->mFeature].mDate)
       aOutputLines.mDate[aOutput->mFeature - CTLRX_TF_DATE_MAX] = aOutput->mDates.data();
     else
       aOutputLines.mValue[aOutput->mFeature] = aOutput->mValues.data();
@@ -260,7 +260,7 @@ void fdfRefuseClashes(const STemporalRequest &theRequest) {
     aFiles.addInput(aInput);
   for (int f = 0; f < CTLRX_TF_COUNT; ++f)
     if (theRequest.mOutputs[f])
-      aFiles.addResult(theRequest.mRoot + theOutputs[f].mSuffix, theRequest.mMakeTiff);
+      aFiles.addResult(theRequest.mRoot + sOutputs[f].mSuffix, theRequest.mMakeTiff);
   aFiles.refuseClashes(CTLRX_ERR_PARAMETER_FILE);
 }
 

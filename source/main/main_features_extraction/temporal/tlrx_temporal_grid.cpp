@@ -14,7 +14,7 @@ namespace {
 
 // Result fields that describe the first input's values rather than the
 // results: left without a value.
-const char *const theClearedFields[] = {"RasterInfo.CalibrationValue", "RasterInfo.CalibrationType",
+const char *const sClearedFields[] = {"RasterInfo.CalibrationValue", "RasterInfo.CalibrationType",
                                         "RasterInfo.RescalingMinValue", "RasterInfo.RescalingScaleValue"};
 
 // The results are plain float records; a copied offset, row prefix or scale
@@ -22,7 +22,7 @@ const char *const theClearedFields[] = {"RasterInfo.CalibrationValue", "RasterIn
 const struct {
   const char *mKey;
   double mValue;
-} theLayoutFields[] = {{"RasterInfo.HeaderOffset", 0},   {"RasterInfo.RowPrefix", 0},
+} sLayoutFields[] = {{"RasterInfo.HeaderOffset", 0},   {"RasterInfo.RowPrefix", 0},
                        {"RasterInfo.RowSuffix", 0},      {"RasterInfo.FooterLen", 0},
                        {"RasterInfo.NrOfChannels", 1},   {"RasterInfo.RealScaleFactor", 1.0},
                        {"RasterInfo.ImaginaryScaleFactor", 1.0}};
@@ -38,10 +38,10 @@ void fdfMakeGridHeader(CDescription &theHeader, int32_t theLines, int32_t thePix
   fdfSetHeaderNumber(theHeader, "RasterInfo.NrOfLinesPerImage", theLines);
   fdfSetHeaderText(theHeader, "RasterInfo.DataUnits", "NUMBER");
   fdfSetHeaderText(theHeader, "RasterInfo.CellType", "FLOAT");
-  for (const char *aKey : theClearedFields)
+  for (const char *aKey : sClearedFields)
     if (CDescriptionField *aField = theHeader.findField(aKey))
       aField->clear();
-  for (const auto &aField : theLayoutFields)
+  for (const auto &aField : sLayoutFields)
     fdfSetHeaderNumber(theHeader, aField.mKey, aField.mValue);
 }
 

@@ -40,8 +40,8 @@ struct SScratchSlot {
 };
 
 std::array<SScratchSlot, CTLRX_DS_POOL_SLOTS> &scratchPool() {
-  static std::array<SScratchSlot, CTLRX_DS_POOL_SLOTS> aPool;
-  return aPool;
+  static std::array<SScratchSlot, CTLRX_DS_POOL_SLOTS> sPool;
+  return sPool;
 }
 
 // ------------------------------------------------------------- tokenising

@@ -10,7 +10,7 @@
 namespace {
 
 // The innermost guard alive; each guard knows the one it is nested in.
-CPendingFiles *theInnermostGuard = nullptr;
+CPendingFiles *sInnermostGuard = nullptr;
 
 std::vector<std::string> fdfRasterFiles(const std::string &theName) {
   std::vector<std::string> aFiles = fdfHeaderFiles(theName);
@@ -25,16 +25,16 @@ std::vector<std::string> fdfHeaderFiles(const std::string &theName) {
   return {aHeader, fdfXmlHeaderFileName(aHeader), theName + ".hdr"};
 }
 
-CPendingFiles::CPendingFiles() : mEnclosing(theInnermostGuard), mUncaught(std::uncaught_exceptions()) {
-  theInnermostGuard = this;
+CPendingFiles::CPendingFiles() : mEnclosing(sInnermostGuard), mUncaught(std::uncaught_exceptions()) {
+  sInnermostGuard = this;
 }
 
 CPendingFiles::~CPendingFiles() {
   // Guards end in reverse order of their start; keep the chain whole anyway.
-  if (theInnermostGuard == this) {
-    theInnermostGuard = mEnclosing;
+  if (sInnermostGuard == this) {
+    sInnermostGuard = mEnclosing;
   } else {
-    for (CPendingFiles *aGuard = theInnermostGuard; aGuard != nullptr; aGuard = aGuard->mEnclosing)
+    for (CPendingFiles *aGuard = sInnermostGuard; aGuard != nullptr; aGuard = aGuard->mEnclosing)
       if (aGuard->mEnclosing == this)
         aGuard->mEnclosing = mEnclosing;
   }
@@ -67,7 +67,7 @@ void CPendingFiles::forgetRaster(const std::string &theName) {
 }
 
 CPendingFiles *CPendingFiles::outermost() {
-  CPendingFiles *aGuard = theInnermostGuard;
+  CPendingFiles *aGuard = sInnermostGuard;
   while (aGuard != nullptr && aGuard->mEnclosing != nullptr)
     aGuard = aGuard->mEnclosing;
   return aGuard;

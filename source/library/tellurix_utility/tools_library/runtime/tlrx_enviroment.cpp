@@ -26,23 +26,23 @@ namespace {
 
 using CEnvironmentTable = std::vector<std::pair<std::string, std::string>>;
 
-std::unique_ptr<CEnvironmentTable> theEnvironment;
-std::vector<std::string> theDeferredDeletions;
-char theProcessName[CTLRX_MAX_LEN_PROCESS_NAME + 1] = " -";
-std::string theBanner;
-std::string theWorkingFilePath;
+std::unique_ptr<CEnvironmentTable> sEnvironment;
+std::vector<std::string> sDeferredDeletions;
+char sProcessName[CTLRX_MAX_LEN_PROCESS_NAME + 1] = " -";
+std::string sBanner;
+std::string sWorkingFilePath;
 // The working file existed at some time in this run (the host's, or the one
 // start-up created); only then are its absences waited out.
-bool theWorkingFileSeen = false;
-float theDummyValue = 0.0f;
-double theDummyValueDouble = 0.0;
-bool theTracing = false;
-FILE *theTrace = nullptr;
-FILE *theLog = nullptr;
+bool sWorkingFileSeen = false;
+float sDummyValue = 0.0f;
+double sDummyValueDouble = 0.0;
+bool sTracing = false;
+FILE *sTrace = nullptr;
+FILE *sLog = nullptr;
 
 // Settings read from the configuration file, in line order; line 13 is
 // reserved and has no name.
-const char *const theConfigurationNames[CTLRX_CONFIGURATION_LINES] = {
+const char *const sConfigurationNames[CTLRX_CONFIGURATION_LINES] = {
     "TELLURIX_KEY_FILES_DIR",        "TELLURIX_MANDATORY_DIR",
     "TELLURIX_WORKING_DIR",          "TELLURIX_EXE_DIR",
     "TELLURIX_MAP_FILES_DIR",        "TELLURIX_CEOS_DES_FILES_DIR",
@@ -51,7 +51,7 @@ const char *const theConfigurationNames[CTLRX_CONFIGURATION_LINES] = {
     "TELLURIX_DEFAULT_BYTE_ORDER",   "TELLURIX_TRACING",
     nullptr,                         "TELLURIX_DUMMY_VALUE"};
 
-const std::string theStars(160, '*');
+const std::string sStars(160, '*');
 
 std::string fdfWithSeparator(const char *theDir) {
   std::string aDir(theDir);
@@ -138,10 +138,10 @@ void fdfReadConfiguration(const std::string &theWorkingDirOverride) {
   std::string aLine;
   for (int i = 0; i < CTLRX_CONFIGURATION_LINES; ++i) {
     if (!fdfReadConfigurationLine(aFile.get(), aLine))
-      TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, theConfigurationNames[i] != nullptr ? theConfigurationNames[i]
+      TLRX_RAISE(CTLRX_ERR_SETTING_MISSING, sConfigurationNames[i] != nullptr ? sConfigurationNames[i]
                                                                                 : "reserved configuration line 13");
-    if (theConfigurationNames[i] != nullptr)
-      fdfSetEnvVar(aLine.c_str(), theConfigurationNames[i]);
+    if (sConfigurationNames[i] != nullptr)
+      fdfSetEnvVar(aLine.c_str(), sConfigurationNames[i]);
   }
   if (!theWorkingDirOverride.empty())
     fdfSetEnvVar(theWorkingDirOverride.c_str(), "TELLURIX_WORKING_DIR");
@@ -149,9 +149,9 @@ void fdfReadConfiguration(const std::string &theWorkingDirOverride) {
 
 void fdfExitHandler() {
   try {
-    for (const std::string &aName : theDeferredDeletions)
+    for (const std::string &aName : sDeferredDeletions)
       NTLRX_UTILITY_SpawnDeleteFile(aName.c_str());
-    theDeferredDeletions.clear();
+    sDeferredDeletions.clear();
   } catch (...) {
     // Exiting already: report without calling exit again.
     fdfWriteErrorFile(CTLRX_ERR_UNEXPECTED_EXIT, "main_delete_file", static_cast<const char *>(nullptr));
@@ -164,12 +164,12 @@ void fdfStarsLine(bool theToLog, bool theToTrace, const char *theFormat, ...) {
   va_list aArgs;
   if (theToLog) {
     va_start(aArgs, theFormat);
-    fdfVWrite(theLog, theFormat, aArgs);
+    fdfVWrite(sLog, theFormat, aArgs);
     va_end(aArgs);
   }
-  if (theToTrace && theTracing) {
+  if (theToTrace && sTracing) {
     va_start(aArgs, theFormat);
-    fdfVWrite(theTrace, theFormat, aArgs);
+    fdfVWrite(sTrace, theFormat, aArgs);
     va_end(aArgs);
   }
 }
@@ -178,23 +178,23 @@ void fdfStarsLine(bool theToLog, bool theToTrace, const char *theFormat, ...) {
 void fdfWriteStartBanner(FILE *theStream, const char *const *theArgv, int theArgc, const char *theParamText) {
   if (theStream == nullptr)
     return;
-  std::fprintf(theStream, "\n\n\n%s\nSTART : %s  [ %s ]\n%s%s\n\n", theStars.c_str(), fdfGetProcessName(),
-               theBanner.c_str(), fdfGetAscTime().c_str(), theStars.c_str());
+  std::fprintf(theStream, "\n\n\n%s\nSTART : %s  [ %s ]\n%s%s\n\n", sStars.c_str(), fdfGetProcessName(),
+               sBanner.c_str(), fdfGetAscTime().c_str(), sStars.c_str());
   if (theParamText != nullptr)
     std::fputs(theParamText, theStream);
   else
     for (int i = 0; i < theArgc; ++i)
       std::fprintf(theStream, " Parameter %d (%s)\n", i, theArgv[i] != nullptr ? theArgv[i] : "");
-  std::fprintf(theStream, "\n%s\n\n", theStars.c_str());
+  std::fprintf(theStream, "\n%s\n\n", sStars.c_str());
   std::fflush(theStream);
 }
 
 } // namespace
 
 bool fdfGetEnvVar(std::string &theValue, const char *theName) {
-  if (!theEnvironment)
+  if (!sEnvironment)
     return false;
-  for (const auto &aEntry : *theEnvironment)
+  for (const auto &aEntry : *sEnvironment)
     if (aEntry.first == theName) {
       theValue = aEntry.second;
       return true;
@@ -210,56 +210,56 @@ std::string fdfGetRequiredEnvVar(const char *theName) {
 }
 
 void fdfSetEnvVar(const char *theValue, const char *theName) {
-  if (!theEnvironment) {
-    theEnvironment = std::make_unique<CEnvironmentTable>();
-    theEnvironment->reserve(50);
+  if (!sEnvironment) {
+    sEnvironment = std::make_unique<CEnvironmentTable>();
+    sEnvironment->reserve(50);
   }
-  for (auto &aEntry : *theEnvironment)
+  for (auto &aEntry : *sEnvironment)
     if (aEntry.first == theName) {
       aEntry.second = theValue;
       return;
     }
-  theEnvironment->emplace_back(theName, theValue);
+  sEnvironment->emplace_back(theName, theValue);
 }
 
-bool fdfEnvironmentExists() { return theEnvironment != nullptr; }
-void fdfDeleteEnvironment() { theEnvironment.reset(); }
+bool fdfEnvironmentExists() { return sEnvironment != nullptr; }
+void fdfDeleteEnvironment() { sEnvironment.reset(); }
 
 void fdfSetProcessName(const char *theName) {
-  std::snprintf(theProcessName, sizeof theProcessName, " %s", theName != nullptr ? theName : "");
-  for (char *aChar = theProcessName; *aChar != '\0'; ++aChar)
+  std::snprintf(sProcessName, sizeof sProcessName, " %s", theName != nullptr ? theName : "");
+  for (char *aChar = sProcessName; *aChar != '\0'; ++aChar)
     if (*aChar == '\n' || *aChar == '\r')
       *aChar = ' ';
 }
 
-const char *fdfGetProcessName() { return theProcessName; }
-void fdfSetBanner(const char *theText) { theBanner = theText != nullptr ? theText : ""; }
-const char *fdfGetBanner() { return theBanner.c_str(); }
-float fdfGetDummyValue() { return theDummyValue; }
-double fdfGetDummyValueDouble() { return theDummyValueDouble; }
+const char *fdfGetProcessName() { return sProcessName; }
+void fdfSetBanner(const char *theText) { sBanner = theText != nullptr ? theText : ""; }
+const char *fdfGetBanner() { return sBanner.c_str(); }
+float fdfGetDummyValue() { return sDummyValue; }
+double fdfGetDummyValueDouble() { return sDummyValueDouble; }
 
 void fdfSetDummyValue(const char *theSetting) {
   if (std::strncmp(theSetting, "NaN", 3) == 0) {
-    theDummyValue = std::numeric_limits<float>::quiet_NaN();
-    theDummyValueDouble = std::numeric_limits<double>::quiet_NaN();
+    sDummyValue = std::numeric_limits<float>::quiet_NaN();
+    sDummyValueDouble = std::numeric_limits<double>::quiet_NaN();
     // All exponent and mantissa bits set, sign clear.
     const uint32_t aBits32 = 0x7fffffffu;
     const uint64_t aBits64 = 0x7fffffffffffffffull;
-    std::memcpy(&theDummyValue, &aBits32, sizeof aBits32);
-    std::memcpy(&theDummyValueDouble, &aBits64, sizeof aBits64);
+    std::memcpy(&sDummyValue, &aBits32, sizeof aBits32);
+    std::memcpy(&sDummyValueDouble, &aBits64, sizeof aBits64);
     return;
   }
-  theDummyValueDouble = std::atof(theSetting);
-  theDummyValue = static_cast<float>(theDummyValueDouble);
+  sDummyValueDouble = std::atof(theSetting);
+  sDummyValue = static_cast<float>(sDummyValueDouble);
 }
 
-const std::string &fdfGetWorkingFilePath() { return theWorkingFilePath; }
+const std::string &fdfGetWorkingFilePath() { return sWorkingFilePath; }
 void fdfSetWorkingFilePath(const std::string &thePath) {
-  theWorkingFilePath = thePath;
-  theWorkingFileSeen = fdfNameTaken(thePath);
+  sWorkingFilePath = thePath;
+  sWorkingFileSeen = fdfNameTaken(thePath);
 }
 
-bool fdfWorkingFileSeen() { return theWorkingFileSeen; }
+bool fdfWorkingFileSeen() { return sWorkingFileSeen; }
 
 std::string fdfFreeDatedName(const std::string &theDir, const char *thePrefix, const std::string &theStamp,
                              const char *theSuffix) {
@@ -272,46 +272,46 @@ std::string fdfFreeDatedName(const std::string &theDir, const char *thePrefix, c
 bool fdfLogMessage(const char *theFormat, ...) {
   va_list aArgs;
   va_start(aArgs, theFormat);
-  const bool aOk = fdfVWrite(theLog, theFormat, aArgs);
+  const bool aOk = fdfVWrite(sLog, theFormat, aArgs);
   va_end(aArgs);
   return aOk;
 }
 
 bool fdfTraceMessage(const char *theFormat, ...) {
-  if (!theTracing)
+  if (!sTracing)
     return true;
   va_list aArgs;
   va_start(aArgs, theFormat);
-  const bool aOk = fdfVWrite(theTrace, theFormat, aArgs);
+  const bool aOk = fdfVWrite(sTrace, theFormat, aArgs);
   va_end(aArgs);
   return aOk;
 }
 
-bool fdfIsTracing() { return theTracing; }
+bool fdfIsTracing() { return sTracing; }
 
 bool fdfOpenTrace(bool theAppend) {
   std::string aTracing;
   if (!fdfGetEnvVar(aTracing, "TELLURIX_TRACING") || aTracing.compare(0, 6, "ACTIVE") != 0)
     return false;
   const std::string aPath = fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR") + "Process.trace";
-  if (theTrace != nullptr)
-    std::fclose(theTrace);
-  theTrace = std::fopen(aPath.c_str(), theAppend ? "a" : "w");
-  if (theTrace == nullptr)
+  if (sTrace != nullptr)
+    std::fclose(sTrace);
+  sTrace = std::fopen(aPath.c_str(), theAppend ? "a" : "w");
+  if (sTrace == nullptr)
     return false;
-  theTracing = true;
-  std::fputs("OpenTrace 1  2\n", theTrace);
-  std::fflush(theTrace);
+  sTracing = true;
+  std::fputs("OpenTrace 1  2\n", sTrace);
+  std::fflush(sTrace);
   fdfRedirectStdStreams(aPath);
-  return std::ferror(theTrace) == 0;
+  return std::ferror(sTrace) == 0;
 }
 
 void fdfCloseTrace() {
-  if (theTrace == nullptr)
+  if (sTrace == nullptr)
     return;
-  std::fclose(theTrace);
-  theTrace = nullptr;
-  theTracing = false;
+  std::fclose(sTrace);
+  sTrace = nullptr;
+  sTracing = false;
   fdfRestoreStdStreams();
   std::string aDir;
   if (!fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR"))
@@ -332,16 +332,16 @@ bool fdfOpenTellurixLog() {
   const int aFd = open(aPath.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
   if (aFd < 0)
     return false;
-  if (theLog != nullptr)
-    std::fclose(theLog);
-  theLog = fdopen(aFd, "a");
-  return theLog != nullptr;
+  if (sLog != nullptr)
+    std::fclose(sLog);
+  sLog = fdopen(aFd, "a");
+  return sLog != nullptr;
 }
 
 void fdfCloseTellurixLog() {
-  if (theLog != nullptr)
-    std::fclose(theLog);
-  theLog = nullptr;
+  if (sLog != nullptr)
+    std::fclose(sLog);
+  sLog = nullptr;
 }
 
 namespace {
@@ -350,25 +350,25 @@ namespace {
 // success removed it), so nobody watches it: create it now instead of
 // waiting for it at every progress update.
 void fdfPrepareWorkingFile() {
-  const int aFd = open(theWorkingFilePath.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
+  const int aFd = open(sWorkingFilePath.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
   if (aFd < 0) {
     if (errno == EEXIST)
-      theWorkingFileSeen = true;
+      sWorkingFileSeen = true;
     else
-      fdfTraceMessage("fdfInitEnvironment - Not found the working file, cannot create : %s\n", theWorkingFilePath.c_str());
+      fdfTraceMessage("fdfInitEnvironment - Not found the working file, cannot create : %s\n", sWorkingFilePath.c_str());
     return;
   }
   const char aStatus[] = "0\n\n";
   const bool aWritten = write(aFd, aStatus, sizeof aStatus - 1) == static_cast<ssize_t>(sizeof aStatus - 1);
   close(aFd);
-  theWorkingFileSeen = aWritten;
-  fdfTraceMessage("fdfInitEnvironment - Not found the working file, created : %s\n", theWorkingFilePath.c_str());
+  sWorkingFileSeen = aWritten;
+  fdfTraceMessage("fdfInitEnvironment - Not found the working file, created : %s\n", sWorkingFilePath.c_str());
 }
 
 } // namespace
 
 bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
-  theTracing = false;
+  sTracing = false;
   if (theFullSet)
     fdfInstallInterruptionHandlers();
   fdfReserveStdDescriptors();
@@ -378,17 +378,17 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   fdfSetProcessName("-");
   fdfErrorCatalogue().clear();
   fdfWarningCatalogue().clear();
-  static bool theExitHandlerRegistered = false;
-  if (!theExitHandlerRegistered)
-    theExitHandlerRegistered = std::atexit(fdfExitHandler) == 0;
-  theEnvironment = std::make_unique<CEnvironmentTable>();
-  theEnvironment->reserve(50);
-  theDeferredDeletions.clear();
-  theDeferredDeletions.reserve(110);
+  static bool sExitHandlerRegistered = false;
+  if (!sExitHandlerRegistered)
+    sExitHandlerRegistered = std::atexit(fdfExitHandler) == 0;
+  sEnvironment = std::make_unique<CEnvironmentTable>();
+  sEnvironment->reserve(50);
+  sDeferredDeletions.clear();
+  sDeferredDeletions.reserve(110);
   // Provisional until the configuration is read: a failing start-up then
   // reports beside the host's working file, not in the current folder.
-  theWorkingFilePath = fdfWorkingFileFromEnvironment();
-  theWorkingFileSeen = false;
+  sWorkingFilePath = fdfWorkingFileFromEnvironment();
+  sWorkingFileSeen = false;
 
   std::string aWorkingDir;
   if (const char *aEnv = std::getenv("TELLURIX_WORKING_DIR"))
@@ -401,7 +401,7 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
   } else {
     fdfSetEnvVar(fdfGetRequiredEnvVar("TELLURIX_WORKING_DIR").c_str(), "TELLURIX_BATCH_DIR");
   }
-  theWorkingFilePath = fdfWorkingFileIn(fdfGetRequiredEnvVar("TELLURIX_BATCH_DIR"));
+  sWorkingFilePath = fdfWorkingFileIn(fdfGetRequiredEnvVar("TELLURIX_BATCH_DIR"));
   fdfSetDummyValue(fdfGetRequiredEnvVar("TELLURIX_DUMMY_VALUE").c_str());
   if (const char *aGcp = std::getenv("TELLURIX_GCP_DATABASE_DIR"))
     fdfSetEnvVar(fdfWithSeparator(aGcp).c_str(), "TELLURIX_GCP_DATABASE_DIR");
@@ -426,14 +426,14 @@ bool fdfInitEnvironment(bool theFullSet, const char *theBanner) {
 
 void fdfStartProcess(const char *const *theArgv, int theArgc, const char *theName, const char *theParamText) {
   fdfSetProcessName(theName);
-  fdfWriteStartBanner(theLog, theArgv, theArgc, theParamText);
-  if (theTracing)
-    fdfWriteStartBanner(theTrace, theArgv, theArgc, theParamText);
+  fdfWriteStartBanner(sLog, theArgv, theArgc, theParamText);
+  if (sTracing)
+    fdfWriteStartBanner(sTrace, theArgv, theArgc, theParamText);
 }
 
 void fdfEndBanner() {
-  fdfStarsLine(true, true, "\n%s\nEND : %s  -  %s\n%s\n\n", theStars.c_str(), theBanner.c_str(), fdfGetAscTime().c_str(),
-               theStars.c_str());
+  fdfStarsLine(true, true, "\n%s\nEND : %s  -  %s\n%s\n\n", sStars.c_str(), sBanner.c_str(), fdfGetAscTime().c_str(),
+               sStars.c_str());
 }
 
 namespace {
@@ -449,7 +449,7 @@ void fdfTraceStreamState(int theAttempt, const std::string &thePath, FILE *theFi
 
 // Retries with growing pauses are for a working file that existed and is
 // away for a moment; one that never existed is not waited for.
-int fdfWorkingFileAttempts(int theAttempts) { return theWorkingFileSeen ? theAttempts : 1; }
+int fdfWorkingFileAttempts(int theAttempts) { return sWorkingFileSeen ? theAttempts : 1; }
 
 // Creates a missing working file with the new percentage and text.
 void fdfCreateWorkingFile(const std::string &thePath, int theNew, const char *theText) {
@@ -460,7 +460,7 @@ void fdfCreateWorkingFile(const std::string &thePath, int theNew, const char *th
     if (aFile != nullptr) {
       std::fprintf(aFile, "%i\n%s\n", theNew, theText != nullptr ? theText : "");
       std::fclose(aFile);
-      theWorkingFileSeen = true;
+      sWorkingFileSeen = true;
       return;
     }
     fdfTraceMessage("%d getAndSetPerc - Not found the file : %s  attempt create : \n", aAttempt, thePath.c_str());
@@ -486,7 +486,7 @@ bool fdfWaitForWorkingFile(const std::string &thePath) {
   const int aChecks = fdfWorkingFileAttempts(10);
   for (int aCheck = 0; aCheck < aChecks; ++aCheck) {
     if (fdfExistFile(thePath.c_str())) {
-      theWorkingFileSeen = true;
+      sWorkingFileSeen = true;
       return true;
     }
     fdfTraceMessage("%d] getAndSetPerc - Not found the file : %s\n", aCheck, thePath.c_str());
@@ -511,7 +511,7 @@ void getAndSetPerc(int thePrevious, int theNew, const char *theText) {
   fdfCheckInterruption();
   if (theNew == thePrevious || theNew >= 100)
     return;
-  const std::string &aPath = theWorkingFilePath;
+  const std::string &aPath = sWorkingFilePath;
   fdfRemoveFile((aPath + "_batch_ok").c_str());
   if (!fdfWaitForWorkingFile(aPath)) {
     fdfCreateWorkingFile(aPath, theNew, theText);
@@ -544,7 +544,7 @@ int32_t fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   fdfGetEnvVar(aDir, "TELLURIX_WORKING_DIR");
   if (theFinalText) {
     if (theCode != 0)
-      fdfLogMessage("\n\n-%s   %s\n\n%s\n\nERROR :\n  %s\n\n", fdfGetProcessName(), theBanner.c_str(),
+      fdfLogMessage("\n\n-%s   %s\n\n%s\n\nERROR :\n  %s\n\n", fdfGetProcessName(), sBanner.c_str(),
                     fdfGetAscTime().c_str(), " ");
     else if (theSuccessText)
       fdfLogMessage("\n\nSUCCESSFUL\n\n%s\n\n", fdfGetAscTime().c_str());
@@ -555,17 +555,17 @@ int32_t fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   const std::string aTrace = aDir + "Process.trace";
   if (theCode != 0 && !aDir.empty() && fdfExistFile(aTrace.c_str()))
     fdfCopyFile(aTrace.c_str(), fdfFreeDatedName(aDir, "Process_", fdfGetTimeStamp(), "_trace.txt").c_str(), true);
-  if (theCode == 0 && fdfExistFile(theWorkingFilePath.c_str())) {
+  if (theCode == 0 && fdfExistFile(sWorkingFilePath.c_str())) {
     if (fdfGetWarningCount() > 0) {
       fdfWriteErrorFile(CTLRX_WARNING_STATUS, "", static_cast<const char *>(nullptr));
     } else {
-      fdfRemoveFile(theWorkingFilePath.c_str());
-      for (int aAttempt = 0; aAttempt < 30 && fdfExistFile(theWorkingFilePath.c_str()); ++aAttempt) {
+      fdfRemoveFile(sWorkingFilePath.c_str());
+      for (int aAttempt = 0; aAttempt < 30 && fdfExistFile(sWorkingFilePath.c_str()); ++aAttempt) {
         fdfSleep(static_cast<int>(aAttempt * 0.1));
-        fdfRemoveFile(theWorkingFilePath.c_str());
+        fdfRemoveFile(sWorkingFilePath.c_str());
       }
-      if (fdfExistFile(theWorkingFilePath.c_str()))
-        TLRX_RAISE(CTLRX_ERR_WORKING_FILE_REMOVE, theWorkingFilePath.c_str());
+      if (fdfExistFile(sWorkingFilePath.c_str()))
+        TLRX_RAISE(CTLRX_ERR_WORKING_FILE_REMOVE, sWorkingFilePath.c_str());
     }
   }
   const std::string aLog = aDir + "Process.log";
@@ -581,4 +581,4 @@ int32_t fdfEndProcess(int32_t theCode, bool theFinalText, bool theSuccessText) {
   return fdfGetWarningCount() > 0 ? CTLRX_WARNING_STATUS : 0;
 }
 
-void fdfAddDeferredDeletion(const char *theFileName) { theDeferredDeletions.emplace_back(theFileName); }
+void fdfAddDeferredDeletion(const char *theFileName) { sDeferredDeletions.emplace_back(theFileName); }

@@ -20,8 +20,8 @@ constexpr const char *CTLRX_INIT_ERROR_TEXT = "AN ERROR OCCUR DURING Tellurix IN
 constexpr const char *CTLRX_WRONG_CODE_TEXT = "GENERIC ERROR WRONG CODE";
 constexpr int CTLRX_ERROR_FILE_CHARS = CTLRX_MAX_LEN_IN_ERROR * CTLRX_MAX_LINE_IN_ERROR;
 
-int32_t theWarningCount = 0;
-bool theReporting = false;
+int32_t sWarningCount = 0;
+bool sReporting = false;
 
 void fdfCopyText(char *theOut, size_t theSize, const char *theText) {
   std::snprintf(theOut, theSize, "%s", theText != nullptr ? theText : "");
@@ -112,13 +112,13 @@ void CErrorCatalogue::clear() {
 }
 
 CErrorCatalogue &fdfErrorCatalogue() {
-  static CErrorCatalogue theCatalogue;
-  return theCatalogue;
+  static CErrorCatalogue sCatalogue;
+  return sCatalogue;
 }
 
 CErrorCatalogue &fdfWarningCatalogue() {
-  static CErrorCatalogue theCatalogue;
-  return theCatalogue;
+  static CErrorCatalogue sCatalogue;
+  return sCatalogue;
 }
 
 void fdfLookupErrorTexts(const CErrorCatalogue &theCatalogue, int32_t theCode, char *thePrimary,
@@ -179,13 +179,13 @@ CErrorExceptionManager::CErrorExceptionManager(int32_t theCode, int32_t theLine,
   fdfLookupErrorTexts(fdfErrorCatalogue(), theCode, mPrimaryText, mSecondaryText);
 }
 
-int32_t fdfGetWarningCount() { return theWarningCount; }
-void fdfResetWarningCount() { theWarningCount = 0; }
+int32_t fdfGetWarningCount() { return sWarningCount; }
+void fdfResetWarningCount() { sWarningCount = 0; }
 
 void fdfRaiseError(int32_t theCode, const char *theMessage, const char *theFile, int theLine) {
   const int aErrno = errno;
   // A failure while an error is being reported must not report again.
-  if (theReporting)
+  if (sReporting)
     fdfExitProcess(theCode);
   CErrorExceptionManager aError(theCode, theLine, theFile, fdfGetProcessName(), theMessage);
   aError.mErrno = aErrno;
@@ -194,9 +194,9 @@ void fdfRaiseError(int32_t theCode, const char *theMessage, const char *theFile,
 
 int fdfReportError(const CErrorExceptionManager &theError) {
   const int32_t aCode = theError.mCode;
-  if (theReporting || !fdfEnvironmentExists())
+  if (sReporting || !fdfEnvironmentExists())
     return fdfExitStatus(aCode);
-  theReporting = true;
+  sReporting = true;
   char aPrimary[CTLRX_MAX_LEN_ERROR_TEXT];
   char aSecondary[CTLRX_MAX_LEN_ERROR_TEXT];
   fdfLookupErrorTexts(fdfErrorCatalogue(), aCode, aPrimary, aSecondary);
@@ -214,7 +214,7 @@ int fdfReportError(const CErrorExceptionManager &theError) {
     fdfLogMessage("\n\nSUCCESSFULL\n\n\n");
   const int32_t aFinal = fdfEndProcess(aCode, true, true);
   fdfDeleteEnvironment();
-  theReporting = false;
+  sReporting = false;
   return fdfExitStatus(aFinal);
 }
 
@@ -246,7 +246,7 @@ void fdfRaiseWarning(int32_t theCode, const char *theMessage, const char *theFil
   fdfWarningTrace(aPrimary, aSecondary, aMessage, theFile, theLine, aErrno);
   fdfLogMessage("\nWARNING : [ERROR ID : %d]%s [%s] (%s) \n %s   %s\n    FILE=%s   LINE=%d  (errno = %d)", theCode,
                 aPrimary, aSecondary, aMessage, fdfGetProcessName(), fdfGetBanner(), theFile, theLine, aErrno);
-  ++theWarningCount;
+  ++sWarningCount;
 }
 
 void fdfRaiseShortWarning(int32_t theCode, const char *theMessage, const char *theFile, int theLine) {
@@ -257,12 +257,12 @@ void fdfRaiseShortWarning(int32_t theCode, const char *theMessage, const char *t
   fdfLookupErrorTexts(fdfWarningCatalogue(), theCode, aPrimary, aSecondary);
   fdfWarningTrace(aPrimary, aSecondary, aMessage, theFile, theLine, aErrno);
   fdfLogMessage("\n\nWARNING : [ERROR ID : %d] %s [%s]\n  %s \n\n", theCode, aPrimary, aSecondary, aMessage);
-  ++theWarningCount;
+  ++sWarningCount;
 }
 
 namespace {
 
-const std::string theBlockTail = "\n" + std::string(66, ' ') + "\n" + std::string(66, ' ') + "\n";
+const std::string sBlockTail = "\n" + std::string(66, ' ') + "\n" + std::string(66, ' ') + "\n";
 
 // The status lines shared by the error file, the working file and the
 // standard error stream: texts and wrapped messages.
@@ -368,8 +368,8 @@ bool fdfWriteErrorFile(int32_t theCode, ...) {
     aMessages.push_back(aMessage);
   va_end(aArgs);
   const std::string aBlock = fdfErrorBlock(theCode, aMessages);
-  fdfWriteWholeFile(fdfGetWorkingFilePath() + "_error", "-1\n" + aBlock + theBlockTail);
-  const bool aOk = fdfWriteWorkingStatus(theCode, aBlock + theBlockTail);
+  fdfWriteWholeFile(fdfGetWorkingFilePath() + "_error", "-1\n" + aBlock + sBlockTail);
+  const bool aOk = fdfWriteWorkingStatus(theCode, aBlock + sBlockTail);
   std::fputs(aBlock.c_str(), stderr);
   return aOk;
 }

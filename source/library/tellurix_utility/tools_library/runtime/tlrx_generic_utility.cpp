@@ -23,13 +23,13 @@
 namespace {
 
 // Companions of a raster N, removed with it in this order.
-const char *const theCompanionSuffixes[] = {
+const char *const sCompanionSuffixes[] = {
     "_hdr", ".hdr", ".sml", "_orb.sml", ".xls", ".shx", ".shp", ".shp.sml", ".kml", ".shp_hdr", ".shp.hdr",
     ".dbf", ".xml", ".txt", ".old.hdr", ".old.sml", "_old.hdr", "_old.sml", ".TellurixParameterExtracted",
     ".TellurixParameterExtracted.sml"};
-const char *const theStemSuffixes[] = {"_raw", "_slc", "_gr"};
-const char *const theStemCompanions[] = {".TellurixParameterExtracted.sml", ".hdr"};
-const char *const theHeaderCompanions[] = {"_hdr.old.hdr", "_hdr.old.sml", "_tmp_hdr.hdr",
+const char *const sStemSuffixes[] = {"_raw", "_slc", "_gr"};
+const char *const sStemCompanions[] = {".TellurixParameterExtracted.sml", ".hdr"};
+const char *const sHeaderCompanions[] = {"_hdr.old.hdr", "_hdr.old.sml", "_tmp_hdr.hdr",
                                            "_tmp_hdr.sml", "_hdr_tmp.hdr", "_hdr_tmp.sml"};
 
 bool fdfEndsWith(const std::string &theText, const char *theSuffix) {
@@ -43,16 +43,16 @@ void fdfRemoveIfExists(const std::string &theName) {
 }
 
 void fdfDeleteCompanions(const std::string &theName) {
-  for (const char *aSuffix : theCompanionSuffixes)
+  for (const char *aSuffix : sCompanionSuffixes)
     fdfRemoveIfExists(theName + aSuffix);
-  for (const char *aStemSuffix : theStemSuffixes) {
+  for (const char *aStemSuffix : sStemSuffixes) {
     if (!fdfEndsWith(theName, aStemSuffix))
       continue;
     const std::string aStem = theName.substr(0, theName.size() - std::strlen(aStemSuffix));
-    for (const char *aSuffix : theStemCompanions)
+    for (const char *aSuffix : sStemCompanions)
       fdfRemoveIfExists(aStem + aSuffix);
   }
-  for (const char *aSuffix : theHeaderCompanions)
+  for (const char *aSuffix : sHeaderCompanions)
     fdfRemoveIfExists(theName + aSuffix);
 }
 

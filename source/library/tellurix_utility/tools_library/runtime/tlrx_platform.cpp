@@ -23,33 +23,33 @@ extern char **environ;
 
 namespace {
 
-const auto theStartTime = std::chrono::steady_clock::now();
+const auto sStartTime = std::chrono::steady_clock::now();
 
 void fdfRealSleep(double theSeconds) {
   if (theSeconds > 0)
     std::this_thread::sleep_for(std::chrono::duration<double>(theSeconds));
 }
 
-TLRXSleepFunction theSleepFunction = fdfRealSleep;
+TLRXSleepFunction sSleepFunction = fdfRealSleep;
 
 // Saved copies of descriptors 0 to 2 while they are redirected; -1 when not.
-int theSavedStd[3] = {-1, -1, -1};
+int sSavedStd[3] = {-1, -1, -1};
 // The C++ log stream gets a file buffer of its own while redirected.
-std::filebuf theClogFile;
-std::streambuf *theSavedClog = nullptr;
+std::filebuf sClogFile;
+std::streambuf *sSavedClog = nullptr;
 
 } // namespace
 
 long long fdfProcessClock() {
-  return std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - theStartTime)
+  return std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - sStartTime)
       .count();
 }
 
-void fdfSleep(double theSeconds) { theSleepFunction(theSeconds); }
+void fdfSleep(double theSeconds) { sSleepFunction(theSeconds); }
 
 TLRXSleepFunction fdfSetSleepFunction(TLRXSleepFunction theFunction) {
-  TLRXSleepFunction aOld = theSleepFunction;
-  theSleepFunction = theFunction != nullptr ? theFunction : fdfRealSleep;
+  TLRXSleepFunction aOld = sSleepFunction;
+  sSleepFunction = theFunction != nullptr ? theFunction : fdfRealSleep;
   return aOld;
 }
 
@@ -156,29 +156,29 @@ void fdfReserveStdDescriptors() {
 bool fdfRedirectStdStreams(const std::string &thePrefix) {
   // stderr, stdout and the C++ log stream (which writes to stderr) each get
   // their own companion file.
-  static const char *const theSuffixes[3] = {"_cerr.txt", "_cout.txt", "_clog.txt"};
-  static const int theFds[2] = {2, 1};
+  static const char *const aSuffixes[3] = {"_cerr.txt", "_cout.txt", "_clog.txt"};
+  static const int aFds[2] = {2, 1};
   std::fflush(nullptr);
   bool aOk = true;
   for (int i = 0; i < 2; ++i) {
-    const int aFile = open((thePrefix + theSuffixes[i]).c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+    const int aFile = open((thePrefix + aSuffixes[i]).c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
     if (aFile < 0) {
       aOk = false;
       continue;
     }
-    const int aFd = theFds[i];
-    if (theSavedStd[aFd] < 0)
-      theSavedStd[aFd] = fcntl(aFd, F_DUPFD_CLOEXEC, 3);
+    const int aFd = aFds[i];
+    if (sSavedStd[aFd] < 0)
+      sSavedStd[aFd] = fcntl(aFd, F_DUPFD_CLOEXEC, 3);
     dup2(aFile, aFd);
     close(aFile);
   }
   std::clog.flush();
-  if (theClogFile.is_open())
-    theClogFile.close();
-  if (theClogFile.open(thePrefix + theSuffixes[2], std::ios::out | std::ios::trunc) != nullptr) {
-    if (theSavedClog == nullptr)
-      theSavedClog = std::clog.rdbuf();
-    std::clog.rdbuf(&theClogFile);
+  if (sClogFile.is_open())
+    sClogFile.close();
+  if (sClogFile.open(thePrefix + aSuffixes[2], std::ios::out | std::ios::trunc) != nullptr) {
+    if (sSavedClog == nullptr)
+      sSavedClog = std::clog.rdbuf();
+    std::clog.rdbuf(&sClogFile);
   } else {
     aOk = false;
   }
@@ -188,18 +188,18 @@ bool fdfRedirectStdStreams(const std::string &thePrefix) {
 
 void fdfRestoreStdStreams() {
   std::clog.flush();
-  if (theSavedClog != nullptr) {
-    std::clog.rdbuf(theSavedClog);
-    theSavedClog = nullptr;
+  if (sSavedClog != nullptr) {
+    std::clog.rdbuf(sSavedClog);
+    sSavedClog = nullptr;
   }
-  if (theClogFile.is_open())
-    theClogFile.close();
+  if (sClogFile.is_open())
+    sClogFile.close();
   std::fflush(nullptr);
   for (int aFd = 1; aFd <= 2; ++aFd) {
-    if (theSavedStd[aFd] >= 0) {
-      dup2(theSavedStd[aFd], aFd);
-      close(theSavedStd[aFd]);
-      theSavedStd[aFd] = -1;
+    if (sSavedStd[aFd] >= 0) {
+      dup2(sSavedStd[aFd], aFd);
+      close(sSavedStd[aFd]);
+      sSavedStd[aFd] = -1;
     }
   }
 }
@@ -224,14 +224,14 @@ int fdfProcessId() { return static_cast<int>(getpid()); }
 
 namespace {
 
-volatile std::sig_atomic_t theInterruptionSignal = 0;
+volatile std::sig_atomic_t sInterruptionSignal = 0;
 
-void fdfOnInterruption(int theSignal) { theInterruptionSignal = theSignal; }
+void fdfOnInterruption(int theSignal) { sInterruptionSignal = theSignal; }
 
 } // namespace
 
 void fdfInstallInterruptionHandlers() {
-  theInterruptionSignal = 0;
+  sInterruptionSignal = 0;
   struct sigaction aAction {};
   aAction.sa_handler = fdfOnInterruption;
   sigemptyset(&aAction.sa_mask);
@@ -242,7 +242,7 @@ void fdfInstallInterruptionHandlers() {
 }
 
 const char *fdfPendingInterruption() {
-  switch (theInterruptionSignal) {
+  switch (sInterruptionSignal) {
   case 0: return nullptr;
   case SIGINT: return "SIGINT";
   default: return "SIGTERM";

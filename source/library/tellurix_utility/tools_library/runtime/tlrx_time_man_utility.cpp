@@ -37,12 +37,12 @@ std::string fdfGetTimeStamp(bool theMicroseconds) {
 }
 
 std::string fdfGetCalendarTime() {
-  static const char *const theMonths[12] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
+  static const char *const aMonths[12] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
                                             "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
   const STLRXNow aNow = fdfNow();
   char aText[64];
   std::snprintf(aText, sizeof aText, "%02d-%3.3s-%04d %02d:%02d:%02d.%06ld", aNow.mTime.tm_mday,
-                theMonths[aNow.mTime.tm_mon], aNow.mTime.tm_year + 1900, aNow.mTime.tm_hour, aNow.mTime.tm_min,
+                aMonths[aNow.mTime.tm_mon], aNow.mTime.tm_year + 1900, aNow.mTime.tm_hour, aNow.mTime.tm_min,
                 aNow.mTime.tm_sec, aNow.mMicroseconds);
   return aText;
 }
@@ -83,22 +83,22 @@ bool fdfReadDigits(const std::string &theText, size_t theFrom, size_t theCount, 
 }
 
 int fdfDaysInMonth(int theYear, int theMonth) {
-  static const int theDays[12] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
+  static const int aDays[12] = {31, 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
   const bool aLeap = (theYear % 4 == 0 && theYear % 100 != 0) || theYear % 400 == 0;
-  return theMonth == 2 && aLeap ? 29 : theDays[theMonth - 1];
+  return theMonth == 2 && aLeap ? 29 : aDays[theMonth - 1];
 }
 
 } // namespace
 
 bool fdfParseAcquisitionDate(const std::string &theInput, STLRXDate &theDate) {
-  static const char *const theMonths[12] = {"JAN", "FEB", "MAR", "APR", "MAY", "JUN",
+  static const char *const aMonths[12] = {"JAN", "FEB", "MAR", "APR", "MAY", "JUN",
                                             "JUL", "AUG", "SEP", "OCT", "NOV", "DEC"};
   const std::string aText = theInput.size() > 1 && theInput[1] == '-' ? " " + theInput : theInput;
   if (aText.size() < 11 || aText[2] != '-' || aText[6] != '-')
     return false;
   int aMonth = 0;
   for (int i = 0; i < 12 && aMonth == 0; ++i)
-    if (aText.compare(3, 3, theMonths[i]) == 0)
+    if (aText.compare(3, 3, aMonths[i]) == 0)
       aMonth = i + 1;
   int aDay, aYear, aHours = 0, aMinutes = 0, aSeconds = 0;
   if (aMonth == 0 || aText[1] == ' ' || !fdfReadDigits(aText, 0, 2, aDay) || !fdfReadDigits(aText, 7, 4, aYear) ||
