@@ -5,6 +5,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_description_test_support.h"
 #include "tlrx_test_support.h"
 
 #include <gtest/gtest.h>
@@ -32,18 +33,6 @@ protected:
   std::string keyPath() const { return mDir.file("test.key"); }
 };
 
-template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
-  try {
-    theCall();
-  } catch (const CErrorExceptionManager &aError) {
-    if (theMessage != nullptr) {
-      *theMessage = aError.mMessage;
-    }
-    return aError.mCode;
-  }
-  return 0;
-}
-
 } // namespace
 
 // ------------------------------------------------------------ scalar basics
@@ -55,7 +44,7 @@ TEST_F(DescriptionTest, NewScalarHoldsNoValueUntilSetAndDumpsItsValue) {
   EXPECT_EQ(aField.getColNbr(), 1);
   EXPECT_EQ(aField.dumpText(), "[Count]  [SCALAR]  [Integer] : EMPTY\n");
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aField.getInteger(); }, &aMessage), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aField.getInteger(); }, &aMessage), CTLRX_ERR_DS_NOT_SET);
   EXPECT_EQ(aMessage, "Count");
   aField.setInteger(5);
   EXPECT_TRUE(aField.holdsValue());
@@ -70,7 +59,7 @@ TEST_F(DescriptionTest, NamelessFieldReportsNotInitialisedAndDumpsNothing) {
   aField.setDouble(1.0);
   EXPECT_EQ(aField.dumpText(), "");
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aField.getString(); }, &aMessage), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aField.getString(); }, &aMessage), CTLRX_ERR_DS_TYPE);
   EXPECT_EQ(aMessage, "Not initialised");
 }
 
@@ -86,7 +75,7 @@ TEST_F(DescriptionTest, ScalarConversionsSetAndReadTheSingleValue) {
   EXPECT_EQ(static_cast<std::string>(aText), "abc");
   aText = std::string("def");
   EXPECT_STREQ(aText.getString(), "def");
-  EXPECT_EQ(codeOf([&] { aInt = 1.5; }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInt = 1.5; }), CTLRX_ERR_DS_TYPE);
   aText.setString(nullptr);
   EXPECT_STREQ(aText.getString(), "");
 }
@@ -97,11 +86,11 @@ TEST_F(DescriptionTest, ZeroIndexGettersCheckTypeBeforeSetFlag) {
   CDescriptionField aDouble("D", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
   CDescriptionField aText("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
   // Unset and wrong type: the type check comes first.
-  EXPECT_EQ(codeOf([&] { aDouble.getInteger(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aText.getDouble(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aDouble.getString(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aDouble.getDouble(); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(codeOf([&] { aText.getString(); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getInteger(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aText.getDouble(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getString(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getDouble(); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aText.getString(); }), CTLRX_ERR_DS_NOT_SET);
 }
 
 TEST_F(DescriptionTest, GetIntegerByIndexNeverSubstitutes) {
@@ -110,17 +99,17 @@ TEST_F(DescriptionTest, GetIntegerByIndexNeverSubstitutes) {
   aInts.setInteger(1, 4);
   EXPECT_EQ(aInts.getInteger(0), 0); // unset elements read as stored
   EXPECT_EQ(aInts.getInteger(1), 4);
-  EXPECT_EQ(codeOf([&] { aInts.getInteger(3); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aInts.getInteger(-1); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getInteger(3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getInteger(-1); }), CTLRX_ERR_DS_RANGE);
   CDescriptionField aDoubles("Values", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
   aDoubles.allocate(1, 3);
-  EXPECT_EQ(codeOf([&] { aDoubles.getInteger(9); }), CTLRX_ERR_DS_TYPE); // type before index
+  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(9); }), CTLRX_ERR_DS_TYPE); // type before index
   CDescriptionField aScalar("One", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
   aScalar.setInteger(8);
   EXPECT_EQ(aScalar.getInteger(0), 8);
-  EXPECT_EQ(codeOf([&] { aScalar.getInteger(1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aScalar.getInteger(1); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aEmptyMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
-  EXPECT_EQ(codeOf([&] { aEmptyMatrix.getInteger(0); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aEmptyMatrix.getInteger(0); }), CTLRX_ERR_DS_RANGE);
 }
 
 TEST_F(DescriptionTest, GetDoubleBeyondTheEndSubstitutesExceptForPulseDurations) {
@@ -135,39 +124,39 @@ TEST_F(DescriptionTest, GetDoubleBeyondTheEndSubstitutesExceptForPulseDurations)
     aPulse.allocate(1, 2);
     EXPECT_EQ(aPulse.getDouble(1), 0.0);
     std::string aMessage;
-    EXPECT_EQ(codeOf([&] { aPulse.getDouble(2); }, &aMessage), CTLRX_ERR_DS_RANGE) << aName;
+    EXPECT_EQ(tlrxCodeOf([&] { aPulse.getDouble(2); }, &aMessage), CTLRX_ERR_DS_RANGE) << aName;
     EXPECT_EQ(aMessage, aName);
   }
   CDescriptionField aInts("PulseDuration", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
   aInts.allocate(1, 2);
-  EXPECT_EQ(codeOf([&] { aInts.getDouble(5); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getDouble(5); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  EXPECT_EQ(codeOf([&] { aScalar.getDouble(1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aScalar.getDouble(1); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
   aMatrix.allocate(2, 2);
-  EXPECT_EQ(codeOf([&] { aMatrix.getDouble(1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aMatrix.getDouble(1); }), CTLRX_ERR_DS_TYPE);
 }
 
 TEST_F(DescriptionTest, MatrixGettersCheckInTheirOwnOrder) {
   CDescriptionField aDoubles("D", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
   aDoubles.allocate(2, 3);
   EXPECT_EQ(aDoubles.getDouble(1, 2), 0.0); // never set, no error
-  EXPECT_EQ(codeOf([&] { aDoubles.getDouble(2, 0); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aDoubles.getDouble(0, 3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getDouble(2, 0); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getDouble(0, 3); }), CTLRX_ERR_DS_RANGE);
   // get integer (row, col): bounds before type; get double: type before bounds.
-  EXPECT_EQ(codeOf([&] { aDoubles.getInteger(5, 5); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aDoubles.getInteger(0, 0); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(5, 5); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(0, 0); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aInts("I", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
   aInts.allocate(2, 2);
-  EXPECT_EQ(codeOf([&] { aInts.getDouble(5, 5); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getDouble(5, 5); }), CTLRX_ERR_DS_TYPE);
   // get string (row, col): set flag first, then type.
-  EXPECT_EQ(codeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_NOT_SET);
   aInts.setInteger(0, 0, 3);
-  EXPECT_EQ(codeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aTexts("T", CTLRX_DS_MATRIX, CTLRX_DS_STRING);
   aTexts.allocate(1, 2);
-  EXPECT_EQ(codeOf([&] { aTexts.getString(0, 1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(codeOf([&] { aTexts.getString(4, 4); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(0, 1); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(4, 4); }), CTLRX_ERR_DS_NOT_SET);
   aTexts.setString(0, 1, "v");
   EXPECT_STREQ(aTexts.getString(0, 1), "v");
 }
@@ -177,11 +166,11 @@ TEST_F(DescriptionTest, StringByIndexChecksTypeThenElementSet) {
   aTexts.allocate(1, 2);
   aTexts.setString(0, "first");
   EXPECT_STREQ(aTexts.getString(0), "first");
-  EXPECT_EQ(codeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(codeOf([&] { aTexts.getString(2); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(2); }), CTLRX_ERR_DS_NOT_SET);
   CDescriptionField aInts("Ints", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
   aInts.allocate(1, 1);
-  EXPECT_EQ(codeOf([&] { aInts.getString(7); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(7); }), CTLRX_ERR_DS_TYPE);
 }
 
 // ------------------------------------------------------- setter check order
@@ -189,16 +178,16 @@ TEST_F(DescriptionTest, StringByIndexChecksTypeThenElementSet) {
 TEST_F(DescriptionTest, SettersCheckStorageThenBoundsThenType) {
   CDescriptionField aInts("Ints", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
   aInts.allocate(1, 3);
-  EXPECT_EQ(codeOf([&] { aInts.setDouble(5, 0, 1.0); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aInts.setDouble(0, 1, 1.0); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aInts.setInteger(3, 1); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aInts.setInteger(-1, 1); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.setDouble(5, 0, 1.0); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.setDouble(0, 1, 1.0); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.setInteger(3, 1); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.setInteger(-1, 1); }), CTLRX_ERR_DS_RANGE);
   aInts.setInteger(2, 9);
   EXPECT_EQ(aInts.getInteger(2), 9);
   // No storage yet: 848646 whatever the type.
   CDescriptionField aEmpty("Empty", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  EXPECT_EQ(codeOf([&] { aEmpty.setString(0, "x"); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aEmpty.setInteger(0, 1); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aEmpty.setString(0, "x"); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aEmpty.setInteger(0, 1); }), CTLRX_ERR_DS_RANGE);
 }
 
 TEST_F(DescriptionTest, StoredStringsAreCopiesOwnedByTheField) {
@@ -218,8 +207,8 @@ TEST_F(DescriptionTest, UnsetClearsTheFlagAndChecksBounds) {
   aTexts.setString(1, "x");
   aTexts.unset(1);
   EXPECT_FALSE(aTexts.isSet(1));
-  EXPECT_EQ(codeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(codeOf([&] { aTexts.unset(2); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
+  EXPECT_EQ(tlrxCodeOf([&] { aTexts.unset(2); }), CTLRX_ERR_DS_RANGE);
   CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
   aScalar.setDouble(1.0);
   aScalar.unset();
@@ -233,17 +222,17 @@ TEST_F(DescriptionTest, IsSetFormsAnswerOrRaiseByShape) {
   EXPECT_TRUE(aVector.isSet(0));
   EXPECT_FALSE(aVector.isSet(1));
   EXPECT_FALSE(aVector.isSet(2)); // beyond the end: false, no error
-  EXPECT_EQ(codeOf([&] { aVector.isSet(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aVector.isSet(); }), CTLRX_ERR_DS_TYPE);
   EXPECT_FALSE(aVector.isSet(0, 5));
   EXPECT_FALSE(aVector.isSet(-1, 0));
   CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  EXPECT_EQ(codeOf([&] { aScalar.isSet(1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aScalar.isSet(1); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
   EXPECT_FALSE(aMatrix.isSet(0, 0)); // no storage
   aMatrix.allocate(2, 2);
-  EXPECT_EQ(codeOf([&] { aMatrix.isSet(1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aMatrix.isSet(1); }), CTLRX_ERR_DS_TYPE);
   aScalar.release();
-  EXPECT_EQ(codeOf([&] { aScalar.isSet(); }), CTLRX_ERR_DS_CHECK);
+  EXPECT_EQ(tlrxCodeOf([&] { aScalar.isSet(); }), CTLRX_ERR_DS_CHECK);
 }
 
 // ----------------------------------------------------- storage and holding
@@ -260,7 +249,7 @@ TEST_F(DescriptionTest, VectorsHoldAValueOnceAllocatedAndLoseItOnClear) {
   EXPECT_EQ(aVector.getRowNbr(), 0);
   EXPECT_EQ(aVector.getColNbr(), 0);
   EXPECT_FALSE(aVector.holdsValue());
-  EXPECT_EQ(codeOf([&] { aVector.setDouble(0, 1.0); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aVector.setDouble(0, 1.0); }), CTLRX_ERR_DS_RANGE);
 }
 
 TEST_F(DescriptionTest, ClearingAScalarKeepsItsStorage) {
@@ -275,14 +264,14 @@ TEST_F(DescriptionTest, ClearingAScalarKeepsItsStorage) {
 
 TEST_F(DescriptionTest, AllocationRefusesStructsAndUnusableCounts) {
   CDescriptionField aStruct("Orbit", CTLRX_DS_MULTIPLE, CTLRX_DS_FIELD_POINTER);
-  EXPECT_EQ(codeOf([&] { aStruct.allocate(1, 3); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aStruct.allocate(1, 3); }), CTLRX_ERR_DS_TYPE);
   CDescriptionField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  EXPECT_EQ(codeOf([&] { aVector.allocate(-1, 3); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(codeOf([&] { aVector.allocate(1, -3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(-1, 3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(1, -3); }), CTLRX_ERR_DS_RANGE);
   // The product overflows 32 bits: refused before anything is allocated.
-  EXPECT_EQ(codeOf([&] { aVector.allocate(INT32_MAX, INT32_MAX); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(INT32_MAX, INT32_MAX); }), CTLRX_ERR_DS_RANGE);
   CDescriptionField aUnknown("U", CTLRX_DS_VECTOR, CTLRX_DS_UNRECOGNISED);
-  EXPECT_EQ(codeOf([&] { aUnknown.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aUnknown.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
 }
 
 // ----------------------------------------------------------------- structs
@@ -328,7 +317,7 @@ TEST_F(StructTest, StructOfScalarsNeedsEveryMemberSetAndRefusesElementCounts) {
   EXPECT_FALSE(aCorner->holdsValue());
   aSection->getField(2)->setDouble(2.0);
   EXPECT_TRUE(aCorner->holdsValue());
-  EXPECT_EQ(codeOf([&] { aCorner->setNumberOfElements(3); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aCorner->setNumberOfElements(3); }), CTLRX_ERR_DS_TYPE);
 }
 
 TEST_F(StructTest, AssignmentOfAStructComparesMemberCountsOnly) {
@@ -338,7 +327,7 @@ TEST_F(StructTest, AssignmentOfAStructComparesMemberCountsOnly) {
   EXPECT_EQ(mSection->getField(1)->getColNbr(), 0); // members are copied as fields
   auto aSmaller = declare("[Sec]\nOrbit = 2VD x y\n");
   aSmaller->getField(0)->setNumberOfElements(2);
-  EXPECT_EQ(codeOf([&] { mStruct->assignFrom(*aSmaller->getField(0)); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { mStruct->assignFrom(*aSmaller->getField(0)); }), CTLRX_ERR_DS_TYPE);
 }
 
 // -------------------------------------------------------------- assignment
@@ -365,7 +354,7 @@ TEST_F(DescriptionTest, AssignmentFromAnEmptyFieldLeavesTheTargetAlone) {
   EXPECT_TRUE(aTarget.assignFrom(aSource));
   EXPECT_EQ(aTarget.getDouble(), 3.0);
   aSource.setString("x");
-  EXPECT_EQ(codeOf([&] { aTarget.assignFrom(aSource); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aTarget.assignFrom(aSource); }), CTLRX_ERR_DS_TYPE);
   EXPECT_EQ(aTarget.getDouble(), 3.0);
 }
 
@@ -430,13 +419,13 @@ TEST_F(DescriptionTest, KeyFileRejectsBadTypeCodesAndMissingMemberNames) {
     tlrxWriteFile(keyPath(), std::string("[Sec]\nok = I\n") + aLine + "\n");
     CDescriptionSection aSection;
     std::string aMessage;
-    EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_TYPE)
+    EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_TYPE)
         << aLine;
     EXPECT_EQ(aMessage, "Sec");
   }
   tlrxWriteFile(keyPath(), "[Sec]\nOrbit = 3VD x y ; z forgotten\n");
   CDescriptionSection aSection;
-  EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
 }
 
 TEST_F(DescriptionTest, SectionHeaderMustOpenInTheFirstTwoCharacters) {
@@ -485,12 +474,12 @@ TEST_F(DescriptionTest, NulByteInsideALineDoesNotSwallowTheNextLine) {
 
 TEST_F(DescriptionTest, KeyFileDeclarationFailuresNameTheirCause) {
   CDescriptionSection aSection;
-  EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(nullptr, nullptr); }), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(nullptr, nullptr); }), CTLRX_ERR_DS_DECLARATION);
   std::string aMessage;
   const std::string aMissing = mDir.file("missing.key");
-  EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(aMissing.c_str(), "Sec"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
+  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(aMissing.c_str(), "Sec"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
   EXPECT_EQ(aMessage, aMissing);
-  EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(nullptr, "NoSuchSection"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
+  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(nullptr, "NoSuchSection"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
   std::string aDir;
   ASSERT_TRUE(fdfGetEnvVar(aDir, "TELLURIX_KEY_FILES_DIR"));
   EXPECT_EQ(aMessage, aDir + "NoSuchSection.key");
@@ -514,14 +503,14 @@ TEST_F(DescriptionTest, TheFieldLimitIsReachedByThe5050thField) {
   tlrxWriteFile(keyPath(), aFields(CTLRX_DS_MAX_NBR_FIELDS)); // the 5050th is the last line
   CDescriptionSection aFull;
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_DECLARATION);
   EXPECT_EQ(aMessage, "Sec");
   // Struct members count too; a huge declared count is refused before any
   // member array is sized by it.
   tlrxWriteFile(keyPath(), aFields(5046) + "S = 3VD a b c\n");
-  EXPECT_EQ(codeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
   tlrxWriteFile(keyPath(), "[Sec]\nS = 99999999999999999999VD a\n");
-  EXPECT_EQ(codeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);
 }
 
@@ -542,11 +531,11 @@ TEST_F(DescriptionTest, ScratchPoolHas110SlotsAndReportsExhaustion) {
   }
   EXPECT_EQ(fdfScratchBuffersInUse(), 110);
   std::string aMessage;
-  EXPECT_EQ(codeOf([] { CScratchBuffer aOne(16); }, &aMessage), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([] { CScratchBuffer aOne(16); }, &aMessage), CTLRX_ERR_DS_RANGE);
   EXPECT_EQ(aMessage, "All pools are busy");
   tlrxWriteFile(keyPath(), "[Sec]\na = I\n");
   CDescriptionSection aSection;
-  EXPECT_EQ(codeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_RANGE);
   aLeases.pop_back();
   EXPECT_TRUE(aSection.declareFromKeyFile(keyPath().c_str(), "Sec"));
   aLeases.clear();
@@ -556,118 +545,6 @@ TEST_F(DescriptionTest, ScratchPoolHas110SlotsAndReportsExhaustion) {
 }
 
 // ------------------------------------------------------------ descriptions
-
-TEST_F(DescriptionTest, StandardHeaderHasItsSectionsInOrder) {
-  CDescription aHeader;
-  fdfDeclareStandardHeader(aHeader);
-  ASSERT_EQ(aHeader.getSectionCount(), 21);
-  EXPECT_STREQ(aHeader.getRootTag(), "HEADER_INFO");
-  const std::vector<std::string> &aNames = fdfStandardHeaderSections();
-  for (int32_t i = 0; i < 21; ++i) {
-    EXPECT_EQ(aHeader.getSection(i)->getName(), aNames[static_cast<size_t>(i)]);
-    EXPECT_GT(aHeader.getSection(i)->getFieldCount(), 0) << aNames[static_cast<size_t>(i)];
-  }
-  EXPECT_STREQ(aHeader.getSection(0)->getName(), "EnvisatDescriptionRecord");
-  EXPECT_STREQ(aHeader.getSection(20)->getName(), "GCPRasterInfo");
-  EXPECT_EQ(aHeader.getSection(21), nullptr);
-  EXPECT_FALSE(aHeader.holdsValue());
-}
-
-// Every header field the commands read or write, with the shape and type
-// their use implies.
-TEST_F(DescriptionTest, StandardHeaderDeclaresTheFieldsTheCommandsUse) {
-  struct SExpected {
-    const char *mKey;
-    int32_t mShape;
-    int32_t mType;
-  };
-  const SExpected aTable[] = {
-      {"RasterInfo.NrOfLinesPerImage", 0, 0},
-      {"RasterInfo.NrOfPixelsPerLine", 0, 0},
-      {"RasterInfo.CellType", 0, 2},
-      {"RasterInfo.DataUnits", 0, 2},
-      {"RasterInfo.HeaderOffset", 0, 0},
-      {"RasterInfo.RowPrefix", 0, 0},
-      {"RasterInfo.RowSuffix", 0, 0},
-      {"RasterInfo.FooterLen", 0, 0},
-      {"RasterInfo.BytesOrder", 0, 2},
-      {"RasterInfo.NrOfChannels", 0, 0},
-      {"RasterInfo.NullCellValue", 0, 1},
-      {"RasterInfo.RealScaleFactor", 0, 1},
-      {"RasterInfo.ImaginaryScaleFactor", 0, 1},
-      {"RasterInfo.GeocodedImage", 0, 2},
-      {"RasterInfo.OtherInfo", 2, 2},
-      {"RasterInfo.FilesList", 1, 2},
-      {"RasterInfo.ClassificationName", 1, 2},
-      {"RasterInfo.ClassificationData", 1, 0},
-      {"RasterInfo.TiffLUTRed", 1, 0},
-      {"RasterInfo.TiffLUTGreen", 1, 0},
-      {"RasterInfo.TiffLUTBlue", 1, 0},
-      {"RasterInfo.TiffMinValue", 0, 1},
-      {"RasterInfo.TiffMaxValue", 0, 1},
-      {"RasterInfo.TiffScale", 0, 1},
-      {"RasterInfo.TiffExponent", 0, 1},
-      {"RasterInfo.TiffRowScale", 0, 0},
-      {"RasterInfo.TiffColScale", 0, 0},
-      {"RasterInfo.TiffRowsInvert", 0, 2},
-      {"RasterInfo.TiffColsInvert", 0, 2},
-      {"RasterInfo.CalibrationValue", 0, 1},
-      {"RasterInfo.CalibrationType", 0, 2},
-      {"RasterInfo.RescalingMinValue", 0, 1},
-      {"RasterInfo.RescalingScaleValue", 0, 1},
-      {"CartographicSystem.State", 0, 2},
-      {"CartographicSystem.Hemisphere", 0, 2},
-      {"CartographicSystem.Projection", 0, 2},
-      {"CartographicSystem.Zone", 0, 0},
-      {"CartographicSystem.Ellipsoid", 0, 2},
-      {"CartographicSystem.DatumShift", 0, 2},
-      {"RegistrationCoordinates.LatNorthing", 0, 1},
-      {"RegistrationCoordinates.LonEasting", 0, 1},
-      {"RegistrationCoordinates.PixelSpacingLatNorth", 0, 1},
-      {"RegistrationCoordinates.PixelSpacingLonEast", 0, 1},
-      {"DEMCoordinates.NorthingCoordinateBegin", 0, 1},
-      {"DEMCoordinates.NorthingGridSize", 0, 1},
-      {"DEMCoordinates.NorthingCoordinateEnd", 0, 1},
-      {"DEMCoordinates.EastingCoordinateBegin", 0, 1},
-      {"DEMCoordinates.EastingGridSize", 0, 1},
-      {"DEMCoordinates.EastingCoordinateEnd", 0, 1},
-      {"Processing.PixelSpacingRg", 0, 1},
-      {"Processing.PixelSpacingAz", 0, 1},
-      {"Processing.NRangeLooks", 0, 0},
-      {"Processing.NAzimuthLooks", 0, 0},
-      {"InitialGeometry.Projection", 0, 2},
-      {"ChannelInfo.IncidenceAngle", 0, 1},
-      {"ChannelInfo.PulseDuration", 1, 1},
-      {"interferometric_processing.DRangePoly", 1, 1},
-      {"interferometric_processing.DAzimuthPoly", 1, 1},
-      {"interferometric_processing.DRangePolyResTopo", 1, 1},
-      {"interferometric_processing.DAzimuthPolyResTopo", 1, 1},
-      {"interferometric_processing.DRangePolyInv", 1, 1},
-      {"interferometric_processing.DAzimuthPolyInv", 1, 1},
-      {"interferometric_processing.ProcessedPixels", 0, 0},
-      {"StateVectorData.StateVectorData", 3, 3},
-      {"StateVectorData.PosX", 1, 1},
-      {"GCPRasterInfo.GCPTable", 3, 3},
-  };
-  CDescription aHeader;
-  fdfDeclareStandardHeader(aHeader);
-  for (const SExpected &aRow : aTable) {
-    const CDescriptionField *aField = aHeader.findField(aRow.mKey);
-    ASSERT_NE(aField, nullptr) << aRow.mKey;
-    EXPECT_EQ(aField->getShape(), aRow.mShape) << aRow.mKey;
-    EXPECT_EQ(aField->getValueType(), aRow.mType) << aRow.mKey;
-  }
-  // Bare keys of the GeoTIFF and raster code land in the right section.
-  const char *aBare[][2] = {
-      {"NullCellValue", "RasterInfo.NullCellValue"},       {"BytesOrder", "RasterInfo.BytesOrder"},
-      {"Projection", "CartographicSystem.Projection"},     {"State", "CartographicSystem.State"},
-      {"TiffMinValue", "RasterInfo.TiffMinValue"},         {"RowPrefix", "RasterInfo.RowPrefix"},
-      {"LonEasting", "RegistrationCoordinates.LonEasting"}};
-  for (const auto &aPair : aBare) {
-    EXPECT_EQ(aHeader.findField(aPair[0]), aHeader.findField(aPair[1])) << aPair[0];
-  }
-  EXPECT_EQ(aHeader.findField("StateVectorData.StateVectorData")->getMemberCount(), 7);
-}
 
 TEST_F(DescriptionTest, DottedKeysSplitAtTheFirstDot) {
   CDescription aDescription;
@@ -693,11 +570,11 @@ TEST_F(DescriptionTest, DottedKeysSplitAtTheFirstDot) {
   EXPECT_EQ(aDescription.findSection("B"), aDescription.getSection(1));
   EXPECT_EQ(aDescription.findSection("b"), nullptr);
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aDescription.getField("A.missing"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
+  EXPECT_EQ(tlrxCodeOf([&] { aDescription.getField("A.missing"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "A.missing");
   // A declared field without a value is missing for the value accessor only.
   EXPECT_NO_THROW(aDescription.getField("B.y"));
-  EXPECT_EQ(codeOf([&] { aDescription.getFieldWithValue("B.y"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
+  EXPECT_EQ(tlrxCodeOf([&] { aDescription.getFieldWithValue("B.y"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "B.y");
   aDescription.getField("B.y").setDouble(1.0);
   EXPECT_EQ(aDescription.getFieldWithValue("B.y").getDouble(), 1.0);
@@ -746,11 +623,11 @@ TEST_F(DescriptionTest, CopyOfSectionsOfAnotherNameOrLayoutFails) {
   aSection->setName("RasterInfo");
   aSource.addSection(std::move(aSection));
   EXPECT_FALSE(aTarget.copyFrom(aSource, true));
-  EXPECT_EQ(codeOf([&] { aTarget = aSource; }), CTLRX_ERR_DS_DECLARATION);
+  EXPECT_EQ(tlrxCodeOf([&] { aTarget = aSource; }), CTLRX_ERR_DS_DECLARATION);
   // Same layout, another value type at one position: the assignment raises.
   auto aTyped = declare("[RasterInfo]\nNrOfLinesPerImage = D\n", "RasterInfo");
   aTyped->getField(0)->setDouble(1.0);
-  EXPECT_EQ(codeOf([&] { aSameLayout->copyValuesFrom(*aTyped); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aSameLayout->copyValuesFrom(*aTyped); }), CTLRX_ERR_DS_TYPE);
 }
 
 TEST_F(DescriptionTest, PrintListsSectionsAndFields) {
@@ -782,7 +659,7 @@ TEST_F(DescriptionTest, MandatoryCheckLogsEveryEmptyListedField) {
   EXPECT_EQ(aLog.find("NotDeclaredHere"), std::string::npos);
   EXPECT_EQ(aLog.find("[PixelSpacingRg]"), std::string::npos); // stops at the first failing section
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aHeader.checkMandatory(aMandatory.c_str(), true); }, &aMessage), CTLRX_ERR_DS_CHECK);
+  EXPECT_EQ(tlrxCodeOf([&] { aHeader.checkMandatory(aMandatory.c_str(), true); }, &aMessage), CTLRX_ERR_DS_CHECK);
   EXPECT_EQ(aMessage, aMandatory);
 
   aHeader.getField("RasterInfo.NrOfPixelsPerLine").setInteger(10);
@@ -803,6 +680,6 @@ TEST_F(DescriptionTest, MandatoryFileByNameComesFromTheMandatoryDirectory) {
   EXPECT_FALSE(aHeader.checkMandatory("GeocodedHeader", false));
   // Nothing can be verified without the file.
   EXPECT_FALSE(aHeader.checkMandatory("NoSuchList", false));
-  EXPECT_EQ(codeOf([&] { aHeader.checkMandatory("NoSuchList", true); }), CTLRX_ERR_DS_CHECK);
+  EXPECT_EQ(tlrxCodeOf([&] { aHeader.checkMandatory("NoSuchList", true); }), CTLRX_ERR_DS_CHECK);
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);
 }

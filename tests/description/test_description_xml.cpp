@@ -4,6 +4,7 @@
 #include "tlrx_description_test_support.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
+#include "tlrx_trace_test_support.h"
 #include "tlrx_xml_element_tree.h"
 
 #include <gtest/gtest.h>
@@ -290,39 +291,6 @@ TEST_F(DescriptionXmlTest, DemBoxIsDerivedForGeocodedRasters) {
   EXPECT_DOUBLE_EQ(aRead.getField("DEMCoordinates.EastingCoordinateEnd").getDouble(), aLon + 801 * aSpacingLon);
 }
 
-TEST_F(DescriptionXmlTest, WrittenHeaderIsWellFormedForXmllint) {
-  CDescription aDescription;
-  declare(aDescription, {"Sensor", "RasterInfo"});
-  fillSmall(aDescription);
-  aDescription.getField("RasterInfo.NrOfLinesPerImage").setInteger(5);
-  ASSERT_TRUE(aDescription.writeXML(path("lint.sml").c_str(), true, true));
-  const std::string aCommand = "xmllint --noout '" + path("lint.sml") + "' 2>'" + path("lint.err") + "'";
-  EXPECT_EQ(std::system(aCommand.c_str()), 0) << tlrxReadFile(path("lint.err"));
-}
-
-TEST_F(DescriptionXmlTest, StandardHeaderValidatesAgainstTheHeaderSchema) {
-  // The standard sections from the installed key files, validated by libxml2
-  // against the installed header schema.
-  CDescription aDescription;
-  for (const char *aName : {"RasterInfo", "StateVectorData"}) {
-    auto aSection = std::make_unique<CDescriptionSection>();
-    aSection->declareFromKeyFile((tlrxDataDir() + "/key_files/" + aName + ".key").c_str(), aName);
-    aDescription.addSection(std::move(aSection));
-  }
-  aDescription.getField("RasterInfo.NrOfLinesPerImage").setInteger(5);
-  aDescription.getField("RasterInfo.CellType").setString("FLOAT");
-  aDescription.getField("RasterInfo.NullCellValue").setDouble(std::nan(""));
-  aDescription.getField("StateVectorData.StateVectorData").setNumberOfElements(2);
-  for (const char *aMember : {"TimeRelative", "PosX", "PosY", "PosZ", "VelX", "VelY", "VelZ"})
-    for (int i = 0; i < 2; ++i)
-      aDescription.getField((std::string("StateVectorData.") + aMember).c_str()).setDouble(i, i + 0.5);
-  ASSERT_TRUE(aDescription.writeXML(path("std.sml").c_str(), true, true));
-  const std::string aCommand = "xmllint --noout --schema '" + tlrxDataDir() +
-                               "/xml_schemas/TellurixHeaderSchema_version_1.0.xsd' '" + path("std.sml") + "' 2>'" +
-                               path("std.err") + "'";
-  EXPECT_EQ(std::system(aCommand.c_str()), 0) << tlrxReadFile(path("std.err"));
-}
-
 // ------------------------------------------------------------ round trips
 
 TEST_F(DescriptionXmlTest, EveryShapeAndValueTypeRoundTrips) {
@@ -354,19 +322,6 @@ TEST_F(DescriptionXmlTest, ReadingClearsValuesTheFileDoesNotHold) {
   EXPECT_FALSE(aRead.getField("Sensor.Name").holdsValue());
   EXPECT_FALSE(aRead.getField("Sensor.Doppler").holdsValue());
   EXPECT_EQ(aRead.getField("Sensor.Lines").getInteger(), 1);
-}
-
-TEST_F(DescriptionXmlTest, HighBytesAndEntitiesFollowTheReaderRules) {
-  CDescription aDescription;
-  declare(aDescription);
-  // 0x85 survives, 0xE9 alone reads as "e", UTF-8 letters pass unchanged
-  // (including their bytes 0xA0 and 0xB0), a lone 0xB0 reads as "d".
-  aDescription.getField("Sensor.Name").setString("a\x85z \xE9t\xE9 \xC3\xA0 \xC2\xB0 \xB0");
-  ASSERT_TRUE(aDescription.writeXML(path("bytes.sml").c_str(), true, true));
-  CDescription aRead;
-  declare(aRead);
-  ASSERT_TRUE(aRead.readXML(path("bytes.sml").c_str(), true));
-  EXPECT_EQ(std::string(aRead.getField("Sensor.Name").getString()), "a\x85z ete \xC3\xA0 \xC2\xB0 d");
 }
 
 TEST_F(DescriptionXmlTest, ValuesAreTakenInDocumentOrderAndNaNByText) {
@@ -605,14 +560,13 @@ TEST_F(DescriptionXmlTest, MalformedTruncatedAndGarbageFilesAreRejected) {
 
 TEST_F(DescriptionXmlTest, ExpatErrorTextAndLineReachTheTrace) {
   tlrxWriteFile(path("broken.sml"), "<?xml version=\"1.0\" ?>\n<HEADER_INFO>\n <Sensor>\n  <Lines>1</Line>\n");
-  fdfSetEnvVar("ACTIVE", "TELLURIX_TRACING");
-  ASSERT_TRUE(fdfOpenTrace(false));
+  ASSERT_TRUE(tlrxStartTrace());
   CDescription aRead;
   declare(aRead);
   const bool aResult = aRead.readXML(path("broken.sml").c_str(), false);
-  fdfCloseTrace();
+  const std::string aTrace = tlrxStopTrace(mDir.path());
   EXPECT_FALSE(aResult);
-  EXPECT_NE(tlrxReadFile(mDir.file("Process.trace")).find("mismatched tag at line 4\n  <Lines>1</Line>\n"),
+  EXPECT_NE(aTrace.find("mismatched tag at line 4\n  <Lines>1</Line>\n"),
             std::string::npos);
 }
 

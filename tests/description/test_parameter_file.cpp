@@ -7,6 +7,7 @@
 #include "tlrx_generic_utility.h"
 #include "tlrx_init_from_xml_schema.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_description_test_support.h"
 #include "tlrx_test_support.h"
 
 #include <gtest/gtest.h>
@@ -52,18 +53,6 @@ protected:
   }
 };
 
-template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
-  try {
-    theCall();
-  } catch (const CErrorExceptionManager &aError) {
-    if (theMessage != nullptr) {
-      *theMessage = aError.mMessage;
-    }
-    return aError.mCode;
-  }
-  return 0;
-}
-
 } // namespace
 
 TEST_F(ParameterFileTest, TemporalParameterFileInitialisesAndSwitchesAreExact) {
@@ -79,10 +68,10 @@ TEST_F(ParameterFileTest, TemporalParameterFileInitialisesAndSwitchesAreExact) {
   EXPECT_FALSE(fdfIsSwitchOn(aParameters.getField("MAIN_CMD.median").getString()));
   // A setting the file lacks, and one read with the wrong type.
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aParameters.getFieldWithValue("MAIN_CMD.gradient"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
+  EXPECT_EQ(tlrxCodeOf([&] { aParameters.getFieldWithValue("MAIN_CMD.gradient"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "MAIN_CMD.gradient");
-  EXPECT_EQ(codeOf([&] { aParameters.getField("MAIN_CMD.no_such_key"); }), CTLRX_ERR_DS_FIELD_MISSING);
-  EXPECT_EQ(codeOf([&] { aParameters.getField("MAIN_CMD.max_increment_thr_db").getString(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aParameters.getField("MAIN_CMD.no_such_key"); }), CTLRX_ERR_DS_FIELD_MISSING);
+  EXPECT_EQ(tlrxCodeOf([&] { aParameters.getField("MAIN_CMD.max_increment_thr_db").getString(); }), CTLRX_ERR_DS_TYPE);
   EXPECT_NO_THROW(fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters));
 }
 
@@ -97,7 +86,7 @@ TEST_F(ParameterFileTest, EnvironmentMustBeExactlyTheSupportedOne) {
   CDescription aParameters;
   EXPECT_FALSE(fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters));
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters); },
+  EXPECT_EQ(tlrxCodeOf([&] { fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters); },
                    &aMessage),
             CTLRX_ERR_PARAMETER_FILE);
   EXPECT_EQ(aMessage, aFile);
@@ -111,7 +100,7 @@ TEST_F(ParameterFileTest, AnotherRootElementIsRejected) {
     CDescription aParameters;
     EXPECT_FALSE(fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters)) << aRoot;
     EXPECT_EQ(
-        codeOf([&] { fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters); }),
+        tlrxCodeOf([&] { fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aFile.c_str(), aParameters); }),
         CTLRX_ERR_PARAMETER_FILE)
         << aRoot;
   }
@@ -123,11 +112,11 @@ TEST_F(ParameterFileTest, UnreadableParameterFileRaisesTheParseError) {
   CDescription aParameters;
   std::string aMessage;
   EXPECT_EQ(
-      codeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aBroken.c_str(), aParameters); }, &aMessage),
+      tlrxCodeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aBroken.c_str(), aParameters); }, &aMessage),
       CTLRX_ERR_FILE_PARSE);
   EXPECT_EQ(aMessage, aBroken);
   const std::string aMissing = mDir.file("missing.xml");
-  EXPECT_EQ(codeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aMissing.c_str(), aParameters); }),
+  EXPECT_EQ(tlrxCodeOf([&] { fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD"}, aMissing.c_str(), aParameters); }),
             CTLRX_ERR_FILE_PARSE);
 }
 
@@ -136,7 +125,7 @@ TEST_F(ParameterFileTest, SchemaProblemsFailTheInitialisation) {
   CDescription aParameters;
   EXPECT_FALSE(fdfInitParameters("NO_SUCH_SCHEMA", {"MAIN_CMD"}, aFile.c_str(), aParameters));
   EXPECT_FALSE(fdfInitParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD", "FLAT_CMD"}, aFile.c_str(), aParameters));
-  EXPECT_EQ(codeOf([&] {
+  EXPECT_EQ(tlrxCodeOf([&] {
               fdfLoadCommandParameters(CTLRX_TEMPORAL_SCHEMA, {"MAIN_CMD", "FLAT_CMD"}, aFile.c_str(), aParameters);
             }),
             CTLRX_ERR_PARAMETER_FILE);
@@ -166,7 +155,7 @@ TEST_F(ParameterFileTest, CoherenceFileWithoutFlatSectionInitialises) {
   EXPECT_STREQ(aParameters.getField("MAIN_CMD.rg_looks").getString(), "1");
   EXPECT_FALSE(aParameters.getSection(3)->holdsValue());
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { aParameters.getFieldWithValue("FLAT_CMD.in_dem_file_name"); }, &aMessage),
+  EXPECT_EQ(tlrxCodeOf([&] { aParameters.getFieldWithValue("FLAT_CMD.in_dem_file_name"); }, &aMessage),
             CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "FLAT_CMD.in_dem_file_name");
 }
@@ -219,7 +208,7 @@ TEST_F(ParameterFileTest, MissingOrUnwritableHeadersRaiseTheirFileErrors) {
   const std::string aRaster = mDir.file("absent");
   CDescription aHeader;
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { fdfReadStandardHeader(aRaster.c_str(), aHeader); }, &aMessage), CTLRX_ERR_FILE_OPEN);
+  EXPECT_EQ(tlrxCodeOf([&] { fdfReadStandardHeader(aRaster.c_str(), aHeader); }, &aMessage), CTLRX_ERR_FILE_OPEN);
   EXPECT_EQ(aMessage, aRaster + "_hdr");
   fdfDeclareStandardHeader(aHeader);
   aHeader.getField("RasterInfo.NrOfLinesPerImage").setInteger(1);
@@ -227,7 +216,7 @@ TEST_F(ParameterFileTest, MissingOrUnwritableHeadersRaiseTheirFileErrors) {
   const TLRXEnviHeaderWriter aEnvi = fdfSetEnviHeaderWriter(nullptr);
   const std::string aNowhere = mDir.file("no_dir/raster");
   EXPECT_FALSE(fdfWriteStandardHeader(aNowhere.c_str(), aHeader));
-  const int32_t aCode = codeOf([&] { fdfWriteStandardHeader(aNowhere.c_str(), aHeader, true); }, &aMessage);
+  const int32_t aCode = tlrxCodeOf([&] { fdfWriteStandardHeader(aNowhere.c_str(), aHeader, true); }, &aMessage);
   fdfSetEnviHeaderWriter(aEnvi);
   EXPECT_EQ(aCode, CTLRX_ERR_FILE_WRITE);
   EXPECT_EQ(aMessage, aNowhere);
@@ -251,7 +240,7 @@ TEST_F(ParameterFileTest, UnreadableHeadersSayWhyInTheMessage) {
     const std::string aRaster = mDir.file(std::string(aCase.mName).substr(0, std::string(aCase.mName).find_first_of("._")));
     CDescription aHeader;
     std::string aMessage;
-    EXPECT_EQ(codeOf([&] { fdfReadStandardHeader(aRaster.c_str(), aHeader); }, &aMessage), CTLRX_ERR_FILE_OPEN)
+    EXPECT_EQ(tlrxCodeOf([&] { fdfReadStandardHeader(aRaster.c_str(), aHeader); }, &aMessage), CTLRX_ERR_FILE_OPEN)
         << aCase.mName;
     EXPECT_EQ(aMessage, aCase.mMessage);
   }

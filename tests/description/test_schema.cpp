@@ -6,6 +6,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_init_from_xml_schema.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_description_test_support.h"
 #include "tlrx_test_support.h"
 
 #include <gtest/gtest.h>
@@ -76,39 +77,6 @@ protected:
 )");
   }
 };
-
-template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
-  try {
-    theCall();
-  } catch (const CErrorExceptionManager &aError) {
-    if (theMessage != nullptr) {
-      *theMessage = aError.mMessage;
-    }
-    return aError.mCode;
-  }
-  return 0;
-}
-
-struct SKeyType {
-  std::string mKey;
-  int32_t mShape;
-  int32_t mType;
-};
-
-void expectKeys(const CDescription &theDescription, const std::vector<SKeyType> &theKeys) {
-  for (const SKeyType &aKey : theKeys) {
-    const CDescriptionField *aField = theDescription.findField(aKey.mKey.c_str());
-    ASSERT_NE(aField, nullptr) << aKey.mKey;
-    EXPECT_EQ(aField->getShape(), aKey.mShape) << aKey.mKey;
-    EXPECT_EQ(aField->getValueType(), aKey.mType) << aKey.mKey;
-  }
-}
-
-constexpr int32_t sS = CTLRX_DS_SCALAR;
-constexpr int32_t sV = CTLRX_DS_VECTOR;
-constexpr int32_t sTi = CTLRX_DS_INTEGER;
-constexpr int32_t sTd = CTLRX_DS_DOUBLE;
-constexpr int32_t sTs = CTLRX_DS_STRING;
 
 } // namespace
 
@@ -216,19 +184,19 @@ TEST_F(SchemaTest, FieldOfAnUnknownTypeRefusesEveryAccess) {
   EXPECT_EQ(aH.getShape(), -1);
   EXPECT_EQ(aH.getValueType(), -1);
   EXPECT_FALSE(aH.holdsValue());
-  EXPECT_EQ(codeOf([&] { aH.getString(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aH.getDouble(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aH.getInteger(0); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aH.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aH.setNumberOfElements(2); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aH.getString(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aH.getDouble(); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aH.getInteger(0); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aH.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aH.setNumberOfElements(2); }), CTLRX_ERR_DS_TYPE);
   // Scalar-typed but without a value type: a scalar cell refuses typed values.
   CDescription aOther;
   const std::string aPath = writeSchema(R"(<xs:element name="T"><xs:complexType><xs:sequence>
       <xs:element name="n" type="xs:int"/></xs:sequence></xs:complexType></xs:element>)",
                                         "int.xsd");
   ASSERT_TRUE(aOther.declareFromSchema(aPath.c_str(), {"T"}));
-  EXPECT_EQ(codeOf([&] { aOther.getField("T.n").setInteger(3); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(codeOf([&] { aOther.getField("T.n").setString("3"); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aOther.getField("T.n").setInteger(3); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aOther.getField("T.n").setString("3"); }), CTLRX_ERR_DS_TYPE);
 }
 
 TEST_F(SchemaTest, UndeclaredOrEmptySectionFailsTheDeclaration) {
@@ -264,7 +232,7 @@ TEST_F(SchemaTest, UnparsableSchemaRaisesWithItsPath) {
     tlrxWriteFile(aPath, aText);
     CXmlSchema aSchema;
     std::string aMessage;
-    EXPECT_EQ(codeOf([&] { aSchema.load(nullptr, aPath.c_str()); }, &aMessage), CTLRX_ERR_FILE_PARSE) << aText;
+    EXPECT_EQ(tlrxCodeOf([&] { aSchema.load(nullptr, aPath.c_str()); }, &aMessage), CTLRX_ERR_FILE_PARSE) << aText;
     EXPECT_EQ(aMessage, aPath);
   }
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);
@@ -312,104 +280,6 @@ TEST_F(SchemaTest, HeaderSchemaDeclaresWhatTheKeyFilesDeclare) {
       EXPECT_EQ(aFK.getMemberCount(), aFX.getMemberCount());
     }
   }
-}
-
-TEST_F(SchemaTest, TemporalParameterSchemaDeclaresEveryKey) {
-  CDescription aParameters;
-  ASSERT_TRUE(aParameters.declareFromSchema("PARAMETERS_INFO_MT_FEAT_EXT_CMD", {"MAIN_CMD"}));
-  std::vector<SKeyType> aKeys = {{"MAIN_CMD.input_file_list", sV, sTs},
-                                 {"MAIN_CMD.out_root_file_name", sS, sTs},
-                                 {"MAIN_CMD.interp_type", sS, sTs},
-                                 {"MAIN_CMD.max_increment_thr_db", sS, sTd},
-                                 {"MAIN_CMD.max_decrement_thr_time", sS, sTd},
-                                 {"MAIN_CMD.saturation_default", sS, sTd},
-                                 {"MAIN_CMD.TellurixEnvironment", sS, sTs}};
-  for (const char *aSwitch : {"normalize", "out_db", "mean", "std", "median", "gradient", "max", "min",
-                              "span_max_less_min", "max_less_min_sup", "max_less_min_inf", "span_max_on_min",
-                              "max_on_min_sup", "max_on_min_inf", "date_max", "date_min_before_max", "make_tiff"}) {
-    aKeys.push_back({std::string("MAIN_CMD.") + aSwitch, sS, sTs});
-  }
-  expectKeys(aParameters, aKeys);
-  EXPECT_EQ(aParameters.getSection(0)->getFieldCount(), 24);
-}
-
-TEST_F(SchemaTest, CoherenceParameterSchemaDeclaresEveryKeyOfItsFourSections) {
-  CDescription aParameters;
-  ASSERT_TRUE(aParameters.declareFromSchema("PARAMETERS_INFO_MAIN_FE_COHERENCE_CMD",
-                                            {"COREGISTRATION_CMD", "MAIN_CMD", "INTERF_CMD", "FLAT_CMD"}));
-  expectKeys(aParameters, {
-                              {"INTERF_CMD.int_spectral_shift_filter_flag", sS, sTs},
-                              {"INTERF_CMD.int_doppler_filter_flag", sS, sTs},
-                              {"INTERF_CMD.int_blocksize", sS, sTi},
-                              {"INTERF_CMD.int_block_overlap", sS, sTi},
-                              {"FLAT_CMD.in_dem_file_name", sS, sTs},
-                              {"FLAT_CMD.in_gcp_file_name", sS, sTs},
-                              {"FLAT_CMD.synt_phase_interp_box_size", sS, sTi},
-                              {"FLAT_CMD.synt_phase_mean_box_size", sS, sTi},
-                              {"FLAT_CMD.synt_phase_orbit_interp_val", sS, sTi},
-                              {"FLAT_CMD.synt_resamp_grid_size", sS, sTd},
-                              {"FLAT_CMD.synt_automatic_slave_orbital_correction_flag", sS, sTs},
-                              {"FLAT_CMD.synt_optimal_resolution_flag", sS, sTs},
-                              {"MAIN_CMD.in_master_file_name", sS, sTs},
-                              {"MAIN_CMD.in_slave_file_name", sS, sTs},
-                              {"MAIN_CMD.out_root_file_name", sS, sTs},
-                              {"MAIN_CMD.input_param_file_name", sS, sTs},
-                              {"MAIN_CMD.compute_param_flag", sS, sTs},
-                              {"MAIN_CMD.baseline", sS, sTs},
-                              {"MAIN_CMD.coherence_corr_box_size", sS, sTs},
-                              {"MAIN_CMD.az_looks", sS, sTs},
-                              {"MAIN_CMD.rg_looks", sS, sTs},
-                              {"MAIN_CMD.adat_filter_flag", sS, sTs},
-                              {"MAIN_CMD.fa_low_snr", sS, sTs},
-                              {"MAIN_CMD.fa_width", sS, sTs},
-                              {"MAIN_CMD.shut_flag", sS, sTs},
-                              {"MAIN_CMD.make_tiff", sS, sTs},
-                              {"MAIN_CMD.saturation_default", sS, sTs},
-                              {"MAIN_CMD.TellurixEnvironment", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_start_shift_range", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_start_shift_azimuth", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_init_from_orbits_flag", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_init_from_amplitude_flag", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_init_from_coherence_flag", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_number_coeff_range", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_number_coeff_azimuth", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_number_res_coeff_range", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_number_res_coeff_azimuth", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_border_dinstance_range", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_border_dinstance_azimuth", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_range_shift_dinst_multiple", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_azimuth_shift_dinst_multiple", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_maximize_the_variance_flag", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_variance_threshold", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_orbit_interpolation", sS, sTi},
-                              {"COREGISTRATION_CMD.input_shape_file_name", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_activate_test_on_orbit_flag", sS, sTs},
-                              {"COREGISTRATION_CMD.cc_range_win_size_test", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_azimuth_win_size_test", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_max_shift_test", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_validity_threshold_test", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_init_range_win_size", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_init_azimuth_win_size", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_init_range_position", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_init_azimuth_position", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_range_win_number_cc", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_azimuth_win_number_cc", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_range_win_size_cc", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_azimuth_win_size_cc", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_oversampling_cc", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_validity_threshold_cc", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_oversampling_fine", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_range_win_number_fine", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_azimuth_win_number_fine", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_range_win_size_fine", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_azimuth_win_size_fine", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_SNR_threshold", sS, sTd},
-                              {"COREGISTRATION_CMD.cc_oversampling_coherence", sS, sTi},
-                              {"COREGISTRATION_CMD.cc_coh_reject_threshold", sS, sTd},
-                          });
-  // The environment is found by its bare name, in the first section declaring it.
-  EXPECT_EQ(aParameters.findField("TellurixEnvironment"), aParameters.findField("MAIN_CMD.TellurixEnvironment"));
-  EXPECT_EQ(aParameters.getSection(0)->getFieldCount(), 40);
 }
 
 // A header written with every field holding a value is valid against the

@@ -132,7 +132,7 @@ TEST_F(CorrelationStepTest, IndependentImagesGiveRNearOneHalfAndManyExactZeros) 
   // r is spread about 0.5: close to half the pixels are cut to exactly 0.
   EXPECT_GT(aZeros, static_cast<long>(aOut.size() * 0.35));
   EXPECT_LT(aZeros, static_cast<long>(aOut.size() * 0.65));
-  EXPECT_LT(interiorMean(aOut, aLines, aPixels, 10), 0.2);
+  EXPECT_LT(tlrxInteriorMean(aOut, aLines, aPixels, 10), 0.2);
 }
 
 // A block of zeros in a constant image, and one after bright pixels. Guards
@@ -201,10 +201,10 @@ TEST_F(CorrelationStepTest, ErrorsAndTheirCodes) {
   write("tall", constantImage(5, 5, 2.0), "AMPLITUDE");
   write("wide", constantImage(4, 6, 2.0), "AMPLITUDE");
   auto aNormalize = [&](const std::vector<std::string> &theArgs) {
-    return raisedCode([&] { run(normalize_images, theArgs); });
+    return tlrxRaisedCode([&] { run(normalize_images, theArgs); });
   };
   auto aCorrelate = [&](const std::vector<std::string> &theArgs) {
-    return raisedCode([&] { run(quick_and_dirty, theArgs); });
+    return tlrxRaisedCode([&] { run(quick_and_dirty, theArgs); });
   };
   const std::string a = file("a"), b = file("b"), n = file("norm"), o = file("o");
   EXPECT_EQ(aNormalize({a, b, n, "0", "3"}), 783360);
@@ -215,7 +215,7 @@ TEST_F(CorrelationStepTest, ErrorsAndTheirCodes) {
   EXPECT_EQ(aNormalize({a, file("tall"), n, "0", "3", "3"}), 652807);
   EXPECT_EQ(aNormalize({a, file("wide"), n, "0", "3", "3"}), 652807);
   std::string aMessage;
-  EXPECT_EQ(raisedCode([&] { run(normalize_images, {a, file("x"), n, "0", "3", "3"}); }, &aMessage), 261122);
+  EXPECT_EQ(tlrxRaisedCode([&] { run(normalize_images, {a, file("x"), n, "0", "3", "3"}); }, &aMessage), 261122);
   EXPECT_EQ(aMessage, file("x_hdr"));
   // The coherence step checks the normalisation image too.
   EXPECT_EQ(aCorrelate({a, b, file("missing"), o, "0", "3", "3"}), 261122);
@@ -237,7 +237,7 @@ TEST_F(CorrelationStepTest, ErrorsAndTheirCodes) {
       {false, {a, b, n, o, "0", "3", "3 junk"}, 456961, "window columns: not an integer [3 junk]"},
   };
   for (const SBadToken &aBad : aBadTokens) {
-    EXPECT_EQ(raisedCode([&] { run(aBad.mNormalize ? normalize_images : quick_and_dirty, aBad.mArgs); }, &aMessage),
+    EXPECT_EQ(tlrxRaisedCode([&] { run(aBad.mNormalize ? normalize_images : quick_and_dirty, aBad.mArgs); }, &aMessage),
               aBad.mCode)
         << aBad.mMessage;
     EXPECT_EQ(aMessage, aBad.mMessage);

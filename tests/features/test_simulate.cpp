@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include "tlrx_description_xml.h"
+#include "tlrx_command_test_support.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
@@ -22,19 +23,9 @@ namespace {
 
 const double CTLRX_PI = 3.14159265358979323846;
 
-class SimulateTest : public ::testing::Test {
+class SimulateTest : public CommandTest {
 protected:
-  void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
-
-  // Runs the simulator and expects success.
-  void simulate(const std::vector<std::string> &theArgs) {
-    const STLRXRun aRun = tlrxRun("tlrx_simulate", theArgs, mDir.path());
-    ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput;
-  }
-  STLRXRun run(const std::vector<std::string> &theArgs) { return tlrxRun("tlrx_simulate", theArgs, mDir.path()); }
-  std::string file(const std::string &theName) const { return mDir.file(theName); }
-
-  CTempDir mDir;
+  STLRXRun run(const std::vector<std::string> &theArgs) const { return tlrxRun("tlrx_simulate", theArgs, mDir.path()); }
 };
 
 struct SStats {
@@ -589,16 +580,6 @@ TEST_F(SimulateTest, WriteFailuresAndMissingConfigurationExitWithOne) {
                               "/Tellurix_configuration.ini not found (set TELLURIX_INIT_DIR to the folder holding "
                               "Tellurix_configuration.ini)\n");
   EXPECT_FALSE(tlrxFileExists(file("c")));
-}
-
-TEST_F(SimulateTest, HelpListsCommandsOptionsAndExamples) {
-  const STLRXRun aRun = run({"--help"});
-  EXPECT_EQ(aRun.mExitStatus, 0);
-  for (const char *aText : {"tlrx_simulate series", "tlrx_simulate pair", "tlrx_simulate constant", "--coherence-ramp",
-                            "--nodata-fraction", "--image-spacing", "--utm ZONE{N|S}", "--phase-ramp", "Examples:",
-                            "ACQUISITION TIME"})
-    EXPECT_NE(aRun.mOutput.find(aText), std::string::npos) << aText;
-  EXPECT_EQ(run({"help"}).mOutput, aRun.mOutput);
 }
 
 } // namespace

@@ -1,6 +1,7 @@
 // The window machinery on plain buffers: row-window running sums, the ring
 // with its line schedule, and the per-line formulas, against direct sums.
 #include "tlrx_errors.h"
+#include "tlrx_command_test_support.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_reference.h"
 #include "tlrx_window_step.h"
@@ -230,14 +231,11 @@ TEST(WindowSize, LimitsAndCodesOfEachRule) {
       {CTLRX_EXACT_WINDOW_RULE, 5, 1, 456962},
   };
   for (const SCase &aCase : aCases) {
-    int32_t aCode = 0;
-    try {
-      fdfCheckWindowSize(aCase.mRows, aCase.mCols, aCase.mRule);
-    } catch (const CErrorExceptionManager &aError) {
-      aCode = aError.mCode;
-      EXPECT_STREQ(aError.mMessage, "");
-    }
-    EXPECT_EQ(aCode, aCase.mCode) << aCase.mRows << " x " << aCase.mCols;
+    std::string aMessage;
+    EXPECT_EQ(tlrxRaisedCode([&] { fdfCheckWindowSize(aCase.mRows, aCase.mCols, aCase.mRule); }, &aMessage),
+              aCase.mCode)
+        << aCase.mRows << " x " << aCase.mCols;
+    EXPECT_EQ(aMessage, "");
   }
 }
 

@@ -4,26 +4,18 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_command_test_support.h"
 #include "tlrx_test_support.h"
 #include "tlrx_window_reference.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <functional>
 #include <string>
 #include <vector>
 
-class WindowStepTest : public ::testing::Test {
+class WindowStepTest : public CommandTest {
 protected:
-  CTempDir mDir;
-  void SetUp() override {
-    tlrxStartLibraryEnvironment(mDir.path());
-    tlrxWriteFile(mDir.file("Process.working"), "0\nhost\n");
-  }
-
-  std::string file(const std::string &theName) const { return mDir.file(theName); }
-
   // Writes theImage with no-data pixels set to theNull (NaN-valued pixels stay
   // as they are, to test non-finite input).
   void write(const std::string &theName, const STestImage &theImage, const std::string &theUnits,
@@ -50,18 +42,6 @@ protected:
     aArgv.push_back(nullptr);
     return theStep(static_cast<int>(aStrings.size()), aArgv.data());
   }
-
-  // The code (and message) a step raises; 0 when it returns normally.
-  static int32_t raisedCode(const std::function<void()> &theBody, std::string *theMessage = nullptr) {
-    try {
-      theBody();
-    } catch (const CErrorExceptionManager &aError) {
-      if (theMessage != nullptr)
-        *theMessage = aError.mMessage;
-      return aError.mCode;
-    }
-    return 0;
-  }
 };
 
 // A constant image of theLines x thePixels.
@@ -85,16 +65,4 @@ inline void expectMatches(const std::vector<double> &theGot, const std::vector<d
     else
       EXPECT_NEAR(theGot[i], theWant[i], 2e-6 * std::max(1.0, std::fabs(theWant[i]))) << theWhat << " pixel " << i;
   }
-}
-
-// Mean of the pixels of lines and pixels theMargin away from every edge.
-inline double interiorMean(const std::vector<double> &theValues, int theLines, int thePixels, int theMargin) {
-  double aSum = 0;
-  long aCount = 0;
-  for (int l = theMargin; l < theLines - theMargin; ++l)
-    for (int j = theMargin; j < thePixels - theMargin; ++j) {
-      aSum += theValues[static_cast<size_t>(l) * thePixels + j];
-      ++aCount;
-    }
-  return aSum / aCount;
 }

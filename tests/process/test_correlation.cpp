@@ -3,11 +3,11 @@
 // switch, the result header and every failure with its exit status and code.
 #include "tlrx_description_xml.h"
 #include "tlrx_standard_header.h"
-#include "tlrx_window_command_support.h"
+#include "tlrx_command_test_support.h"
 
 namespace {
 
-class CorrelationCommandTest : public WindowCommandTest {
+class CorrelationCommandTest : public CommandTest {
 protected:
   // Tokens: input 1, input 2, root, dummy, normalisation rows and columns,
   // correlation rows and columns, closing switch, GeoTIFF switch, saturation.
@@ -104,14 +104,6 @@ TEST_F(CorrelationCommandTest, TiffSwitchOnMakesTheGeoTiffOfTheCoherence) {
   EXPECT_FALSE(tlrxFileExists(file("coh_norm.tif")));
 }
 
-TEST_F(CorrelationCommandTest, LowerCaseOkRunsOnlyTheComputingSteps) {
-  pair("p", "0.5", 20, "2");
-  ASSERT_EQ(correlation(tokens("p_1", "p_2", "NO", "ok"), true).mExitStatus, 0) << error();
-  EXPECT_FALSE(tlrxContains(trace(), "Step (2)"));
-  EXPECT_FALSE(tlrxFileExists(file("coh.tif")));
-  EXPECT_TRUE(tlrxContains(trace(), "INT TOTAL TIME (s): "));
-}
-
 TEST_F(CorrelationCommandTest, ClosingSwitchRemovesTheNormalisationImageOnlyWhenOk) {
   pair("p", "0.5", 20, "2");
   for (const char *aSwitch : {"ok", "NO"}) {
@@ -127,73 +119,6 @@ TEST_F(CorrelationCommandTest, ClosingSwitchRemovesTheNormalisationImageOnlyWhen
   EXPECT_FALSE(tlrxFileExists(file("coh_norm.hdr")));
   EXPECT_TRUE(tlrxFileExists(file("coh")));
   EXPECT_TRUE(tlrxContains(trace(), "\nSHUT"));
-}
-
-TEST_F(CorrelationCommandTest, TenTokensRunNothing) {
-  pair("p", "0.5", 20, "2");
-  std::vector<std::string> aTokens = tokens("p_1", "p_2");
-  aTokens.pop_back();
-  const STLRXRun aRun = correlation(aTokens, true);
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  expectError(456962);
-  EXPECT_FALSE(tlrxContains(trace(), "Step ("));
-  EXPECT_FALSE(tlrxFileExists(file("coh_norm")));
-}
-
-TEST_F(CorrelationCommandTest, WindowOutsideThreeToFiveHundred) {
-  pair("p", "0.5", 20, "2");
-  for (int aToken : {4, 5, 6, 7}) {
-    for (const char *aSize : {"2", "501"}) {
-      resetWorking();
-      std::vector<std::string> aTokens = tokens("p_1", "p_2");
-      aTokens[aToken] = aSize;
-      const STLRXRun aRun = correlation(aTokens);
-      EXPECT_EQ(aRun.mExitStatus, 8) << aToken << " = " << aSize;
-      expectError(456961);
-      EXPECT_FALSE(tlrxFileExists(file("coh")));
-    }
-  }
-}
-
-TEST_F(CorrelationCommandTest, SizeMismatchAndMissingHeader) {
-  pair("p", "0.5", 20, "2");
-  pair("q", "0.5", 21, "2");
-  STLRXRun aRun = correlation(tokens("p_1", "q_2"));
-  EXPECT_EQ(aRun.mExitStatus, 11);
-  expectError(652807);
-  EXPECT_FALSE(tlrxFileExists(file("coh_norm")));
-
-  tlrxWriteFile(file("bare"), std::string(1600, '\0'));
-  resetWorking();
-  aRun = correlation(tokens("p_1", "bare"));
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261122, "bare.sml");
-}
-
-TEST_F(CorrelationCommandTest, ShortData) {
-  pair("p", "0.5", 20, "2");
-  ASSERT_EQ(system(("cp '" + file("p_2.sml") + "' '" + file("s.sml") + "'").c_str()), 0);
-  tlrxWriteFile(file("s"), std::string(100, '\0')); // 20 x 20 floats need 1600 bytes
-  const STLRXRun aRun = correlation(tokens("p_1", "s"));
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261125);
-}
-
-TEST_F(CorrelationCommandTest, UnwritableResultHeader) {
-  pair("p", "0.5", 20, "2");
-  ASSERT_EQ(system(("mkdir '" + file("coh.sml") + "'").c_str()), 0); // the header cannot be written
-  const STLRXRun aRun = correlation(tokens("p_1", "p_2"));
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261123, "coh.sml");
-}
-
-TEST_F(CorrelationCommandTest, HostInterruptionStopsTheRun) {
-  pair("p", "0.5", 20, "2");
-  tlrxWriteFile(working(), "101\nhost\n");
-  const STLRXRun aRun = correlation(tokens("p_1", "p_2"));
-  EXPECT_EQ(aRun.mExitStatus, 6);
-  expectError(326400);
-  EXPECT_FALSE(tlrxFileExists(file("coh_norm")));
 }
 
 // Guards the complex-cell fault: complex cells already read as intensities

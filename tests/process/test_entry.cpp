@@ -1,5 +1,6 @@
 // The built program run as a host runs it: exit status, log, trace, working
 // file and error file.
+#include "tlrx_command_test_support.h"
 #include "tlrx_test_support.h"
 
 #include <gtest/gtest.h>
@@ -313,4 +314,36 @@ TEST_F(EntryTest, InstalledLayoutRunsWithItsOwnConfiguration) {
                                 {{"TELLURIX_INIT_DIR", ""}});
   EXPECT_EQ(aRun.mExitStatus, 8);
   EXPECT_TRUE(contains(log(), "[ERROR ID : 456963]"));
+}
+
+using CommandArgumentsTest = CommandTest;
+
+// Every command counts its tokens and its listed files before it plans a
+// step or writes a file.
+TEST_F(CommandArgumentsTest, TooFewTokensOrFilesRunNothing) {
+  image("a", {1, 2, 3, 4}, 2, "01-JAN-2007 00:00:00.000000");
+  list({"a"});
+  const std::string aList = file("list.txt"), aA = file("a");
+  const struct {
+    const char *mCase;
+    const char *mCommand;
+    std::vector<std::string> mTokens;
+    std::string mNamed, mAbsent;
+  } aCases[] = {
+      {"ratio, three tokens", "main_ratio#", {"list", "root", "0"}, "", "root_rto"},
+      {"ratio, one file", "main_ratio#", {aList, file("out"), "0", "x", "NO", "0.3"}, "list.txt", "out_rto"},
+      {"min and max, two tokens", "main_min_and_max#", {"list", "root"}, "list root", "root_min"},
+      {"min and max, one file", "main_min_and_max#", {aList, file("out"), "2", "3", "4", "5", "6", "NO", "0.3"},
+       "list.txt", "out_min"},
+      {"texture, seven tokens", "main_texture#", {aA, file("out.img"), "0", "5", "5", "x", "OK"}, "", "out.img"},
+      {"correlation, ten tokens", "main_correlation#", {aA, aA, file("coh"), "-5", "11", "11", "11", "11", "NO", "NO"},
+       "", "coh_norm"},
+  };
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCase);
+    resetWorking();
+    expectFailure(runCommand(aCase.mCommand, aCase.mTokens, true), 8, 456962, aCase.mNamed);
+    EXPECT_FALSE(tlrxContains(trace(), "Step ("));
+    EXPECT_FALSE(tlrxFileExists(file(aCase.mAbsent)));
+  }
 }

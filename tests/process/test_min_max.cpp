@@ -1,44 +1,21 @@
 // The min-and-max command run as a host runs it, against a direct
 // computation on small stacks with no-data pixels.
+#include "tlrx_command_test_support.h"
 #include "tlrx_standard_header.h"
-#include "tlrx_test_support.h"
-
-#include <gtest/gtest.h>
 
 namespace {
 
-class MinMaxTest : public ::testing::Test {
+class MinMaxTest : public CommandTest {
 protected:
-  CTempDir mDir;
-  void SetUp() override {
-    tlrxStartLibraryEnvironment(mDir.path());
-    tlrxWriteFile(working(), "0\nhost\n");
-  }
-  std::string working() const { return mDir.file("Process.working"); }
-  std::string error() const { return tlrxReadFile(working() + "_error"); }
-
   void image(const std::string &theName, const std::vector<double> &theValues, const std::string &theTime,
-             bool theHasNull = true, double theNull = -1, int theLines = 1) {
-    STLRXTestRaster aRaster;
-    aRaster.mLines = theLines;
-    aRaster.mPixels = static_cast<int>(theValues.size()) / theLines;
-    aRaster.mValues = theValues;
-    aRaster.mHasNull = theHasNull;
-    aRaster.mNull = theNull;
-    aRaster.mAcquisitionTime = theTime;
-    tlrxWriteTestRaster(mDir.file(theName), aRaster);
+             bool theHasNull = true, double theNull = -1, int theLines = 1) const {
+    CommandTest::image(theName, theValues, theLines, theTime, theHasNull, theNull);
   }
-
-  STLRXRun run(const std::vector<std::string> &theFiles, const std::string &theTiff = "NO") {
-    std::string aList;
-    for (const std::string &aFile : theFiles)
-      aList += mDir.file(aFile) + "\n";
-    tlrxWriteFile(mDir.file("list.txt"), aList);
-    tlrxWriteFile(mDir.file("args.txt"), "min max\n" + mDir.file("list.txt") + "\n" + mDir.file("out") +
-                                             "\n2\n3\n4\n5\n6\n" + theTiff + "\n0.3\n");
-    return tlrxRunMain("main_min_and_max#" + mDir.file("args.txt"), mDir.path());
+  STLRXRun run(const std::vector<std::string> &theFiles) const {
+    list(theFiles);
+    return runCommand("main_min_and_max#", {file("list.txt"), file("out"), "2", "3", "4", "5", "6", "NO", "0.3"});
   }
-  std::vector<double> result(const char *theSuffix) { return tlrxReadTestRaster(mDir.file(std::string("out") + theSuffix)); }
+  std::vector<double> result(const char *theSuffix) const { return CommandTest::result(std::string("out") + theSuffix); }
 };
 
 } // namespace
@@ -65,8 +42,8 @@ TEST_F(MinMaxTest, DateHeadersCarryClassNamesAndPaletteValueHeadersDoNot) {
   image("y2008", {1, 2}, "7-MAR-2008 10:00:00.000000");
   ASSERT_EQ(run({"y2009", "y2007", "y2008"}).mExitStatus, 0) << error();
   CDescription aDate, aValue;
-  fdfReadStandardHeader(mDir.file("out_max_date").c_str(), aDate);
-  fdfReadStandardHeader(mDir.file("out_min").c_str(), aValue);
+  fdfReadStandardHeader(file("out_max_date").c_str(), aDate);
+  fdfReadStandardHeader(file("out_min").c_str(), aValue);
   EXPECT_STREQ(aDate.getField("RasterInfo.DataUnits").getString(), "CLASSIFICATION");
   const CDescriptionField &aNames = aDate.getField("RasterInfo.ClassificationName");
   ASSERT_EQ(aNames.getNumberOfElements(), 4);
@@ -96,43 +73,21 @@ TEST_F(MinMaxTest, MissingNullCellValueMakesZeroNoData) {
   EXPECT_EQ(result("_min_date"), std::vector<double>({0, 1}));
 }
 
-TEST_F(MinMaxTest, ParameterErrorsCarryTheirMessages) {
-  tlrxWriteFile(mDir.file("args.txt"), "t\nlist\nroot\n");
-  STLRXRun aRun = tlrxRunMain("main_min_and_max#" + mDir.file("args.txt"), mDir.path());
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  EXPECT_NE(error().find("[EC :456962]"), std::string::npos);
-  EXPECT_NE(error().find("list root"), std::string::npos);
-  image("a", {1, 2}, "01-JAN-2007 00:00:00.000000");
-  tlrxWriteFile(working(), "0\nhost\n");
-  aRun = run({"a"});
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  EXPECT_NE(error().find("list.txt"), std::string::npos);
-}
-
 TEST_F(MinMaxTest, SizeMismatchesAreReportedWithTheInputName) {
   image("a", {1, 2, 3, 4}, "01-JAN-2007 00:00:00.000000", true, -1, 2);
   image("b", {1, 2, 3, 4}, "01-JAN-2008 00:00:00.000000", true, -1, 1);
-  STLRXRun aRun = run({"a", "b"});
-  EXPECT_EQ(aRun.mExitStatus, 11);
-  EXPECT_NE(error().find("[EC :652803]"), std::string::npos);
+  expectFailure(run({"a", "b"}), 11, 652803);
   image("c", {1, 2, 3, 4, 5, 6}, "01-JAN-2009 00:00:00.000000", true, -1, 2);
-  tlrxWriteFile(working(), "0\nhost\n");
-  aRun = run({"a", "c"});
-  EXPECT_EQ(aRun.mExitStatus, 11);
-  EXPECT_NE(error().find("[EC :652802]"), std::string::npos);
-  EXPECT_NE(error().find(mDir.file("c").substr(0, 40)), std::string::npos);
+  resetWorking();
+  expectFailure(run({"a", "c"}), 11, 652802, file("c").substr(0, 40));
 }
 
 TEST_F(MinMaxTest, MissingOrUnreadableDateIsADescriptionError) {
   image("a", {1, 2}, "01-JAN-2007 00:00:00.000000");
   image("b", {1, 2}, "");
-  STLRXRun aRun = run({"a", "b"});
-  EXPECT_EQ(aRun.mExitStatus, 14);
-  EXPECT_NE(error().find("[EC :848642]"), std::string::npos);
-  EXPECT_NE(error().find("ACQUISITION TIME"), std::string::npos);
-  EXPECT_NE(tlrxReadFile(mDir.file("Process.log")).find("Not found the field ACQUISITION TIME in " + mDir.file("b")),
-            std::string::npos);
+  expectFailure(run({"a", "b"}), 14, 848642, "ACQUISITION TIME");
+  EXPECT_TRUE(tlrxContains(log(), "Not found the field ACQUISITION TIME in " + file("b")));
   image("c", {1, 2}, "01-XYZ-2007 00:00:00.000000");
-  tlrxWriteFile(working(), "0\nhost\n");
+  resetWorking();
   EXPECT_EQ(run({"a", "c"}).mExitStatus, 14);
 }

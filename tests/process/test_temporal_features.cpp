@@ -1,10 +1,10 @@
 // The temporal feature extraction command run as a host runs it: every
 // feature against a direct computation on a seeded series with no data,
 // the output headers, the geocoded grid, and the failures with their codes.
+#include "tlrx_command_test_support.h"
 #include "tlrx_description_xml.h"
 #include "tlrx_temporal_test_support.h"
 
-#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <cmath>
@@ -119,27 +119,11 @@ SReference reference(const std::vector<double> &theSeries, const std::vector<dou
   return aRef;
 }
 
-class TemporalFeaturesTest : public ::testing::Test {
+class TemporalFeaturesTest : public CommandTest {
 protected:
-  CTempDir mDir;
-  void SetUp() override {
-    tlrxStartLibraryEnvironment(mDir.path());
-    tlrxWriteFile(working(), "0\nhost\n");
-  }
-  std::string working() const { return mDir.file("Process.working"); }
-  std::string error() const { return tlrxReadFile(working() + "_error"); }
-  std::string log() const { return tlrxReadFile(mDir.file("Process.log")); }
-
-  void image(const std::string &theName, int theLines, int thePixels, const std::vector<double> &theValues,
-             const std::string &theTime, bool theHasNull = true, double theNull = -1) {
-    STLRXTestRaster aRaster;
-    aRaster.mLines = theLines;
-    aRaster.mPixels = thePixels;
-    aRaster.mValues = theValues;
-    aRaster.mHasNull = theHasNull;
-    aRaster.mNull = theNull;
-    aRaster.mAcquisitionTime = theTime;
-    tlrxWriteTestRaster(mDir.file(theName), aRaster);
+  void image(const std::string &theName, int theLines, const std::vector<double> &theValues, const std::string &theTime,
+             bool theHasNull = true, double theNull = -1) const {
+    CommandTest::image(theName, theValues, theLines, theTime, theHasNull, theNull);
   }
 
   STLRXTemporalParameters parameters(const std::vector<std::string> &theInputs, bool theAll = true) {
@@ -155,13 +139,11 @@ protected:
 
   STLRXRun run(const STLRXTemporalParameters &theParameters, const std::string &theFile = "param.xml") {
     tlrxWriteFile(mDir.file(theFile), tlrxTemporalParameterText(theParameters));
-    tlrxWriteFile(working(), "0\nhost\n");
+    resetWorking();
     return tlrxRunMain("main_temporal_feature_extraction#" + mDir.file(theFile), mDir.path());
   }
 
-  std::vector<double> result(const char *theSuffix) {
-    return tlrxReadTestRaster(mDir.file(std::string("out") + theSuffix));
-  }
+  std::vector<double> result(const char *theSuffix) const { return CommandTest::result(std::string("out") + theSuffix); }
 
   // No result, temporary grid header or list file left beside the root.
   void expectNothingWritten() {
@@ -197,31 +179,6 @@ void expectNear(double theActual, double theExpected, const std::string &theWhat
 
 } // namespace
 
-TEST_F(TemporalFeaturesTest, SeriesFromTheExamplesGivesEveryFeature) {
-  // Pixel 0: 10 20 15 30 on days 0 12 24 36; pixel 1: no data everywhere;
-  // pixel 2: one sample (7, the others no data).
-  const std::vector<std::vector<double>> aValues = {{10, -1, -1}, {20, -1, 7}, {15, -1, -1}, {30, -1, -1}};
-  std::vector<std::string> aNames;
-  for (int i = 0; i < 4; ++i) {
-    aNames.push_back("d" + std::to_string(i));
-    image(aNames.back(), 1, 3, aValues[i], tlrxAcquisitionText(12 * i));
-  }
-  // Listed out of order; the first listed fixes the null value N = -1.
-  const STLRXRun aRun = run(parameters({"d2", "d0", "d3", "d1"}));
-  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
-  const double n = -1;
-  const std::vector<std::vector<double>> aExpected = {
-      {18.75, n, 7},   {std::sqrt(54.6875), n, n}, {15, n, 7}, {15, n, n}, {30, n, 7}, {10, n, 7}, {20, n, 0},
-      {15, n, n},      {-5, n, n},                {3, n, 1},  {2, n, n},  {0.75, n, n}, {36, -9999, 12},
-      {0, -9999, -9999}};
-  for (int f = 0; f < 14; ++f) {
-    const std::vector<double> aResult = result(sSuffixes[f]);
-    ASSERT_EQ(aResult.size(), 3u);
-    for (int x = 0; x < 3; ++x)
-      expectNear(aResult[x], aExpected[f][x], std::string(sSuffixes[f]) + " pixel " + std::to_string(x));
-  }
-}
-
 TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSeries) {
   // Six images of 7 x 9 pixels with speckle, zeros, negative values and no
   // data under three different null values; two acquisitions on one day.
@@ -238,7 +195,7 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
       v = aKind == 0 ? aNullOf[i] : aKind == 1 ? 0.0 : aKind == 2 ? -aSpeckle(aRandom) : 100 * aSpeckle(aRandom);
       v = static_cast<float>(v);
     }
-    image("s" + std::to_string(i), aLines, aPixels, aStack[i], tlrxAcquisitionText(aDayOf[i]),
+    image("s" + std::to_string(i), aLines, aStack[i], tlrxAcquisitionText(aDayOf[i]),
           !(i == 1 || i == 5), aNullOf[i]);
   }
   // Temporal order: s1 (day 0), s2, s3 (day 12, listed order), s0, s4, s5.
@@ -285,8 +242,8 @@ TEST_F(TemporalFeaturesTest, EveryFeatureMatchesADirectComputationOnASeededSerie
 }
 
 TEST_F(TemporalFeaturesTest, OutputHeadersCarryTheGridAndTheReferenceDate) {
-  image("late", 2, 3, {1, 2, 3, 4, 5, 6}, tlrxAcquisitionText(40), true, -5);
-  image("early", 3, 4, std::vector<double>(12, 2.0), tlrxAcquisitionText(5, 7), true, -1);
+  image("late", 2, {1, 2, 3, 4, 5, 6}, tlrxAcquisitionText(40), true, -5);
+  image("early", 3, std::vector<double>(12, 2.0), tlrxAcquisitionText(5, 7), true, -1);
   // The first listed input carries calibration and a scale factor of 2.
   CDescription aLate;
   fdfReadStandardHeader(mDir.file("late").c_str(), aLate);
@@ -332,7 +289,7 @@ TEST_F(TemporalFeaturesTest, OutputHeadersCarryTheGridAndTheReferenceDate) {
 }
 
 TEST_F(TemporalFeaturesTest, EveryParameterIsLoggedWithDefaultsApplied) {
-  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  image("a", 1, {1, 2}, tlrxAcquisitionText(0));
   STLRXTemporalParameters aParameters = parameters({"a"}, false);
   aParameters.mSettings = {{"interp_type", "Bilinear_interpolation"}, {"max_increment_thr_db", "0"},
                            {"max_decrement_thr_time", "2.5"}, {"normalize", "TRUE"}, {"out_db", "OK"},
@@ -357,7 +314,7 @@ TEST_F(TemporalFeaturesTest, EveryParameterIsLoggedWithDefaultsApplied) {
 }
 
 TEST_F(TemporalFeaturesTest, ParameterFileFailuresAreParameterErrors) {
-  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  image("a", 1, {1, 2}, tlrxAcquisitionText(0));
   struct SCase {
     const char *mWhat;
     STLRXTemporalParameters mParameters;
@@ -397,15 +354,15 @@ TEST_F(TemporalFeaturesTest, ParameterFileFailuresAreParameterErrors) {
 }
 
 TEST_F(TemporalFeaturesTest, BadInputsStopBeforeAnyResultAndLeaveNothingBehind) {
-  image("a", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(0));
-  image("b", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(12));
-  image("geo", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(24));
+  image("a", 2, {1, 2, 3, 4}, tlrxAcquisitionText(0));
+  image("b", 2, {1, 2, 3, 4}, tlrxAcquisitionText(12));
+  image("geo", 2, {1, 2, 3, 4}, tlrxAcquisitionText(24));
   tlrxGeocodeTestRaster(mDir.file("geo"), 5000, 300, -10, 10);
-  image("undated", 2, 2, {1, 2, 3, 4}, "");
-  image("baddate", 2, 2, {1, 2, 3, 4}, "31-FOO-2020 10:00:00.000000");
-  image("short", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
+  image("undated", 2, {1, 2, 3, 4}, "");
+  image("baddate", 2, {1, 2, 3, 4}, "31-FOO-2020 10:00:00.000000");
+  image("short", 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
   tlrxWriteFile(mDir.file("short"), "12345678");
-  image("nodata", 2, 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
+  image("nodata", 2, {1, 2, 3, 4}, tlrxAcquisitionText(30));
   std::remove(mDir.file("nodata").c_str());
   struct SCase {
     std::vector<std::string> mInputs;
@@ -433,7 +390,7 @@ TEST_F(TemporalFeaturesTest, BadInputsStopBeforeAnyResultAndLeaveNothingBehind) 
 }
 
 TEST_F(TemporalFeaturesTest, AnOutputThatCannotBeCreatedRemovesTheOnesBefore) {
-  image("a", 1, 2, {1, 2}, tlrxAcquisitionText(0));
+  image("a", 1, {1, 2}, tlrxAcquisitionText(0));
   ASSERT_EQ(mkdir(mDir.file("out_min").c_str(), 0755), 0);
   STLRXTemporalParameters aParameters = parameters({"a"}, false);
   aParameters.mSettings = {{"mean", "OK"}, {"max", "OK"}, {"min", "OK"}};
@@ -443,46 +400,6 @@ TEST_F(TemporalFeaturesTest, AnOutputThatCannotBeCreatedRemovesTheOnesBefore) {
   EXPECT_NE(log().find(mDir.file("out_min") + " \n"), std::string::npos);
   for (const char *aName : {"out_mea", "out_mea.sml", "out_max", "out_max.sml", "out.sml"})
     EXPECT_FALSE(tlrxFileExists(mDir.file(aName))) << aName;
-}
-
-TEST_F(TemporalFeaturesTest, GeocodedInputsMeetOnTheUnionGridAtTheFinestSpacing) {
-  // A: 3 x 4 cells of 10 m from (E 1000, N 5000); B: 2 x 3 cells of 20 m
-  // from (E 1020, N 4990). Union: E 1000..1080, N 5000..4950 at 10 m.
-  image("A", 3, 4, {1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12}, tlrxAcquisitionText(0), true, -1);
-  image("B", 2, 3, {100, 200, 300, 400, 500, 600}, tlrxAcquisitionText(12), true, -2);
-  tlrxGeocodeTestRaster(mDir.file("A"), 5000, 1000, -10, 10);
-  tlrxGeocodeTestRaster(mDir.file("B"), 4990, 1020, -20, 20);
-  STLRXTemporalParameters aParameters = parameters({"A", "B"}, false);
-  aParameters.mSettings = {{"min", "OK"}, {"max", "OK"}, {"interp_type", "bilinear_interpolation"}};
-  const STLRXRun aRun = run(aParameters);
-  ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
-  CDescription aHeader;
-  fdfReadStandardHeader(mDir.file("out_min").c_str(), aHeader);
-  EXPECT_EQ(aHeader.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 5);
-  EXPECT_EQ(aHeader.getField("RasterInfo.NrOfPixelsPerLine").getInteger(), 8);
-  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LonEasting").getDouble(), 1000);
-  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.LatNorthing").getDouble(), 5000);
-  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.PixelSpacingLonEast").getDouble(), 10);
-  EXPECT_EQ(aHeader.getField("RegistrationCoordinates.PixelSpacingLatNorth").getDouble(), -10);
-  // B on the grid: bilinear where its 2 x 2 cells exist (rows 2..3, columns
-  // 3..6: the ramp 100 + 300 u + 100 w), nearest neighbour on its rim;
-  // A lands cell for cell on rows 0..2, columns 0..3.
-  const double n = -1;
-  const std::vector<std::vector<double>> aB = {{n, n, n, n, n, n, n, n},
-                                               {n, n, 100, 100, 200, 200, 300, 300},
-                                               {n, n, 100, 200, 250, 300, 350, 300},
-                                               {n, n, 400, 350, 400, 450, 500, 600},
-                                               {n, n, 400, 400, 500, 500, 600, 600}};
-  const std::vector<double> aMin = result("_min");
-  const std::vector<double> aMax = result("_max");
-  ASSERT_EQ(aMin.size(), 40u);
-  for (int l = 0; l < 5; ++l)
-    for (int p = 0; p < 8; ++p) {
-      const double a = l < 3 && p < 4 ? 1 + 4 * l + p : n;
-      const double b = aB[l][p];
-      EXPECT_EQ(aMin[l * 8 + p], a != n ? a : b) << l << "," << p;
-      EXPECT_EQ(aMax[l * 8 + p], b != n ? b : a) << l << "," << p;
-    }
 }
 
 TEST_F(TemporalFeaturesTest, SimulatedSeriesMatchesTheDirectComputationWithRejections) {
@@ -594,8 +511,8 @@ TEST_F(TemporalFeaturesTest, GeoTiffCopiesOfValueAndDateOutputs) {
   std::vector<double> aRamp, aFlat(64, 3.0);
   for (int i = 0; i < 64; ++i)
     aRamp.push_back(1 + i);
-  image("a", 8, 8, aRamp, tlrxAcquisitionText(0));
-  image("b", 8, 8, aFlat, tlrxAcquisitionText(24));
+  image("a", 8, aRamp, tlrxAcquisitionText(0));
+  image("b", 8, aFlat, tlrxAcquisitionText(24));
   STLRXTemporalParameters aParameters = parameters({"a", "b"}, false);
   aParameters.mSettings = {{"mean", "OK"}, {"date_max", "OK"}, {"make_tiff", "OK"}, {"saturation_default", "0.5"}};
   const STLRXRun aRun = run(aParameters);
@@ -607,15 +524,4 @@ TEST_F(TemporalFeaturesTest, GeoTiffCopiesOfValueAndDateOutputs) {
   }
   EXPECT_TRUE(tlrxFileExists(mDir.file("out_mea.tif.sml")));
   EXPECT_FALSE(tlrxFileExists(mDir.file("out_std.tif")));
-}
-
-TEST_F(TemporalFeaturesTest, OperatorInterruptionStopsWithItsCodeAndNoResult) {
-  image("a", 4, 4, std::vector<double>(16, 2.0), tlrxAcquisitionText(0));
-  image("b", 4, 4, std::vector<double>(16, 3.0), tlrxAcquisitionText(12));
-  tlrxWriteFile(mDir.file("param.xml"), tlrxTemporalParameterText(parameters({"a", "b"})));
-  tlrxWriteFile(working(), "101\nhost\n");
-  const STLRXRun aRun = tlrxRunMain("main_temporal_feature_extraction#" + mDir.file("param.xml"), mDir.path());
-  EXPECT_EQ(aRun.mExitStatus, 6) << aRun.mOutput;
-  EXPECT_NE(error().find("[EC :326400]"), std::string::npos) << error();
-  expectNothingWritten();
 }

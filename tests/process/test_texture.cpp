@@ -1,12 +1,12 @@
 // The texture command run as a host runs it: plans and argument vectors,
 // simulated speckle, and every failure with its exit status and code.
-#include "tlrx_window_command_support.h"
+#include "tlrx_command_test_support.h"
 
 #include <cmath>
 
 namespace {
 
-class TextureCommandTest : public WindowCommandTest {
+class TextureCommandTest : public CommandTest {
 protected:
   // in, out, dummy, rows, cols, unused, GeoTIFF switch, saturation.
   STLRXRun texture(const std::string &theInput, const std::string &theRows, const std::string &theCols,
@@ -37,14 +37,6 @@ TEST_F(TextureCommandTest, SingleLookAmplitudeAndFourLookIntensitySpeckle) {
   EXPECT_FALSE(tlrxFileExists(working())); // a clean run removes it
 }
 
-TEST_F(TextureCommandTest, ConstantImageGivesZero) {
-  constant("c", "5");
-  ASSERT_EQ(texture("c", "5", "5").mExitStatus, 0) << error();
-  EXPECT_EQ(tlrxReadTestRaster(file("out.img")), std::vector<double>(80, 0.0));
-  EXPECT_TRUE(tlrxFileExists(file("out.img.sml")));
-  EXPECT_FALSE(tlrxFileExists(file("out.img.tif")));
-}
-
 TEST_F(TextureCommandTest, TiffSwitchPlansTheConversionWithItsArguments) {
   constant("in.img", "5");
   texture("in.img", "5", "5", "OK", true);
@@ -65,13 +57,6 @@ TEST_F(TextureCommandTest, TiffSwitchPlansTheConversionWithItsArguments) {
     EXPECT_TRUE(tlrxContains(aTiffPart, aArg + "\n")) << aArg;
 }
 
-TEST_F(TextureCommandTest, TiffSwitchOnMakesTheGeoTiff) {
-  constant("in.img", "5");
-  const STLRXRun aRun = texture("in.img", "5", "5", "OK");
-  EXPECT_EQ(aRun.mExitStatus, 0) << error();
-  EXPECT_TRUE(tlrxFileExists(file("out.img.tif")));
-}
-
 TEST_F(TextureCommandTest, LowerCaseOkOrNoRunsOnlyTheTexture) {
   constant("in.img", "5");
   for (const char *aSwitch : {"ok", "NO"}) {
@@ -83,56 +68,10 @@ TEST_F(TextureCommandTest, LowerCaseOkOrNoRunsOnlyTheTexture) {
   EXPECT_TRUE(tlrxContains(trace(), "TEXTURE TOTAL TIME (s): "));
 }
 
-TEST_F(TextureCommandTest, SevenTokensRunNothing) {
-  constant("in.img", "5");
-  const STLRXRun aRun = runCommand("main_texture#", {file("in.img"), file("out.img"), "0", "5", "5", "x", "OK"},
-                                   true);
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  expectError(456962);
-  EXPECT_FALSE(tlrxContains(trace(), "Step ("));
-  EXPECT_FALSE(tlrxFileExists(file("out.img")));
-}
-
-TEST_F(TextureCommandTest, WindowOutsideThreeToFiveHundred) {
-  constant("in.img", "5");
-  for (const auto &aSizes : std::vector<std::pair<std::string, std::string>>{{"2", "5"}, {"501", "5"}, {"5", "2"},
-                                                                              {"5", "501"}}) {
-    resetWorking();
-    const STLRXRun aRun = texture("in.img", aSizes.first, aSizes.second);
-    EXPECT_EQ(aRun.mExitStatus, 8) << aSizes.first << " x " << aSizes.second;
-    expectError(456961);
-    EXPECT_FALSE(tlrxFileExists(file("out.img")));
-  }
-}
-
-TEST_F(TextureCommandTest, MissingHeaderAndShortData) {
-  tlrxWriteFile(file("bare"), std::string(320, '\0'));
-  STLRXRun aRun = texture("bare", "3", "3");
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261122, "bare.sml");
-
-  constant("short", "5");
-  tlrxWriteFile(file("short"), std::string(100, '\0')); // 8 x 10 floats need 320 bytes
-  resetWorking();
-  aRun = texture("short", "3", "3");
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261125);
-}
-
 TEST_F(TextureCommandTest, UnwritableResultHeader) {
   constant("in.img", "5");
   ASSERT_EQ(system(("mkdir '" + file("out.img.sml") + "'").c_str()), 0); // the header cannot be written
-  const STLRXRun aRun = texture("in.img", "3", "3");
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  expectError(261123, "out.img.sml");
-}
-
-TEST_F(TextureCommandTest, HostInterruptionStopsTheRun) {
-  constant("in.img", "5", 300);
-  tlrxWriteFile(working(), "101\nhost\n");
-  const STLRXRun aRun = texture("in.img", "3", "3");
-  EXPECT_EQ(aRun.mExitStatus, 6);
-  expectError(326400);
+  expectFailure(texture("in.img", "3", "3"), 5, 261123, "out.img.sml");
 }
 
 // Guards the complex-cell fault: complex cells are read as re^2 + im^2, so an

@@ -1,14 +1,13 @@
-// Cell-type and data-unit vocabularies, sizes, complex records, BIT packing.
+// Cell-type and data-unit vocabularies, sizes, BIT packing.
 #include <gtest/gtest.h>
 
-#include <cstddef>
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "tlrx_cell_types.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_test_support.h"
+#include "tlrx_trace_test_support.h"
 
 namespace {
 
@@ -79,12 +78,9 @@ TEST(CellTypes, CodesOutsideTheTableHaveNoSizeAndAWrongName) {
 TEST(CellTypes, UnsupportedSizeIsTraced) {
   CTempDir aDir;
   tlrxStartLibraryEnvironment(aDir.path());
-  fdfSetEnvVar("ACTIVE", "TELLURIX_TRACING");
-  ASSERT_TRUE(fdfOpenTrace(false));
+  ASSERT_TRUE(tlrxStartTrace());
   EXPECT_EQ(fdfCellTypeSize(15, nullptr), -1);
-  fdfCloseTrace();
-  fdfSetEnvVar("NOT_ACTIVE", "TELLURIX_TRACING");
-  EXPECT_NE(tlrxReadFile(aDir.file("Process.trace")).find("Error: unsupported raster file type 15"),
+  EXPECT_NE(tlrxStopTrace(aDir.path()).find("Error: unsupported raster file type 15"),
             std::string::npos);
 }
 
@@ -105,24 +101,6 @@ TEST(DataUnits, UnknownNamesAndCodes) {
   EXPECT_EQ(fdfDataUnitsFromName(nullptr), CTLRX_UNITS_UNKNOWN);
   for (int32_t aCode : {-1, 39, 1000})
     EXPECT_STREQ(fdfDataUnitsName(aCode), "WRONG UNITS");
-}
-
-TEST(CellTypes, ComplexRecordsArePlainPairsRealFirst) {
-  EXPECT_EQ(offsetof(bcomplex, mIm), 1u);
-  EXPECT_EQ(offsetof(scomplex, mIm), 2u);
-  EXPECT_EQ(offsetof(uscomplex, mIm), 2u);
-  EXPECT_EQ(offsetof(fcomplex, mIm), 4u);
-  EXPECT_EQ(offsetof(dcomplex, mIm), 8u);
-  const float aParts[4] = {1.5f, -2.0f, 3.0f, 4.25f};
-  fcomplex aCells[2];
-  std::memcpy(aCells, aParts, sizeof(aParts));
-  EXPECT_EQ(aCells[1].mRe, 3.0f);
-  EXPECT_EQ(aCells[1].mIm, 4.25f);
-  const int16_t aShorts[2] = {-300, 12};
-  scomplex aShort;
-  std::memcpy(&aShort, aShorts, sizeof(aShort));
-  EXPECT_EQ(aShort.mRe, -300);
-  EXPECT_EQ(aShort.mIm, 12);
 }
 
 TEST(CellTypes, BitLinesPackEightPixelsMostSignificantFirst) {

@@ -9,6 +9,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_read_write_map_info.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_trace_test_support.h"
 
 #include <gtest/gtest.h>
 
@@ -34,15 +35,8 @@ protected:
     fdfSetEnviHeaderWriter(mPreviousWriter);
   }
 
-  void startTrace() {
-    fdfSetEnvVar("ACTIVE", "TELLURIX_TRACING");
-    ASSERT_TRUE(fdfOpenTrace(false));
-  }
-  std::string stopTrace() {
-    fdfCloseTrace();
-    fdfSetEnvVar("NOT_ACTIVE", "TELLURIX_TRACING");
-    return tlrxReadFile(mDir.file("Process.trace"));
-  }
+  void startTrace() { ASSERT_TRUE(tlrxStartTrace()); }
+  std::string stopTrace() { return tlrxStopTrace(mDir.path()); }
 
   // The ENVI text written for theHeader ("" when the writer skipped it).
   std::string enviText(const CDescription &theHeader, const char *theProfile = nullptr) {

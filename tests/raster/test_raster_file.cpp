@@ -20,6 +20,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
+#include "tlrx_trace_test_support.h"
 
 namespace {
 
@@ -182,16 +183,8 @@ protected:
     return aParam;
   }
 
-  // Starts the trace; traceText() stops it and returns what it holds.
-  void startTrace() {
-    fdfSetEnvVar("ACTIVE", "TELLURIX_TRACING");
-    ASSERT_TRUE(fdfOpenTrace(false));
-  }
-  std::string traceText() {
-    fdfCloseTrace();
-    fdfSetEnvVar("NOT_ACTIVE", "TELLURIX_TRACING");
-    return tlrxReadFile(mDir.file("Process.trace"));
-  }
+  void startTrace() { ASSERT_TRUE(tlrxStartTrace()); }
+  std::string traceText() { return tlrxStopTrace(mDir.path()); }
   void TearDown() override {
     if (fdfIsTracing())
       traceText();
@@ -788,18 +781,6 @@ TEST_F(RasterFileTest, ClosingPadsLinesNeverWrittenWithAWarning) {
   EXPECT_NE(aLog.find(aParam.mFileName), std::string::npos);
 }
 
-TEST_F(RasterFileTest, CompleteFilesCloseWithoutWarning) {
-  CRasterFileParam aParam = param("full.raw", CTLRX_CELL_DOUBLE, 3, 2);
-  const int32_t aWarnings = fdfGetWarningCount();
-  CRasterFile aFile;
-  aFile.open_write(aParam);
-  const double aCells[6] = {1, 2, 3, 4, 5, 6};
-  aFile.writeRecords(0, 3, aCells);
-  aFile.close();
-  EXPECT_EQ(fdfGetWarningCount(), aWarnings);
-  EXPECT_EQ(tlrxReadFile(aParam.mFileName), std::string(reinterpret_cast<const char *>(aCells), sizeof(aCells)));
-}
-
 TEST_F(RasterFileTest, DestructorClosesAnOpenFile) {
   CRasterFileParam aParam = param("dtor.raw", CTLRX_CELL_INT, 4, 2);
   {
@@ -1032,20 +1013,6 @@ TEST_F(RasterFileTest, LayoutRoundTripsThroughAHeaderFile) {
       const double aIm = aCells[2 * c + 1] * 4.0;
       EXPECT_DOUBLE_EQ(aLine[c], std::sqrt(aRe * aRe + aIm * aIm)) << aForm << " " << c;
     }
-  }
-}
-
-TEST_F(RasterFileTest, ByteOrderOfTheHeaderDecidesSwapping) {
-  for (const auto &aCase : std::vector<std::pair<int32_t, bool>>{{CTLRX_CELL_SHORT, true},
-                                                                 {CTLRX_CELL_BYTE, false},
-                                                                 {CTLRX_CELL_BYTE_COMPLEX, false},
-                                                                 {CTLRX_CELL_DOUBLE_COMPLEX, true}}) {
-    CRasterFileParam aParam = param("order.raw", aCase.first, 1, 1);
-    tlrxWriteFile(aParam.mFileName, std::string(16, '\0'));
-    aParam.mMSBF = !machineIsMSBF();
-    CRasterFile aFile;
-    aFile.open_read(aParam);
-    EXPECT_EQ(aFile.isSwapped(), aCase.second) << fdfCellTypeName(aCase.first);
   }
 }
 

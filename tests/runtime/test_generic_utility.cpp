@@ -4,6 +4,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_platform.h"
+#include "tlrx_description_test_support.h"
 #include "tlrx_test_support.h"
 #include "tlrx_time_man_utility.h"
 
@@ -22,17 +23,6 @@ protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
 };
-
-template <typename F> int32_t codeOf(F theCall, std::string *theMessage = nullptr) {
-  try {
-    theCall();
-  } catch (const CErrorExceptionManager &aError) {
-    if (theMessage != nullptr)
-      *theMessage = aError.mMessage;
-    return aError.mCode;
-  }
-  return 0;
-}
 
 } // namespace
 
@@ -123,10 +113,10 @@ TEST_F(UtilityTest, CopyFallsBackFromHdrToSml) {
 
 TEST_F(UtilityTest, FailedCopyRaises261123WithTheSystemText) {
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), false); }, &aMessage),
+  EXPECT_EQ(tlrxCodeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), false); }, &aMessage),
             261123);
   EXPECT_EQ(aMessage, "ERROR CODE 2 [No such file or directory];    " + mDir.file("none"));
-  EXPECT_EQ(codeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), true); }), 0);
+  EXPECT_EQ(tlrxCodeOf([&] { fdfCopyFile(mDir.file("none").c_str(), mDir.file("dest").c_str(), true); }), 0);
 }
 
 TEST_F(UtilityTest, LineListStopsAtCommentTrimsAndFindsTheWorkingFolder) {
@@ -138,7 +128,7 @@ TEST_F(UtilityTest, LineListStopsAtCommentTrimsAndFindsTheWorkingFolder) {
   aLines = fdfReadLineList("C:\\data\\list.txt", true);
   EXPECT_EQ(aLines.size(), 2u);
   std::string aMessage;
-  EXPECT_EQ(codeOf([] { fdfReadLineList("/no/such/missing.txt", true); }, &aMessage), 261122);
+  EXPECT_EQ(tlrxCodeOf([] { fdfReadLineList("/no/such/missing.txt", true); }, &aMessage), 261122);
   EXPECT_EQ(aMessage, "/no/such/missing.txt");
 }
 
@@ -157,7 +147,7 @@ TEST_F(UtilityTest, ArgumentFileDropsTheFirstLineAndCutsTheTrailer) {
   EXPECT_EQ(fdfReadArgumentFile(aArgument.c_str()), std::vector<std::string>({"/a/one.raw", "/a/two.raw"}));
   tlrxWriteFile(mDir.file("one.txt"), "only a title\n");
   std::string aMessage;
-  EXPECT_EQ(codeOf([&] { fdfReadArgumentFile(mDir.file("one.txt").c_str()); }, &aMessage), 261122);
+  EXPECT_EQ(tlrxCodeOf([&] { fdfReadArgumentFile(mDir.file("one.txt").c_str()); }, &aMessage), 261122);
   EXPECT_EQ(aMessage, mDir.file("one.txt"));
 }
 

@@ -3,6 +3,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_platform.h"
+#include "tlrx_description_test_support.h"
 #include "tlrx_test_support.h"
 
 #include <gtest/gtest.h>
@@ -41,17 +42,6 @@ protected:
     setenv("TELLURIX_INIT_DIR", tlrxConfigDir().c_str(), 1);
   }
 };
-
-int32_t codeOf(void (*theCall)(), std::string *theMessage = nullptr) {
-  try {
-    theCall();
-  } catch (const CErrorExceptionManager &aError) {
-    if (theMessage != nullptr)
-      *theMessage = aError.mMessage;
-    return aError.mCode;
-  }
-  return 0;
-}
 
 mode_t currentUmask() {
   const mode_t aMask = umask(0);
@@ -201,10 +191,10 @@ TEST_F(EnvironmentTest, ProgressRewritesValueAndKeepsOrReplacesTheText) {
 
 TEST_F(EnvironmentTest, HostValueAbove100InterruptsTheRun) {
   tlrxWriteFile(workingFile(), "101\nhost\n");
-  EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 0, nullptr); }), 326400);
+  EXPECT_EQ(tlrxCodeOf([] { getAndSetPerc(-1, 0, nullptr); }), 326400);
   EXPECT_EQ(tlrxReadFile(workingFile()), "101\nhost\n");
   tlrxWriteFile(workingFile(), "100\nhost\n");
-  EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 0, nullptr); }), 0);
+  EXPECT_EQ(tlrxCodeOf([] { getAndSetPerc(-1, 0, nullptr); }), 0);
 }
 
 TEST_F(EnvironmentTest, StartUpCreatesAMissingWorkingFileAndKeepsAPreparedOne) {
@@ -259,7 +249,7 @@ TEST_F(EnvironmentTest, UncreatableWorkingFileRaisesInterruption) {
     rmdir(aFolder.c_str());
     sSleeps.clear();
     std::string aMessage;
-    EXPECT_EQ(codeOf([] { getAndSetPerc(-1, 3, nullptr); }, &aMessage), 326400) << aExisted;
+    EXPECT_EQ(tlrxCodeOf([] { getAndSetPerc(-1, 3, nullptr); }, &aMessage), 326400) << aExisted;
     EXPECT_EQ(aMessage, aPath);
     EXPECT_EQ(sSleeps.size(), aExisted ? 20u : 0u) << aExisted;
   }
@@ -277,14 +267,14 @@ TEST_F(EnvironmentTest, SignalStopsTheRunAtItsNextProgressCheck) {
     // one that leaves the percentage as it is.
     EXPECT_EQ(tlrxReadFile(workingFile()), "6\nhost\n");
     std::string aMessage;
-    EXPECT_EQ(codeOf([] { getAndSetPerc(6, 6, nullptr); }, &aMessage), 326400);
+    EXPECT_EQ(tlrxCodeOf([] { getAndSetPerc(6, 6, nullptr); }, &aMessage), 326400);
     EXPECT_EQ(aMessage, aSignal.second);
-    EXPECT_EQ(codeOf([] { fdfCheckInterruption(); }), 326400);
+    EXPECT_EQ(tlrxCodeOf([] { fdfCheckInterruption(); }), 326400);
     EXPECT_EQ(tlrxReadFile(workingFile()), "6\nhost\n");
   }
   // A new start-up forgets an earlier request.
   tlrxStartLibraryEnvironment(mDir.path());
-  EXPECT_EQ(codeOf([] { getAndSetPerc(6, 7, nullptr); }), 0);
+  EXPECT_EQ(tlrxCodeOf([] { getAndSetPerc(6, 7, nullptr); }), 0);
 }
 
 TEST_F(EnvironmentTest, CleanEndRemovesTheWorkingFile) {
@@ -297,7 +287,7 @@ TEST_F(EnvironmentTest, WorkingFileThatCannotBeRemovedRaises261120AfterThirtyAtt
   std::remove(workingFile().c_str()); // the one start-up created
   ASSERT_EQ(mkdir(workingFile().c_str(), 0755), 0);
   tlrxWriteFile(workingFile() + "/keep", "x");
-  EXPECT_EQ(codeOf([] { fdfEndProcess(0, false, false); }), 261120);
+  EXPECT_EQ(tlrxCodeOf([] { fdfEndProcess(0, false, false); }), 261120);
   EXPECT_EQ(sSleeps.size(), 30u);
   EXPECT_EQ(sSleeps[9], 0);
   EXPECT_EQ(sSleeps[10], 1);
@@ -325,23 +315,6 @@ TEST(DatedCopies, NameTakesTheFirstFreeCounter) {
             aDir.file("Process_20260101093000_1_trace.txt"));
   tlrxWriteFile(aDir.file("Process20260101093000.trace"), "saved");
   EXPECT_EQ(fdfFreeDatedName(aDir.path(), "Process", aStamp, ".trace"), aDir.file("Process20260101093000_1.trace"));
-}
-
-TEST_F(EnvironmentTest, LogsMovedAsideInOneSecondAreAllKept) {
-  for (const char aFill : {'x', 'y', 'z'}) {
-    tlrxWriteFile(mDir.file("Process.log"), std::string(1000001, aFill));
-    fdfEndProcess(0, false, false);
-  }
-  const std::vector<std::string> aCopies = namesLike(mDir.path(), "Process_", "_log.txt");
-  ASSERT_EQ(aCopies.size(), 3u);
-  std::string aFills;
-  for (const std::string &aCopy : aCopies) {
-    const std::string aText = tlrxReadFile(mDir.file(aCopy));
-    ASSERT_EQ(aText.size(), 1000001u) << aCopy;
-    aFills += aText[0];
-  }
-  std::sort(aFills.begin(), aFills.end());
-  EXPECT_EQ(aFills, "xyz");
 }
 
 TEST_F(EnvironmentTest, TraceCopiesOfFailedRunsAreAllKept) {

@@ -114,19 +114,6 @@ TEST_F(ErrorsTest, OverlongCatalogueLinesAreCut) {
   EXPECT_EQ(std::strlen(aPrimary), 1025u);
 }
 
-TEST_F(ErrorsTest, InstalledCataloguesNameEveryRuntimeCode) {
-  for (int32_t aCode : {195840, 130561, 130562, 130563, 130564, 130565, 130566, 130567, 261120, 261121, 261122, 261123, 261124, 261125, 261126, 326400, 456960,
-                        456961, 456962, 456963, 652802, 652803, 652807, 652810, 652813, 783360, 848640, 848641,
-                        848642, 848643, 848644, 848645, 848646, 913920, 913921, 913922}) {
-    char aPrimary[CTLRX_MAX_LEN_ERROR_TEXT], aSecondary[CTLRX_MAX_LEN_ERROR_TEXT];
-    fdfLookupErrorTexts(fdfErrorCatalogue(), aCode, aPrimary, aSecondary);
-    EXPECT_STRNE(aPrimary, "GENERIC ERROR WRONG CODE") << aCode;
-    EXPECT_STRNE(aSecondary, "GENERIC ERROR WRONG CODE") << aCode;
-    if (fdfGetSEC(aCode) >= 0)
-      EXPECT_STRNE(aSecondary, "") << aCode;
-  }
-}
-
 TEST_F(ErrorsTest, ThrowModeCarriesCodeTextsPositionAndContext) {
   fdfSetProcessName("ratio\nstep");
   try {
