@@ -65,7 +65,6 @@ struct SBenchHeader {
   CDescription mDescription;
   std::string mFile;
   SBenchHeader() {
-    fdfSetReportAndExit(false);
     buildHeader(mDescription);
     mFile = "/tmp/tlrx_bench_header_" + std::to_string(getpid());
   }

@@ -26,7 +26,7 @@
 namespace {
 
 // Allocation counter: every operator new of the process passes here.
-long long theAllocations = 0;
+long long sAllocations = 0;
 
 constexpr int32_t CLines = 4096;
 constexpr int32_t CPixels = 4096;
@@ -107,11 +107,11 @@ void rasterRead(const CRasterFileParam &theParam, int32_t theCache, std::vector<
     aFile.setBuffer(theCache);
   theLine.resize(CPixels);
   aFile.getLine(theLine.data(), 0); // first access allocates the line buffer
-  const long long aBefore = theAllocations;
+  const long long aBefore = sAllocations;
   for (int32_t r = 0; r < CLines; ++r)
     aFile.getLine(theLine.data(), r);
   if (theAllocationsInLoop != nullptr)
-    *theAllocationsInLoop = theAllocations - aBefore;
+    *theAllocationsInLoop = sAllocations - aBefore;
   theSink += theLine[CPixels / 2];
   aFile.close();
 }
@@ -119,7 +119,7 @@ void rasterRead(const CRasterFileParam &theParam, int32_t theCache, std::vector<
 } // namespace
 
 void *operator new(size_t theSize) {
-  ++theAllocations;
+  ++sAllocations;
   if (void *aBlock = std::malloc(theSize == 0 ? 1 : theSize))
     return aBlock;
   throw std::bad_alloc();
@@ -128,7 +128,6 @@ void operator delete(void *theBlock) noexcept { std::free(theBlock); }
 void operator delete(void *theBlock, size_t) noexcept { std::free(theBlock); }
 
 int main(int argc, char **argv) {
-  fdfSetReportAndExit(false);
   const std::string aFolder = argc > 1 ? argv[1] : "/tmp";
   const int aRounds = argc > 2 ? std::max(1, std::atoi(argv[2])) : 15;
   const std::string aNative = aFolder + "/tlrx_bench_native.raw";
