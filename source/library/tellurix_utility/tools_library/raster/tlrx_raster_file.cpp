@@ -577,32 +577,21 @@ void CRasterFile::switchDirection(bool theWriting) {
 
 // ------------------------------------------------------------------ checks
 
-void CRasterFile::checkReadable(int32_t theRowNbr) const {
+// Reading needs a file open for reading, writing one open for writing; both
+// need at least one line.
+void CRasterFile::checkAccess(int32_t theRowNbr, bool theWriting) const {
   const char *aReason = nullptr;
   if (mRasterStatus == CTLRX_RF_CLOSE)
     aReason = "while it was not open\n";
-  else if (mRasterStatus == CTLRX_RF_OPEN_WRITE)
-    aReason = "while it was open in write mode\n";
+  else if (mRasterStatus == (theWriting ? CTLRX_RF_OPEN_READ : CTLRX_RF_OPEN_WRITE))
+    aReason = theWriting ? "while it was open in read mode\n" : "while it was open in write mode\n";
   else if (theRowNbr <= 0)
     aReason = "a negative or null number of lines\n";
   if (aReason == nullptr)
     return;
-  fdfTraceMessage("Error: attempting to read from the raster file %s %s", mFileName.c_str(), aReason);
-  TLRX_RAISE(CTLRX_ERR_FILE_READ, mFileName.c_str());
-}
-
-void CRasterFile::checkWritable(int32_t theRowNbr) const {
-  const char *aReason = nullptr;
-  if (mRasterStatus == CTLRX_RF_CLOSE)
-    aReason = "while it was not open\n";
-  else if (mRasterStatus == CTLRX_RF_OPEN_READ)
-    aReason = "while it was open in read mode\n";
-  else if (theRowNbr <= 0)
-    aReason = "a negative or null number of lines\n";
-  if (aReason == nullptr)
-    return;
-  fdfTraceMessage("Error: attempting to write to the raster file %s %s", mFileName.c_str(), aReason);
-  TLRX_RAISE(CTLRX_ERR_FILE_WRITE, mFileName.c_str());
+  fdfTraceMessage("Error: attempting to %s the raster file %s %s", theWriting ? "write to" : "read from",
+                  mFileName.c_str(), aReason);
+  TLRX_RAISE(theWriting ? CTLRX_ERR_FILE_WRITE : CTLRX_ERR_FILE_READ, mFileName.c_str());
 }
 
 // The block keeps its first line inside the image and never grows: the

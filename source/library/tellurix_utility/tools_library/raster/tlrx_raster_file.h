@@ -200,8 +200,9 @@ private:
   auto guarded(int theLine, F &&theBody) -> decltype(theBody());
   [[noreturn]] void raiseUnexpected(int theLine) const;
 
-  void checkReadable(int32_t theRowNbr) const;
-  void checkWritable(int32_t theRowNbr) const;
+  void checkAccess(int32_t theRowNbr, bool theWriting) const;
+  void checkReadable(int32_t theRowNbr) const { checkAccess(theRowNbr, false); }
+  void checkWritable(int32_t theRowNbr) const { checkAccess(theRowNbr, true); }
   void clampRows(int32_t &theRowStart, int32_t &theRowNbr, const char *theFormat) const;
   void clampColumns(int32_t &theColStart, int32_t &theColEnd) const;
   int64_t lineBytes(int32_t theColStart, int32_t theColEnd) const;
