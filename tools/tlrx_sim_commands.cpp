@@ -8,6 +8,7 @@
 #include "tlrx_sim_dates.h"
 #include "tlrx_sim_random.h"
 #include "tlrx_sim_scene.h"
+#include "tlrx_sim_slc.h"
 #include "tlrx_sim_writer.h"
 
 #include <algorithm>
@@ -255,6 +256,7 @@ void fdfSimRun(const SSimOptions &theOptions) {
   switch (theOptions.mCommand) {
   case CTLRX_SIM_SERIES: fdfSimWriteSeries(theOptions); break;
   case CTLRX_SIM_PAIR: fdfSimWritePair(theOptions); break;
+  case CTLRX_SIM_SLC: fdfSimWriteSlcPair(theOptions); break;
   default: fdfSimWriteConstant(theOptions); break;
   }
 }

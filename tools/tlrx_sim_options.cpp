@@ -146,17 +146,17 @@ struct SSimOptionSpec {
 
 const SSimOptionSpec sOptionTable[] = {
     {nullptr, nullptr, 0, "Output and layout", nullptr},
-    {"--out", "ROOT", CTLRX_SIM_ALL,
+    {"--out", "ROOT", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "raster name (constant) or root of the names: series ROOT_01 .. ROOT_NN, pair ROOT_1 and ROOT_2",
      [](SSimOptions &o, const std::string &, const std::string &v) { o.mOut = v; }},
-    {"--list", "FILE", CTLRX_SIM_ALL,
+    {"--list", "FILE", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "list file of the written image names, one per line (default ROOT_list.txt; constant: none)",
      [](SSimOptions &o, const std::string &, const std::string &v) { o.mList = v; }},
-    {"--lines", "N", CTLRX_SIM_ALL, "lines per image, 1..900000 (default 256)",
+    {"--lines", "N", CTLRX_SIM_ALL | CTLRX_SIM_SLC, "lines per image, 1..900000 (default 256)",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mLines = parseSize(n, v); }},
-    {"--pixels", "N", CTLRX_SIM_ALL, "pixels per line, 1..900000 (default 256)",
+    {"--pixels", "N", CTLRX_SIM_ALL | CTLRX_SIM_SLC, "pixels per line, 1..900000 (default 256)",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mPixels = parseSize(n, v); }},
-    {"--cell-type", "TYPE", CTLRX_SIM_ALL,
+    {"--cell-type", "TYPE", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "FLOAT (default), DOUBLE, BYTE, UNSIGNED_BYTE, SHORT, UNSIGNED_SHORT, INT, UNSIGNED_INT, "
      "FLOAT_COMPLEX, DOUBLE_COMPLEX, SHORT_COMPLEX, UNSIGNED_SHORT_COMPLEX, BYTE_COMPLEX, UBYTE_COMPLEX "
      "(complex types hold a complex field whose intensity follows the speckle model; unsigned complex "
@@ -176,7 +176,7 @@ const SSimOptionSpec sOptionTable[] = {
          failValue(n, "a data units name such as POWER or AMPLITUDE", v);
        o.mUnits = v;
      }},
-    {"--null", "VALUE", CTLRX_SIM_ALL,
+    {"--null", "VALUE", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "no-data value written as NullCellValue and into no-data pixels: a number or NaN (default 0); "
      "valid pixels never take it",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
@@ -184,21 +184,21 @@ const SSimOptionSpec sOptionTable[] = {
                                                           : parseReal(n, v, -CTLRX_SIM_HUGE, CTLRX_SIM_HUGE,
                                                                       "a finite number or NaN");
      }},
-    {"--scale-factor", "F", CTLRX_SIM_ALL,
+    {"--scale-factor", "F", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "cells store value / F and the header says RealScaleFactor (and ImaginaryScaleFactor) F, so readers get "
      "the value back; use it to fit integer cell types (default 1; values beyond the type are clipped)",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mScaleFactor = parsePositive(n, v); }},
-    {"--byte-order", "ORDER", CTLRX_SIM_ALL, "LSBF (default) or MSBF",
+    {"--byte-order", "ORDER", CTLRX_SIM_ALL | CTLRX_SIM_SLC, "LSBF (default) or MSBF",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        if (v != "LSBF" && v != "MSBF")
          failValue(n, "LSBF or MSBF", v);
        o.mMSBF = v == "MSBF";
      }},
-    {"--seed", "N", CTLRX_SIM_ALL, "seed of every random draw (default 1); the same seed gives the same files",
+    {"--seed", "N", CTLRX_SIM_ALL | CTLRX_SIM_SLC, "seed of every random draw (default 1); the same seed gives the same files",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mSeed = parseSeed(n, v); }},
 
     {nullptr, nullptr, 0, "Scene (mean reflectivity of every pixel)", nullptr},
-    {"--reflectivity", "R", CTLRX_SIM_SERIES | CTLRX_SIM_PAIR,
+    {"--reflectivity", "R", CTLRX_SIM_SERIES | CTLRX_SIM_PAIR | CTLRX_SIM_SLC,
      "mean intensity of the scene (default 1); the textured scene varies around it",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mReflectivity = parsePositive(n, v); }},
     {"--scene", "KIND", CTLRX_SIM_SERIES | CTLRX_SIM_PAIR,
@@ -254,14 +254,14 @@ const SSimOptionSpec sOptionTable[] = {
      }},
 
     {nullptr, nullptr, 0, "Acquisition dates (written as \"ACQUISITION TIME\" DD-MMM-YYYY hh:mm:ss.ffffff)", nullptr},
-    {"--start", "DATE", CTLRX_SIM_ALL,
+    {"--start", "DATE", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "date of the first image, YYYY-MM-DD[Thh:mm[:ss[.ffffff]]] (default 2020-01-01T10:00:00)",
      [](SSimOptions &o, const std::string &, const std::string &v) { o.mStart = v; }},
-    {"--interval", "DAYS", CTLRX_SIM_SERIES | CTLRX_SIM_PAIR, "days between images, >= 0, decimals allowed (default 12)",
+    {"--interval", "DAYS", CTLRX_SIM_SERIES | CTLRX_SIM_PAIR | CTLRX_SIM_SLC, "days between images, >= 0, decimals allowed (default 12)",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        o.mIntervalDays = parseReal(n, v, 0.0, 100000.0, "a number of days in 0..100000");
      }},
-    {"--dates", "D1,D2,...", CTLRX_SIM_ALL,
+    {"--dates", "D1,D2,...", CTLRX_SIM_ALL | CTLRX_SIM_SLC,
      "explicit dates, one per image in the order written (any order, repeats allowed)",
      [](SSimOptions &o, const std::string &, const std::string &v) { o.mDateTexts = splitList(v, ','); }},
 
@@ -328,7 +328,7 @@ const SSimOptionSpec sOptionTable[] = {
      }},
 
     {nullptr, nullptr, 0, "Correlated pair", nullptr},
-    {"--coherence", "G", CTLRX_SIM_PAIR, "coherence |gamma| of the two complex fields, 0..1 (default 0.8)",
+    {"--coherence", "G", CTLRX_SIM_PAIR | CTLRX_SIM_SLC, "coherence |gamma| of the two complex fields, 0..1 (default 0.8)",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        o.mCoherence0 = o.mCoherence1 = parseReal(n, v, 0.0, 1.0, "a number in 0..1");
      }},
@@ -341,13 +341,54 @@ const SSimOptionSpec sOptionTable[] = {
     {"--slc", nullptr, CTLRX_SIM_PAIR,
      "also write the complex pair ROOT_slc_1 and ROOT_slc_2 (FLOAT_COMPLEX, SLC; needs --looks 1)",
      [](SSimOptions &o, const std::string &, const std::string &) { o.mSlc = true; }},
-    {"--phase-ramp", "FL,FP", CTLRX_SIM_PAIR,
+    {"--phase-ramp", "FL,FP", CTLRX_SIM_PAIR | CTLRX_SIM_SLC,
      "interferometric phase of slc_1 x conj(slc_2): 2 pi (FL line + FP pixel), FL and FP in cycles per "
      "line and per pixel (default 0,0)",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        const std::vector<std::string> aItems = splitFields(n, v, 2, "FL,FP");
        o.mFringesPerLine = parseReal(n, aItems[0], -1e6, 1e6, "a number of cycles in -1e6..1e6");
        o.mFringesPerPixel = parseReal(n, aItems[1], -1e6, 1e6, "a number of cycles in -1e6..1e6");
+     }},
+
+    {nullptr, nullptr, 0, "Single-look complex pair (slc: ROOT_1 master, ROOT_2 slave)", nullptr},
+    {"--band-oversampling", "OSR[,OSR_AZ]", CTLRX_SIM_SLC,
+     "sampling rate / bandwidth of the circular Gaussian speckle in range and azimuth, 1..4 (default 1.2)",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       const std::vector<std::string> aItems = splitFields(n, v, 1, "OSR[,OSR_AZ]", true);
+       o.mBandOversampling[0] = parseReal(n, aItems[0], 1.0, 4.0, "a number in 1..4");
+       o.mBandOversampling[1] = aItems.size() == 2 ? parseReal(n, aItems[1], 1.0, 4.0, "a number in 1..4")
+                                                   : o.mBandOversampling[0];
+     }},
+    {"--coherence-box", "L0,P0,NL,NP,G", CTLRX_SIM_SLC, "coherence G inside a rectangle of the master (repeatable)",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       const std::vector<std::string> aItems = splitFields(n, v, 5, "L0,P0,NL,NP,G");
+       o.mCoherenceBoxes.emplace_back(parseBox(n, aItems), parseReal(n, aItems[4], 0.0, 1.0, "a number in 0..1"));
+     }},
+    {"--shift", "RG,AZ", CTLRX_SIM_SLC,
+     "constant shift of the slave (slave - master position) in pixels and lines, as a Fourier phase ramp",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       const std::vector<std::string> aItems = splitFields(n, v, 2, "RG,AZ");
+       for (size_t i = 0; i < 2; ++i)
+         o.mShift[i] = parseReal(n, aItems[i], -1e4, 1e4, "a number in -1e4..1e4");
+     }},
+    {"--shift-field", "R0,RX,RY,A0,AX,AY", CTLRX_SIM_SLC,
+     "affine shift of the slave: range R0 + RX x + RY y, azimuth A0 + AX x + AY y at master pixel x, line y "
+     "(0-based); the band-limited signal is evaluated at the moved positions column by column, then line by "
+     "line, by exact DFT sums (chirp-z)",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       const std::vector<std::string> aItems = splitFields(n, v, 6, "R0,RX,RY,A0,AX,AY");
+       for (size_t i = 0; i < 6; ++i)
+         o.mField[i] = parseReal(n, aItems[i], -1e4, 1e4, "a number in -1e4..1e4");
+       o.mFieldGiven = true;
+     }},
+    {"--topography", "RAD", CTLRX_SIM_SLC, "adds hills of peak phase RAD radians to the interferometric phase",
+     [](SSimOptions &o, const std::string &n, const std::string &v) { o.mTopography = parseAnyReal(n, v); }},
+    {"--doppler", "F1,F2", CTLRX_SIM_SLC,
+     "Doppler centroids of master and slave as fractions of the PRF, -0.5..0.5 (azimuth spectra centred there)",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       const std::vector<std::string> aItems = splitFields(n, v, 2, "F1,F2");
+       for (size_t i = 0; i < 2; ++i)
+         o.mDoppler[i] = parseReal(n, aItems[i], -0.5, 0.5, "a number in -0.5..0.5");
      }},
 
     {nullptr, nullptr, 0, "Constant image", nullptr},
@@ -365,7 +406,7 @@ struct SSimCommandName {
   int mCommand;
 };
 const SSimCommandName sCommands[] = {
-    {"series", CTLRX_SIM_SERIES}, {"pair", CTLRX_SIM_PAIR}, {"constant", CTLRX_SIM_CONSTANT}};
+    {"series", CTLRX_SIM_SERIES}, {"pair", CTLRX_SIM_PAIR}, {"constant", CTLRX_SIM_CONSTANT}, {"slc", CTLRX_SIM_SLC}};
 
 const char *commandName(int theCommand) {
   for (const SSimCommandName &aCommand : sCommands)
@@ -427,6 +468,17 @@ void checkUnits(SSimOptions &theOptions) {
   if (theOptions.mCommand == CTLRX_SIM_CONSTANT) {
     if (theOptions.mUnits.empty())
       theOptions.mUnits = aComplex ? "SLC" : "NUMBER";
+    return;
+  }
+  if (theOptions.mCommand == CTLRX_SIM_SLC) {
+    if (theOptions.mCellType == CTLRX_CELL_FLOAT)
+      theOptions.mCellType = CTLRX_CELL_FLOAT_COMPLEX;
+    if (theOptions.mCellType != CTLRX_CELL_FLOAT_COMPLEX && theOptions.mCellType != CTLRX_CELL_SHORT_COMPLEX)
+      throw CSimUsageError("slc writes FLOAT_COMPLEX or SHORT_COMPLEX images, not " +
+                           std::string(fdfCellTypeName(theOptions.mCellType)));
+    theOptions.mUnits = "SLC";
+    if (theOptions.mFieldGiven && (theOptions.mShift[0] != 0.0 || theOptions.mShift[1] != 0.0))
+      throw CSimUsageError("give either --shift or --shift-field, not both");
     return;
   }
   if (theOptions.mCommand == CTLRX_SIM_PAIR && aComplex)
@@ -583,7 +635,8 @@ bool fdfSimWantsHelp(const std::vector<std::string> &theArgs) {
 }
 
 const char *fdfSimUsageLine() {
-  return "usage: tlrx_simulate {series|pair|constant} --out ROOT [options]  (tlrx_simulate --help for the options)";
+  return "usage: tlrx_simulate {series|pair|constant|slc} --out ROOT [options]  (tlrx_simulate --help for the "
+         "options)";
 }
 
 SSimOptions fdfSimParseOptions(const std::vector<std::string> &theArgs) {
@@ -594,7 +647,7 @@ SSimOptions fdfSimParseOptions(const std::vector<std::string> &theArgs) {
     if (theArgs[0] == aCommand.mName)
       aOptions.mCommand = aCommand.mCommand;
   if (aOptions.mCommand == 0)
-    throw CSimUsageError("unknown command '" + theArgs[0] + "' (series, pair or constant)");
+    throw CSimUsageError("unknown command '" + theArgs[0] + "' (series, pair, constant or slc)");
   for (size_t i = 1; i < theArgs.size(); ++i) {
     std::string aName = theArgs[i];
     std::string aValue;
@@ -626,7 +679,8 @@ SSimOptions fdfSimParseOptions(const std::vector<std::string> &theArgs) {
 int32_t fdfSimImageCount(const SSimOptions &theOptions) {
   switch (theOptions.mCommand) {
   case CTLRX_SIM_SERIES: return theOptions.mCount;
-  case CTLRX_SIM_PAIR: return 2;
+  case CTLRX_SIM_PAIR:
+  case CTLRX_SIM_SLC: return 2;
   default: return 1;
   }
 }
@@ -673,7 +727,8 @@ std::string fdfSimImageName(const SSimOptions &theOptions, int32_t theImage) {
     std::snprintf(aSuffix, sizeof aSuffix, "_%0*d", aWidth, static_cast<int>(theImage));
     return theOptions.mOut + aSuffix;
   }
-  case CTLRX_SIM_PAIR: return theOptions.mOut + "_" + std::to_string(theImage);
+  case CTLRX_SIM_PAIR:
+  case CTLRX_SIM_SLC: return theOptions.mOut + "_" + std::to_string(theImage);
   default: return theOptions.mOut;
   }
 }
@@ -686,6 +741,7 @@ std::string fdfSimHelpText() {
       "  tlrx_simulate series   --out ROOT [options]   dated time series ROOT_01 .. ROOT_NN\n"
       "  tlrx_simulate pair     --out ROOT [options]   two images ROOT_1, ROOT_2 of known coherence\n"
       "  tlrx_simulate constant --out NAME --value V [options]   one constant image NAME\n"
+      "  tlrx_simulate slc      --out ROOT [options]   single-look complex pair ROOT_1 (master), ROOT_2 (slave)\n"
       "  tlrx_simulate --help\n\n"
       "Speckle model: at a pixel of reflectivity R an L-look intensity is R times a gamma variable of shape L\n"
       "and mean 1 (exponential for L = 1); AMPLITUDE images hold its square root; complex cells hold\n"
@@ -718,6 +774,9 @@ std::string fdfSimHelpText() {
       "      --image-origin 3:11.01,45.99 --image-spacing 3:0.0004 --image-size 3:128,128\n"
       "  # a pair whose coherence rises from 0.2 to 0.95 across the columns, with its SLC pair\n"
       "  tlrx_simulate pair --out p/pair --scene flat --coherence-ramp 0.2,0.95 --slc --phase-ramp 0,0.02\n"
+      "  # an SLC pair at coherence 0.8 whose slave is moved by an affine field, with a decorrelated box\n"
+      "  tlrx_simulate slc --out s/pair --lines 1024 --pixels 1024 --shift-field 0.3,4e-4,-2e-4,-0.7,2e-4,4e-4 \\\n"
+      "      --coherence-box 0,0,256,410,0 --cell-type SHORT_COMPLEX --reflectivity 10000\n"
       "  # a constant image of 4 with NaN as no-data value\n"
       "  tlrx_simulate constant --out c/four --value 4 --null NaN --nodata-box 0,0,2,2\n";
   return aText;

@@ -14,6 +14,7 @@
 constexpr int CTLRX_SIM_SERIES = 1;
 constexpr int CTLRX_SIM_PAIR = 2;
 constexpr int CTLRX_SIM_CONSTANT = 4;
+constexpr int CTLRX_SIM_SLC = 8;
 constexpr int CTLRX_SIM_ALL = CTLRX_SIM_SERIES | CTLRX_SIM_PAIR | CTLRX_SIM_CONSTANT;
 
 // Map kinds of the written images.
@@ -129,6 +130,16 @@ struct SSimOptions {
   bool mSlc = false;
   double mFringesPerLine = 0.0;
   double mFringesPerPixel = 0.0;
+  // single-look complex pair: band-limited speckle, the slave moved by a
+  // constant shift or an affine field (slave - master position, pixels and
+  // lines, of the master position x, y), fringes and Doppler centroids
+  double mBandOversampling[2] = {1.2, 1.2}; // range, azimuth: sampling rate / bandwidth
+  double mShift[2] = {0.0, 0.0};            // range, azimuth
+  bool mFieldGiven = false;
+  double mField[6] = {0, 0, 0, 0, 0, 0};    // R0, RX, RY, A0, AX, AY
+  double mTopography = 0.0;                 // peak phase of the hills, radians
+  double mDoppler[2] = {0.0, 0.0};          // centroid of master and slave, fraction of the PRF
+  std::vector<std::pair<SSimBox, double>> mCoherenceBoxes;
   // constant
   bool mValueGiven = false;
   double mValueRe = 0.0;

@@ -70,6 +70,8 @@ public:
   void putLine(int32_t theLine, const double *theRe, const double *theIm, const uint8_t *theValid);
   void finish();
   const SSimImageSpec &getSpec() const { return mSpec; }
+  // The header finish() writes; fields may be added before.
+  CDescription &getHeader() { return mHeader; }
   int64_t getClipped() const { return mEncoder.getClipped(); }
 
 private:

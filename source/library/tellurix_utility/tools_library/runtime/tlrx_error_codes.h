@@ -39,10 +39,10 @@
   X(CTLRX_ERR_SIZE_MISMATCH, 652807)        /* lines or pixels of the two images do not match */                 \
   X(CTLRX_ERR_COREG_WINDOW, 652808)         /* co-registration window outside the image */                       \
   X(CTLRX_ERR_COREG_POINTS, 652809)         /* too few valid co-registration points */                           \
-  X(CTLRX_ERR_COARSE_SHIFT, 652810)         /* coarse shift estimation failed */                                 \
-  X(CTLRX_ERR_COARSE_PEAK, 652811)          /* coarse shift estimation has no valid peak */                      \
-  X(CTLRX_ERR_FINE_SHIFT, 652812)           /* fine shift estimation failed */                                   \
-  X(CTLRX_ERR_FINE_PEAK, 652813)            /* fine shift estimation has no valid peak */                        \
+  X(CTLRX_ERR_COREG_INIT, 652810)           /* co-registration cannot be initialised (sizes, cell types, FFT) */ \
+  X(CTLRX_ERR_COREG_CENTRAL, 652811)        /* central window gives no initial shift */                          \
+  X(CTLRX_ERR_COREG_COARSE, 652812)         /* coarse (amplitude) shift estimation failed */                     \
+  X(CTLRX_ERR_COREG_FINE, 652813)           /* fine shift estimation failed */                                   \
   X(CTLRX_ERR_SETTING_MISSING, 783360)      /* start-up setting missing */                                       \
   X(CTLRX_ERR_DS_DECLARATION, 848640)       /* bad declaration, failed description copy */                       \
   X(CTLRX_ERR_DS_CHECK, 848641)             /* field without storage, mandatory field missing */                 \
