@@ -2,14 +2,8 @@
 // size after reduction, EPSG code, geotransform, colour table), listgeo
 // (GeoTIFF keys) and tiffinfo (strips), with no warning from any of them.
 #include <gtest/gtest.h>
-
-#include <array>
 #include <cmath>
-#include <cstdio>
 #include <regex>
-#include <string>
-#include <vector>
-
 #include "tlrx_enviroment.h"
 #include "tlrx_geotiff_test_support.h"
 #include "tlrx_platform.h"
@@ -17,8 +11,6 @@
 #include "tlrx_test_support.h"
 
 namespace {
-
-void noSleep(double) {}
 
 // Standard output and error of a shell command.
 std::string runTool(const std::string &theCommand) {
@@ -72,15 +64,28 @@ protected:
     if (!toolAvailable("gdalinfo") || !toolAvailable("listgeo") || !toolAvailable("tiffinfo"))
       GTEST_SKIP() << "gdalinfo, listgeo or tiffinfo not installed";
     tlrxStartLibraryEnvironment(mDir.path());
-    fdfSetSleepFunction(noSleep);
+    fdfSetSleepFunction([](double) {});
     tlrxWriteFile(fdfGetWorkingFilePath(), "0\n\n");
   }
   std::string file(const std::string &theName) const { return mDir.file(theName); }
-  void convert(const std::string &theIn, int32_t theRowRed, int32_t theColRed) {
-    ASSERT_EQ(tlrx_raster_to_geotiff(file(theIn).c_str(), file(theIn + ".tif").c_str(), 0.0, theRowRed, theColRed,
+  // theName converted to theName + ".tif"; what gdalinfo -json says of it,
+  // with no warning or error.
+  std::string quickLook(const std::string &theName, CDescription &theHeader, const void *theCells, int32_t theRowRed,
+                        int32_t theColRed) {
+    tlrxWriteGeoTiffRaster(file(theName), theHeader, theCells);
+    EXPECT_EQ(tlrx_raster_to_geotiff(file(theName).c_str(), file(theName + ".tif").c_str(), 0.0, theRowRed, theColRed,
                                      1.0, 1.0, false, false, false, false, 254, 1000000, nullptr, nullptr, -1, -1,
                                      -1, -1, false),
               0);
+    const std::string aJson = runTool("gdalinfo -json " + file(theName + ".tif"));
+    EXPECT_FALSE(contains(aJson, "Warning") || contains(aJson, "ERROR")) << aJson;
+    return aJson;
+  }
+  // The GeoTIFF keys listgeo lists, with no error or warning.
+  std::string keys(const std::string &theName) {
+    const std::string aKeys = runTool("listgeo " + file(theName + ".tif"));
+    EXPECT_FALSE(contains(aKeys, "rror") || contains(aKeys, "arning")) << aKeys;
+    return aKeys;
   }
 };
 
@@ -90,38 +95,27 @@ TEST_F(GeoTiffGdalTest, UtmSouthQuickLookReadsAsEpsg32732WithItsGeotransform) {
   CDescription aHeader;
   tlrxGeoTiffHeader(aHeader, 40, 60, "FLOAT", "AMPLITUDE");
   tlrxGeoTiffUtm(aHeader, 32, "SOUTH", 412000.0, 7601000.0, 20.0, -20.0);
-  tlrxWriteGeoTiffRaster(file("utm"), aHeader, pattern(40, 60).data());
-  convert("utm", 2, 3);
-
-  const std::string aJson = runTool("gdalinfo -json " + file("utm.tif"));
-  EXPECT_FALSE(contains(aJson, "Warning") || contains(aJson, "ERROR")) << aJson;
+  const std::string aJson = quickLook("utm", aHeader, pattern(40, 60).data(), 2, 3);
   EXPECT_EQ(jsonArray(aJson, "size"), (std::vector<double>{20, 20}));
-  EXPECT_TRUE(contains(aJson, "\"type\":\"Byte\"")) << aJson;
-  EXPECT_TRUE(contains(aJson, epsgInWkt(32732))) << aJson;
   EXPECT_EQ(jsonArray(aJson, "geoTransform"), (std::vector<double>{412000.0, 60.0, 0.0, 7601000.0, 0.0, -40.0}));
   EXPECT_FALSE(contains(aJson, "colorTable"));
-  EXPECT_TRUE(contains(aJson, "\"colorInterpretation\":\"Gray\"")) << aJson;
-
-  const std::string aKeys = runTool("listgeo " + file("utm.tif"));
-  EXPECT_TRUE(contains(aKeys, "ProjectedCSTypeGeoKey (Short,1): PCS_WGS84_UTM_zone_32S")) << aKeys;
-  EXPECT_TRUE(contains(aKeys, "GTRasterTypeGeoKey (Short,1): RasterPixelIsArea")) << aKeys;
-  EXPECT_TRUE(contains(aKeys, "GTCitationGeoKey (Ascii,19): \"UTM Zone 32S WGS84\"")) << aKeys;
-  EXPECT_FALSE(contains(aKeys, "rror") || contains(aKeys, "arning")) << aKeys;
-
+  for (const std::string &aPart : {std::string("\"type\":\"Byte\""), epsgInWkt(32732),
+                                   std::string("\"colorInterpretation\":\"Gray\"")})
+    EXPECT_TRUE(contains(aJson, aPart)) << aPart << " in " << aJson;
+  const std::string aKeys = keys("utm");
+  for (const char *aKey : {"ProjectedCSTypeGeoKey (Short,1): PCS_WGS84_UTM_zone_32S",
+                           "GTRasterTypeGeoKey (Short,1): RasterPixelIsArea",
+                           "GTCitationGeoKey (Ascii,19): \"UTM Zone 32S WGS84\""})
+    EXPECT_TRUE(contains(aKeys, aKey)) << aKey << " in " << aKeys;
   const std::string aInfo = runTool("tiffinfo " + file("utm.tif"));
-  EXPECT_TRUE(contains(aInfo, "Rows/Strip: 20")) << aInfo;
-  EXPECT_TRUE(contains(aInfo, "Bits/Sample: 8")) << aInfo;
+  EXPECT_TRUE(contains(aInfo, "Rows/Strip: 20") && contains(aInfo, "Bits/Sample: 8")) << aInfo;
 }
 
 TEST_F(GeoTiffGdalTest, GeographicQuickLookReadsAsEpsg4326) {
   CDescription aHeader;
   tlrxGeoTiffHeader(aHeader, 30, 50, "FLOAT", "COHERENCE");
   tlrxGeoTiffGeographic(aHeader, 7.25, 46.5, 0.0005, -0.00025);
-  tlrxWriteGeoTiffRaster(file("geo"), aHeader, pattern(30, 50).data());
-  convert("geo", 1, 1);
-
-  const std::string aJson = runTool("gdalinfo -json " + file("geo.tif"));
-  EXPECT_FALSE(contains(aJson, "Warning") || contains(aJson, "ERROR")) << aJson;
+  const std::string aJson = quickLook("geo", aHeader, pattern(30, 50).data(), 1, 1);
   EXPECT_EQ(jsonArray(aJson, "size"), (std::vector<double>{50, 30}));
   EXPECT_TRUE(contains(aJson, "\"wkt\":\"GEOGCRS[") && contains(aJson, epsgInWkt(4326))) << aJson;
   const std::vector<double> aTransform = jsonArray(aJson, "geoTransform");
@@ -129,11 +123,9 @@ TEST_F(GeoTiffGdalTest, GeographicQuickLookReadsAsEpsg4326) {
   const std::vector<double> aExpected = {7.25, 0.0005, 0.0, 46.5, 0.0, -0.00025};
   for (int i = 0; i < 6; ++i)
     EXPECT_NEAR(aTransform[i], aExpected[i], 1e-12) << i;
-
-  const std::string aKeys = runTool("listgeo " + file("geo.tif"));
+  const std::string aKeys = keys("geo");
   EXPECT_TRUE(contains(aKeys, "GeographicTypeGeoKey (Short,1): GCS_WGS_84")) << aKeys;
   EXPECT_TRUE(contains(aKeys, "GeogAngularUnitsGeoKey (Short,1): Angular_Degree")) << aKeys;
-  EXPECT_FALSE(contains(aKeys, "rror") || contains(aKeys, "arning")) << aKeys;
 }
 
 TEST_F(GeoTiffGdalTest, OnlyInterferogramsCarryAColourTable) {
@@ -145,17 +137,12 @@ TEST_F(GeoTiffGdalTest, OnlyInterferogramsCarryAColourTable) {
   }
   CDescription aHeader;
   tlrxGeoTiffHeader(aHeader, aRows, aCols, "FLOAT_COMPLEX", "INTERFEROGRAMME");
-  tlrxWriteGeoTiffRaster(file("ifg"), aHeader, aCells.data());
-  convert("ifg", 1, 1);
-  const std::string aJson = runTool("gdalinfo -json " + file("ifg.tif"));
-  EXPECT_TRUE(contains(aJson, "\"colorTable\"")) << aJson;
-  EXPECT_TRUE(contains(aJson, "\"colorInterpretation\":\"Palette\"")) << aJson;
-  EXPECT_TRUE(contains(aJson, "\"count\":256")) << aJson;
+  const std::string aJson = quickLook("ifg", aHeader, aCells.data(), 1, 1);
+  for (const char *aPart : {"\"colorTable\"", "\"colorInterpretation\":\"Palette\"", "\"count\":256"})
+    EXPECT_TRUE(contains(aJson, aPart)) << aPart << " in " << aJson;
   // Radar geometry: no georeferencing beyond the citation.
   EXPECT_FALSE(contains(aJson, "geoTransform")) << aJson;
-  EXPECT_FALSE(contains(aJson, "Warning") || contains(aJson, "ERROR")) << aJson;
-
-  tlrxWriteFloatRaster(file("coh"), aRows, aCols, pattern(aRows, aCols), "COHERENCE");
-  convert("coh", 1, 1);
-  EXPECT_FALSE(contains(runTool("gdalinfo -json " + file("coh.tif")), "colorTable"));
+  CDescription aCoherence;
+  tlrxGeoTiffHeader(aCoherence, aRows, aCols, "FLOAT", "COHERENCE");
+  EXPECT_FALSE(contains(quickLook("coh", aCoherence, pattern(aRows, aCols).data(), 1, 1), "colorTable"));
 }

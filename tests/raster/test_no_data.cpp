@@ -1,9 +1,6 @@
 // No-data rule: one table over the kinds of null value and of value.
 #include <gtest/gtest.h>
-
 #include <cmath>
-#include <limits>
-
 #include "tlrx_no_data.h"
 
 namespace {
@@ -12,15 +9,11 @@ constexpr double sNaN = std::numeric_limits<double>::quiet_NaN();
 constexpr double sInf = std::numeric_limits<double>::infinity();
 constexpr double sFltMin = 1.1754943508222875e-38; // smallest normal float
 
-struct SRuleCase {
+const struct SRuleCase {
   const char *mWhat;
-  double mNull;
-  double mValue;
-  bool mIsNull;    // isNull
-  bool mNullOrNaN; // isNullOrNaN
-};
-
-const SRuleCase sCases[] = {
+  double mNull, mValue;
+  bool mIsNull, mNullOrNaN; // isNull, isNullOrNaN
+} sCases[] = {
     {"numeric null", -9999.0, -9999.0, true, true},
     {"another value", -9999.0, -9998.9999, false, false},
     {"within the tolerance", 0.0, 1e-38, true, true},
@@ -40,19 +33,18 @@ const SRuleCase sCases[] = {
 
 TEST(NoDataRule, TableOfNullKinds) {
   for (const SRuleCase &aCase : sCases) {
+    SCOPED_TRACE(aCase.mWhat);
     const SNoData aRule(aCase.mNull);
-    EXPECT_EQ(aRule.isNull(aCase.mValue), aCase.mIsNull) << aCase.mWhat;
-    EXPECT_EQ(aRule.isNullOrNaN(aCase.mValue), aCase.mNullOrNaN) << aCase.mWhat;
+    EXPECT_EQ(aRule.isNull(aCase.mValue), aCase.mIsNull);
+    EXPECT_EQ(aRule.isNullOrNaN(aCase.mValue), aCase.mNullOrNaN);
     // A complex cell is no data when both parts are, never by one part.
-    EXPECT_EQ(aRule.isNullPair(aCase.mValue, aCase.mValue), aCase.mIsNull) << aCase.mWhat;
-    EXPECT_FALSE(aRule.isNullPair(aCase.mValue, 12345.0)) << aCase.mWhat;
-    EXPECT_FALSE(aRule.isNullPair(12345.0, aCase.mValue)) << aCase.mWhat;
+    EXPECT_EQ(aRule.isNullPair(aCase.mValue, aCase.mValue), aCase.mIsNull);
+    EXPECT_FALSE(aRule.isNullPair(aCase.mValue, 12345.0) || aRule.isNullPair(12345.0, aCase.mValue));
   }
 }
 
 TEST(NoDataRule, DefaultIsTheNullOfAHeaderWithoutOne) {
-  const SNoData aDefault;
-  const SNoData aZero(0.0);
+  const SNoData aDefault, aZero(0.0);
   EXPECT_EQ(aDefault.mNull, 0.0);
   EXPECT_EQ(aDefault.mLow, aZero.mLow);
   EXPECT_EQ(aDefault.mHigh, aZero.mHigh);

@@ -4,16 +4,12 @@
 // regression fails the test instead of hanging it.
 #include "tlrx_description_section.h"
 #include "tlrx_description_xml.h"
-#include "tlrx_errors.h"
+#include "tlrx_command_test_support.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
-
 #include <gtest/gtest.h>
-
-#include <csignal>
-#include <functional>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -40,16 +36,9 @@ SBoundedRun runBounded(const std::function<void()> &theBody) {
     alarm(CTLRX_TEST_SECONDS);
     const rlimit aLimit = {1 << 20, 1 << 20};
     setrlimit(RLIMIT_FSIZE, &aLimit);
-    std::string aReport = "0\n";
-    try {
-      theBody();
-    } catch (const CErrorExceptionManager &aError) {
-      aReport = std::to_string(aError.mCode) + "\n" + aError.mMessage;
-    } catch (...) {
-      aReport = "-1\n";
-    }
-    const ssize_t aWritten = write(aPipe[1], aReport.data(), aReport.size());
-    _exit(aWritten == static_cast<ssize_t>(aReport.size()) ? 0 : 1);
+    std::string aMessage;
+    const std::string aReport = std::to_string(tlrxRaisedCode(theBody, &aMessage)) + "\n" + aMessage;
+    _exit(write(aPipe[1], aReport.data(), aReport.size()) == static_cast<ssize_t>(aReport.size()) ? 0 : 1);
   }
   close(aPipe[1]);
   std::string aReport;
@@ -60,11 +49,10 @@ SBoundedRun runBounded(const std::function<void()> &theBody) {
   int aStatus = 0;
   waitpid(aChild, &aStatus, 0);
   SBoundedRun aRun;
-  aRun.mEnded = WIFEXITED(aStatus) && WEXITSTATUS(aStatus) == 0;
-  const size_t aLineEnd = aReport.find('\n');
-  if (aRun.mEnded && aLineEnd != std::string::npos) {
-    aRun.mCode = std::stoi(aReport.substr(0, aLineEnd));
-    aRun.mMessage = aReport.substr(aLineEnd + 1);
+  aRun.mEnded = WIFEXITED(aStatus) && WEXITSTATUS(aStatus) == 0 && aReport.find('\n') != std::string::npos;
+  if (aRun.mEnded) {
+    aRun.mCode = std::stoi(aReport.substr(0, aReport.find('\n')));
+    aRun.mMessage = aReport.substr(aReport.find('\n') + 1);
   }
   return aRun;
 }
@@ -73,14 +61,10 @@ class SpecialFilesTest : public ::testing::Test {
 protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
-  std::string fifo(const std::string &theName) {
+  // theName as a FIFO, or as a link to /dev/zero.
+  std::string special(const std::string &theName, bool theFifo) {
     const std::string aPath = mDir.file(theName);
-    EXPECT_EQ(mkfifo(aPath.c_str(), 0644), 0);
-    return aPath;
-  }
-  std::string zero(const std::string &theName) {
-    const std::string aPath = mDir.file(theName);
-    EXPECT_EQ(symlink("/dev/zero", aPath.c_str()), 0);
+    EXPECT_EQ(theFifo ? mkfifo(aPath.c_str(), 0644) : symlink("/dev/zero", aPath.c_str()), 0);
     return aPath;
   }
 };
@@ -92,10 +76,13 @@ TEST_F(SpecialFilesTest, EveryReaderRefusesFifosAndDevicesWithItsOwnError) {
   aRaster.mValues.assign(static_cast<size_t>(aRaster.mLines * aRaster.mPixels), 1.0);
   tlrxWriteTestRaster(mDir.file("data"), aRaster);
   std::remove(mDir.file("data").c_str());
-  const std::string aData = zero("data");
-  const std::string aFifoHeader = fifo("f.sml"), aZeroHeader = zero("z.sml"), aTextHeader = fifo("t_hdr");
-  const std::string aList = fifo("list.txt"), aArguments = zero("args.txt"), aParameters = fifo("par.xml");
-  const std::string aKeys = fifo("Sec.key");
+  const std::string aData = special("data", false), aFifoHeader = special("f.sml", true);
+  const std::string aZeroHeader = special("z.sml", false), aTextHeader = special("t_hdr", true);
+  const std::string aList = special("list.txt", true), aArguments = special("args.txt", false);
+  const std::string aParameters = special("par.xml", true), aKeys = special("Sec.key", true);
+  const auto aHeader = [&](const char *theName) {
+    return [this, theName] { CDescription aRead; fdfReadStandardHeader(mDir.file(theName).c_str(), aRead); };
+  };
   const std::string aNotRegular = " is not a regular file";
   struct SCase {
     const char *mWhat;
@@ -103,32 +90,25 @@ TEST_F(SpecialFilesTest, EveryReaderRefusesFifosAndDevicesWithItsOwnError) {
     int32_t mCode;
     std::string mMessage;
   } const aCases[] = {
-      {"XML header FIFO", [&] { CDescription aHeader; fdfReadStandardHeader(mDir.file("f").c_str(), aHeader); },
-       261122, aFifoHeader + aNotRegular},
-      {"XML header on /dev/zero",
-       [&] { CDescription aHeader; fdfReadStandardHeader(mDir.file("z").c_str(), aHeader); }, 261122,
-       aZeroHeader + aNotRegular},
-      {"text header FIFO", [&] { CDescription aHeader; fdfReadStandardHeader(mDir.file("t").c_str(), aHeader); },
-       261122, aTextHeader + aNotRegular},
+      {"XML header FIFO", aHeader("f"), 261122, aFifoHeader + aNotRegular},
+      {"XML header on /dev/zero", aHeader("z"), 261122, aZeroHeader + aNotRegular},
+      {"text header FIFO", aHeader("t"), 261122, aTextHeader + aNotRegular},
       {"data file on /dev/zero", [&] { CRasterFile aFile; aFile.open_read(aData.c_str()); }, 261122,
        aData + aNotRegular},
       {"list file FIFO", [&] { fdfReadNameList(aList.c_str()); }, 261122, aList + aNotRegular},
       {"argument file on /dev/zero", [&] { fdfReadArgumentFile(aArguments.c_str()); }, 261122,
        aArguments + aNotRegular},
       {"parameter file FIFO",
-       [&] {
-         CDescription aDescription;
-         fdfDeclareStandardHeader(aDescription);
-         aDescription.readXML(aParameters.c_str(), true);
-       },
+       [&] { CDescription aRead; fdfDeclareStandardHeader(aRead); aRead.readXML(aParameters.c_str(), true); },
        261121, aParameters},
       {"key file FIFO", [&] { CDescriptionSection aSection; aSection.declareFromKeyFile(aKeys.c_str(), "Sec"); },
        261122, aKeys},
   };
   for (const SCase &aCase : aCases) {
+    SCOPED_TRACE(aCase.mWhat);
     const SBoundedRun aRun = runBounded(aCase.mRead);
-    EXPECT_TRUE(aRun.mEnded) << aCase.mWhat << ": did not end within " << CTLRX_TEST_SECONDS << " s";
-    EXPECT_EQ(aRun.mCode, aCase.mCode) << aCase.mWhat;
-    EXPECT_EQ(aRun.mMessage, aCase.mMessage) << aCase.mWhat;
+    EXPECT_TRUE(aRun.mEnded) << "did not end within " << CTLRX_TEST_SECONDS << " s";
+    EXPECT_EQ(aRun.mCode, aCase.mCode);
+    EXPECT_EQ(aRun.mMessage, aCase.mMessage);
   }
 }

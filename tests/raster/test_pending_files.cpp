@@ -5,8 +5,16 @@
 #include "tlrx_pending_files.h"
 #include "tlrx_platform.h"
 #include "tlrx_test_support.h"
-
 #include <gtest/gtest.h>
+
+namespace {
+
+void write(const std::vector<std::string> &theNames) {
+  for (const std::string &aName : theNames)
+    tlrxWriteFile(aName, "x");
+}
+
+} // namespace
 
 TEST(PendingFiles, FailuresRemoveRegisteredFilesAndCompletedOnesStay) {
   CTempDir aDir;
@@ -15,66 +23,43 @@ TEST(PendingFiles, FailuresRemoveRegisteredFilesAndCompletedOnesStay) {
   tlrxWriteFile(aDir.file("Process.working"), "0\nhost\n");
   const TLRXSleepFunction aOldSleep = fdfSetSleepFunction([](double) {});
   const std::string aRaster = aDir.file("r"), aOther = aDir.file("x.txt");
-  auto aWrite = [&] {
-    for (const std::string &aName : {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther})
-      tlrxWriteFile(aName, "x");
-  };
-  // An error leaving the guard's scope removes them.
-  aWrite();
+  const std::string aFirst = aDir.file("first"), aSecond = aDir.file("second"), aTiff = aDir.file("first.tif");
+  const std::vector<std::string> aAll = {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther, aFirst, aSecond, aTiff};
+  write(aAll);
   try {
     CPendingFiles aGuard;
     aGuard.addRaster(aRaster);
     aGuard.addFile(aOther);
-    TLRX_RAISE(261124, "test");
-  } catch (const CErrorExceptionManager &) {
-  }
-  for (const std::string &aName : {aRaster, aRaster + ".sml", aRaster + ".hdr", aOther})
-    EXPECT_FALSE(tlrxFileExists(aName)) << aName;
-  // Normal end and forgotten files: kept.
-  aWrite();
-  {
-    CPendingFiles aGuard;
-    aGuard.addRaster(aRaster);
-    aGuard.forgetRaster(aRaster);
-  }
-  EXPECT_TRUE(tlrxFileExists(aRaster));
-  fdfSetSleepFunction(aOldSleep);
-}
-
-TEST(PendingFiles, ResultsHandedToTheRunGoWhenTheRunFailsLater) {
-  CTempDir aDir;
-  tlrxStartLibraryEnvironment(aDir.path());
-  tlrxWriteFile(aDir.file("Process.working"), "0\nhost\n");
-  const TLRXSleepFunction aOldSleep = fdfSetSleepFunction([](double) {});
-  const std::string aFirst = aDir.file("first"), aSecond = aDir.file("second"), aTiff = aDir.file("first.tif");
-  for (const std::string &aName : {aFirst, aSecond, aTiff})
-    tlrxWriteFile(aName, "x");
-  try {
-    CPendingFiles aRun;
     {
       // Two results in progress at once, completed in the order they began;
       // the second's guard is nested in the first's, yet both reach the run.
-      CPendingFiles aFirstResult;
-      CPendingFiles aSecondResult;
+      CPendingFiles aFirstResult, aSecondResult;
       aFirstResult.addFile(aFirst);
       aSecondResult.addFile(aSecond);
       aFirstResult.handOver();
       aSecondResult.handOver();
     }
     fdfAddPendingFile(aTiff); // registered from below, e.g. by the GeoTIFF writer
-    TLRX_RAISE(130564, "test");
+    TLRX_RAISE(261124, "test");
   } catch (const CErrorExceptionManager &) {
   }
-  for (const std::string &aName : {aFirst, aSecond, aTiff})
+  for (const std::string &aName : aAll)
     EXPECT_FALSE(tlrxFileExists(aName)) << aName;
-  // Without a guard nothing is registered, so nothing is removed later.
-  tlrxWriteFile(aTiff, "x");
+  // Normal end and forgotten files: kept; without a guard nothing is
+  // registered, so nothing is removed later.
+  write({aRaster, aTiff});
+  {
+    CPendingFiles aGuard;
+    aGuard.addRaster(aRaster);
+    aGuard.forgetRaster(aRaster);
+  }
   fdfAddPendingFile(aTiff);
   try {
     CPendingFiles aRun;
     TLRX_RAISE(130564, "test");
   } catch (const CErrorExceptionManager &) {
   }
+  EXPECT_TRUE(tlrxFileExists(aRaster));
   EXPECT_TRUE(tlrxFileExists(aTiff));
   fdfSetSleepFunction(aOldSleep);
 }
