@@ -395,6 +395,9 @@ TEST_F(RasterFileTest, ReadCacheRefillsWhenTheColumnsChange) {
   aFile.getLine(aLine.data(), 2, 0, 8); // another window on a cached line
   for (int c = 0; c < 9; ++c)
     EXPECT_EQ(aLine[c], expectedValue(aShorts[2][c], 7.0)) << c;
+  aFile.getLine(aLine.data(), 2, 3, 8); // the first column alone moves
+  for (int c = 0; c < 6; ++c)
+    EXPECT_EQ(aLine[c], expectedValue(aShorts[2][c + 3], 7.0)) << c;
 }
 
 TEST_F(RasterFileTest, IntegerExtremesAndNoDataTolerance) {
