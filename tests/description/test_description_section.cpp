@@ -1,20 +1,13 @@
 // Description model: typed access and its check order, holding a value,
 // structs, assignment and copies, dotted keys, dumps, key files, mandatory
-// files and the scratch-buffer pool.
-#include "tlrx_description_section.h"
-#include "tlrx_enviroment.h"
-#include "tlrx_errors.h"
-#include "tlrx_standard_header.h"
+// files, the scratch-buffer pool and the typed reads of header numbers.
 #include "tlrx_description_test_support.h"
-#include "tlrx_test_support.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_header_numbers.h"
+#include "tlrx_standard_header.h"
 
-#include <gtest/gtest.h>
-
-#include <climits>
-#include <cstring>
-#include <memory>
-#include <string>
-#include <vector>
+#include <functional>
+#include <limits>
 
 namespace {
 
@@ -22,27 +15,55 @@ class DescriptionTest : public ::testing::Test {
 protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
-
+  std::string keyPath() const { return mDir.file("test.key"); }
   // Section declared from a key file written for the test.
   std::unique_ptr<CDescriptionSection> declare(const std::string &theText, const char *theName = "Sec") {
-    tlrxWriteFile(mDir.file("test.key"), theText);
+    tlrxWriteFile(keyPath(), theText);
     auto aSection = std::make_unique<CDescriptionSection>();
-    EXPECT_TRUE(aSection->declareFromKeyFile(mDir.file("test.key").c_str(), theName));
+    EXPECT_TRUE(aSection->declareFromKeyFile(keyPath().c_str(), theName));
     return aSection;
   }
-  std::string keyPath() const { return mDir.file("test.key"); }
+  // Code and message of declaring theName from theText.
+  int32_t declareCode(const std::string &theText, std::string *theMessage = nullptr, const char *theName = "Sec") {
+    tlrxWriteFile(keyPath(), theText);
+    CDescriptionSection aSection;
+    return tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), theName); }, theMessage);
+  }
 };
+
+using TLRXField = CDescriptionField;
+
+enum class EAccessor { kInteger, kIntegerOr, kSize, kReal, kRealOr, kFinite, kNull };
+
+struct SNumberCase {
+  const char *mKey;
+  const char *mText; // stored as the field's type reads it; nullptr leaves it unset
+  EAccessor mAccessor;
+  double mValue;
+  const char *mError; // message of 848642, nullptr when the value is read
+};
+
+const double sNaN = std::nan("");
+
+double read(const CDescription &theHeader, const SNumberCase &theCase, const SHeaderReader &theReader = {}) {
+  switch (theCase.mAccessor) {
+  case EAccessor::kInteger: return fdfHeaderInteger(theHeader, theCase.mKey, theReader);
+  case EAccessor::kIntegerOr: return fdfHeaderIntegerOr(theHeader, theCase.mKey, -1, theReader);
+  case EAccessor::kSize: return fdfHeaderSize(theHeader, theCase.mKey, 900000, theReader);
+  case EAccessor::kReal: return fdfHeaderReal(theHeader, theCase.mKey, theReader);
+  case EAccessor::kRealOr: return fdfHeaderRealOr(theHeader, theCase.mKey, -1.0, theReader);
+  case EAccessor::kFinite: return fdfHeaderFiniteReal(theHeader, theCase.mKey, theReader);
+  case EAccessor::kNull: return fdfHeaderNullValue(theHeader, theReader);
+  }
+  return 0.0;
+}
 
 } // namespace
 
-// ------------------------------------------------------------ scalar basics
-
-TEST_F(DescriptionTest, NewScalarHoldsNoValueUntilSetAndDumpsItsValue) {
-  CDescriptionField aField("Count", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
+TEST_F(DescriptionTest, ScalarsHoldNoValueUntilSetConvertAndNameThemselves) {
+  TLRXField aField("Count", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
   EXPECT_FALSE(aField.holdsValue());
-  EXPECT_EQ(aField.getRowNbr(), 1);
-  EXPECT_EQ(aField.getColNbr(), 1);
-  EXPECT_EQ(aField.dumpText(), "[Count]  [SCALAR]  [Integer] : EMPTY\n");
+  EXPECT_EQ(std::make_pair(aField.getRowNbr(), aField.getColNbr()), std::make_pair(1, 1));
   std::string aMessage;
   EXPECT_EQ(tlrxCodeOf([&] { aField.getInteger(); }, &aMessage), CTLRX_ERR_DS_NOT_SET);
   EXPECT_EQ(aMessage, "Count");
@@ -50,23 +71,14 @@ TEST_F(DescriptionTest, NewScalarHoldsNoValueUntilSetAndDumpsItsValue) {
   EXPECT_TRUE(aField.holdsValue());
   EXPECT_TRUE(aField.isSet());
   EXPECT_EQ(aField.getInteger(), 5);
-  EXPECT_EQ(aField.dumpText(), "[Count]  [SCALAR]  [Integer]  =  5\n");
-}
-
-TEST_F(DescriptionTest, NamelessFieldReportsNotInitialisedAndDumpsNothing) {
-  CDescriptionField aField(nullptr, CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  EXPECT_STREQ(aField.getName(), "Not initialised");
-  aField.setDouble(1.0);
-  EXPECT_EQ(aField.dumpText(), "");
-  std::string aMessage;
-  EXPECT_EQ(tlrxCodeOf([&] { aField.getString(); }, &aMessage), CTLRX_ERR_DS_TYPE);
+  TLRXField aNameless(nullptr, CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
+  EXPECT_STREQ(aNameless.getName(), "Not initialised");
+  aNameless.setDouble(1.0);
+  EXPECT_EQ(aNameless.dumpText(), "");
+  EXPECT_EQ(tlrxCodeOf([&] { aNameless.getString(); }, &aMessage), CTLRX_ERR_DS_TYPE);
   EXPECT_EQ(aMessage, "Not initialised");
-}
-
-TEST_F(DescriptionTest, ScalarConversionsSetAndReadTheSingleValue) {
-  CDescriptionField aInt("I", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
-  CDescriptionField aDouble("D", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  CDescriptionField aText("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
+  TLRXField aInt("I", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER), aDouble("D", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
+  TLRXField aText("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
   aInt = 7;
   aDouble = 2.5;
   aText = "abc";
@@ -78,167 +90,98 @@ TEST_F(DescriptionTest, ScalarConversionsSetAndReadTheSingleValue) {
   EXPECT_EQ(tlrxCodeOf([&] { aInt = 1.5; }), CTLRX_ERR_DS_TYPE);
   aText.setString(nullptr);
   EXPECT_STREQ(aText.getString(), "");
+  // Stored strings are copies owned by the field.
+  char aBuffer[8] = "one";
+  aText.setString(aBuffer);
+  std::snprintf(aBuffer, sizeof(aBuffer), "two");
+  EXPECT_STREQ(aText.getString(), "one");
 }
 
-// ------------------------------------------------------ getter check order
-
-TEST_F(DescriptionTest, ZeroIndexGettersCheckTypeBeforeSetFlag) {
-  CDescriptionField aDouble("D", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  CDescriptionField aText("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
-  // Unset and wrong type: the type check comes first.
-  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getInteger(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(tlrxCodeOf([&] { aText.getDouble(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getString(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(tlrxCodeOf([&] { aDouble.getDouble(); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(tlrxCodeOf([&] { aText.getString(); }), CTLRX_ERR_DS_NOT_SET);
-}
-
-TEST_F(DescriptionTest, GetIntegerByIndexNeverSubstitutes) {
-  CDescriptionField aInts("Counts", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  aInts.allocate(1, 3);
-  aInts.setInteger(1, 4);
-  EXPECT_EQ(aInts.getInteger(0), 0); // unset elements read as stored
-  EXPECT_EQ(aInts.getInteger(1), 4);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getInteger(3); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getInteger(-1); }), CTLRX_ERR_DS_RANGE);
-  CDescriptionField aDoubles("Values", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
-  aDoubles.allocate(1, 3);
-  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(9); }), CTLRX_ERR_DS_TYPE); // type before index
-  CDescriptionField aScalar("One", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
-  aScalar.setInteger(8);
-  EXPECT_EQ(aScalar.getInteger(0), 8);
-  EXPECT_EQ(tlrxCodeOf([&] { aScalar.getInteger(1); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aEmptyMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
-  EXPECT_EQ(tlrxCodeOf([&] { aEmptyMatrix.getInteger(0); }), CTLRX_ERR_DS_RANGE);
-}
-
-TEST_F(DescriptionTest, GetDoubleBeyondTheEndSubstitutesExceptForPulseDurations) {
-  CDescriptionField aPlain("ChirpRate", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
+// Each accessor checks type, set flag and bounds in its own order.
+TEST_F(DescriptionTest, AccessorsCheckTypeSetFlagAndBoundsInTheirOwnOrder) {
+  TLRXField aD("D", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE), aS("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
+  TLRXField aOne("One", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER), aVI("Counts", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
+  TLRXField aVD("Values", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE), aVS("Names", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
+  TLRXField aMD("MD", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE), aMI("MI", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
+  TLRXField aMS("MS", CTLRX_DS_MATRIX, CTLRX_DS_STRING), aNoMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
+  TLRXField aNoVector("Empty", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
+  TLRXField aPulseI("PulseDuration", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
+  aOne.setInteger(8);
+  aVI.allocate(1, 3);
+  aVI.setInteger(1, 4);
+  aVD.allocate(1, 3);
+  aVD.setDouble(0, 1.0);
+  aVS.allocate(1, 2);
+  aVS.setString(0, "first");
+  aMD.allocate(2, 3);
+  aMI.allocate(2, 2);
+  aMS.allocate(1, 2);
+  aPulseI.allocate(1, 2);
+  const std::pair<int32_t, std::vector<std::function<void()>>> aRaising[] = {
+      {CTLRX_ERR_DS_TYPE,
+       {[&] { aD.getInteger(); }, [&] { aS.getDouble(); }, [&] { aD.getString(); }, [&] { aVD.getInteger(9); },
+        [&] { aOne.getInteger(1); }, [&] { aPulseI.getDouble(5); }, [&] { aD.getDouble(1); },
+        [&] { aMD.getDouble(1); }, [&] { aMD.getInteger(0, 0); }, [&] { aMI.getDouble(5, 5); },
+        [&] { aVI.getString(7); }, [&] { aVI.setDouble(0, 1, 1.0); }, [&] { aVD.isSet(); }, [&] { aD.isSet(1); },
+        [&] { aMD.isSet(1); }}},
+      {CTLRX_ERR_DS_NOT_SET,
+       {[&] { aD.getDouble(); }, [&] { aS.getString(); }, [&] { aMI.getString(0, 0); }, [&] { aMS.getString(0, 1); },
+        [&] { aMS.getString(4, 4); }, [&] { aVS.getString(1); }, [&] { aVS.getString(2); }}},
+      {CTLRX_ERR_DS_RANGE,
+       {[&] { aVI.getInteger(3); }, [&] { aVI.getInteger(-1); }, [&] { aNoMatrix.getInteger(0); },
+        [&] { aMD.getDouble(2, 0); }, [&] { aMD.getDouble(0, 3); }, [&] { aMD.getInteger(5, 5); },
+        [&] { aVI.setDouble(5, 0, 1.0); }, [&] { aVI.setInteger(3, 1); }, [&] { aVI.setInteger(-1, 1); },
+        [&] { aNoVector.setString(0, "x"); }, [&] { aNoVector.setInteger(0, 1); }, [&] { aVS.unset(2); }}}};
+  for (const auto &[aCode, aCalls] : aRaising)
+    for (size_t i = 0; i < aCalls.size(); ++i)
+      EXPECT_EQ(tlrxCodeOf(aCalls[i]), aCode) << "call " << i << " of those raising " << aCode;
+  // Unset cells read as stored, scalars through index 0.
+  EXPECT_EQ(aVI.getInteger(0), 0);
+  EXPECT_EQ(aVI.getInteger(1), 4);
+  EXPECT_EQ(aOne.getInteger(0), 8);
+  EXPECT_EQ(aMD.getDouble(1, 2), 0.0);
+  EXPECT_STREQ(aVS.getString(0), "first");
+  aVI.setInteger(2, 9);
+  EXPECT_EQ(aVI.getInteger(2), 9);
+  aMI.setInteger(0, 0, 3);
+  EXPECT_EQ(tlrxCodeOf([&] { aMI.getString(0, 0); }), CTLRX_ERR_DS_TYPE); // set flag first, then type
+  aMS.setString(0, 1, "v");
+  EXPECT_STREQ(aMS.getString(0, 1), "v");
+  // isSet answers false outside the storage.
+  EXPECT_TRUE(aVD.isSet(0));
+  EXPECT_FALSE(aVD.isSet(1));
+  EXPECT_FALSE(aVD.isSet(3));
+  EXPECT_FALSE(aVD.isSet(0, 5));
+  EXPECT_FALSE(aVD.isSet(-1, 0));
+  EXPECT_FALSE(aNoMatrix.isSet(0, 0));
+  aVS.setString(1, "x");
+  aVS.unset(1);
+  EXPECT_FALSE(aVS.isSet(1));
+  EXPECT_EQ(tlrxCodeOf([&] { aVS.getString(1); }), CTLRX_ERR_DS_NOT_SET);
+  aD.setDouble(1.0);
+  aD.unset();
+  EXPECT_FALSE(aD.holdsValue());
+  aD.release();
+  EXPECT_EQ(tlrxCodeOf([&] { aD.isSet(); }), CTLRX_ERR_DS_CHECK);
+  // getDouble beyond the end substitutes -9999, except for pulse durations.
+  TLRXField aPlain("ChirpRate", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
   aPlain.allocate(1, 2);
   aPlain.setDouble(1, 0.25);
   EXPECT_EQ(aPlain.getDouble(1), 0.25);
   EXPECT_EQ(aPlain.getDouble(2), -9999.0);
   EXPECT_EQ(aPlain.getDouble(-1), -9999.0);
   for (const char *aName : {"PulseDuration", "MasterPulseDurationSeconds"}) {
-    CDescriptionField aPulse(aName, CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
+    TLRXField aPulse(aName, CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
     aPulse.allocate(1, 2);
     EXPECT_EQ(aPulse.getDouble(1), 0.0);
     std::string aMessage;
     EXPECT_EQ(tlrxCodeOf([&] { aPulse.getDouble(2); }, &aMessage), CTLRX_ERR_DS_RANGE) << aName;
     EXPECT_EQ(aMessage, aName);
   }
-  CDescriptionField aInts("PulseDuration", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  aInts.allocate(1, 2);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getDouble(5); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  EXPECT_EQ(tlrxCodeOf([&] { aScalar.getDouble(1); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
-  aMatrix.allocate(2, 2);
-  EXPECT_EQ(tlrxCodeOf([&] { aMatrix.getDouble(1); }), CTLRX_ERR_DS_TYPE);
 }
 
-TEST_F(DescriptionTest, MatrixGettersCheckInTheirOwnOrder) {
-  CDescriptionField aDoubles("D", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
-  aDoubles.allocate(2, 3);
-  EXPECT_EQ(aDoubles.getDouble(1, 2), 0.0); // never set, no error
-  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getDouble(2, 0); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getDouble(0, 3); }), CTLRX_ERR_DS_RANGE);
-  // get integer (row, col): bounds before type; get double: type before bounds.
-  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(5, 5); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aDoubles.getInteger(0, 0); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aInts("I", CTLRX_DS_MATRIX, CTLRX_DS_INTEGER);
-  aInts.allocate(2, 2);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getDouble(5, 5); }), CTLRX_ERR_DS_TYPE);
-  // get string (row, col): set flag first, then type.
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_NOT_SET);
-  aInts.setInteger(0, 0, 3);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(0, 0); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aTexts("T", CTLRX_DS_MATRIX, CTLRX_DS_STRING);
-  aTexts.allocate(1, 2);
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(0, 1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(4, 4); }), CTLRX_ERR_DS_NOT_SET);
-  aTexts.setString(0, 1, "v");
-  EXPECT_STREQ(aTexts.getString(0, 1), "v");
-}
-
-TEST_F(DescriptionTest, StringByIndexChecksTypeThenElementSet) {
-  CDescriptionField aTexts("Names", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
-  aTexts.allocate(1, 2);
-  aTexts.setString(0, "first");
-  EXPECT_STREQ(aTexts.getString(0), "first");
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(2); }), CTLRX_ERR_DS_NOT_SET);
-  CDescriptionField aInts("Ints", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  aInts.allocate(1, 1);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.getString(7); }), CTLRX_ERR_DS_TYPE);
-}
-
-// ------------------------------------------------------- setter check order
-
-TEST_F(DescriptionTest, SettersCheckStorageThenBoundsThenType) {
-  CDescriptionField aInts("Ints", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  aInts.allocate(1, 3);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.setDouble(5, 0, 1.0); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.setDouble(0, 1, 1.0); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.setInteger(3, 1); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aInts.setInteger(-1, 1); }), CTLRX_ERR_DS_RANGE);
-  aInts.setInteger(2, 9);
-  EXPECT_EQ(aInts.getInteger(2), 9);
-  // No storage yet: 848646 whatever the type.
-  CDescriptionField aEmpty("Empty", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  EXPECT_EQ(tlrxCodeOf([&] { aEmpty.setString(0, "x"); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aEmpty.setInteger(0, 1); }), CTLRX_ERR_DS_RANGE);
-}
-
-TEST_F(DescriptionTest, StoredStringsAreCopiesOwnedByTheField) {
-  CDescriptionField aText("T", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
-  char aBuffer[8];
-  std::snprintf(aBuffer, sizeof(aBuffer), "one");
-  aText.setString(aBuffer);
-  std::snprintf(aBuffer, sizeof(aBuffer), "two");
-  EXPECT_STREQ(aText.getString(), "one");
-  aText.setString("three");
-  EXPECT_STREQ(aText.getString(), "three");
-}
-
-TEST_F(DescriptionTest, UnsetClearsTheFlagAndChecksBounds) {
-  CDescriptionField aTexts("Names", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
-  aTexts.allocate(1, 2);
-  aTexts.setString(1, "x");
-  aTexts.unset(1);
-  EXPECT_FALSE(aTexts.isSet(1));
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.getString(1); }), CTLRX_ERR_DS_NOT_SET);
-  EXPECT_EQ(tlrxCodeOf([&] { aTexts.unset(2); }), CTLRX_ERR_DS_RANGE);
-  CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  aScalar.setDouble(1.0);
-  aScalar.unset();
-  EXPECT_FALSE(aScalar.holdsValue());
-}
-
-TEST_F(DescriptionTest, IsSetFormsAnswerOrRaiseByShape) {
-  CDescriptionField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
-  aVector.allocate(1, 2);
-  aVector.setDouble(0, 1.0);
-  EXPECT_TRUE(aVector.isSet(0));
-  EXPECT_FALSE(aVector.isSet(1));
-  EXPECT_FALSE(aVector.isSet(2)); // beyond the end: false, no error
-  EXPECT_EQ(tlrxCodeOf([&] { aVector.isSet(); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_FALSE(aVector.isSet(0, 5));
-  EXPECT_FALSE(aVector.isSet(-1, 0));
-  CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  EXPECT_EQ(tlrxCodeOf([&] { aScalar.isSet(1); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_DOUBLE);
-  EXPECT_FALSE(aMatrix.isSet(0, 0)); // no storage
-  aMatrix.allocate(2, 2);
-  EXPECT_EQ(tlrxCodeOf([&] { aMatrix.isSet(1); }), CTLRX_ERR_DS_TYPE);
-  aScalar.release();
-  EXPECT_EQ(tlrxCodeOf([&] { aScalar.isSet(); }), CTLRX_ERR_DS_CHECK);
-}
-
-// ----------------------------------------------------- storage and holding
-
-TEST_F(DescriptionTest, VectorsHoldAValueOnceAllocatedAndLoseItOnClear) {
-  CDescriptionField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
+TEST_F(DescriptionTest, StorageMakesAVectorHoldAValueClearDropsItButKeepsAScalarsStorage) {
+  TLRXField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
   EXPECT_FALSE(aVector.holdsValue());
   aVector.allocate(1, 0);
   EXPECT_FALSE(aVector.holdsValue());
@@ -246,98 +189,69 @@ TEST_F(DescriptionTest, VectorsHoldAValueOnceAllocatedAndLoseItOnClear) {
   EXPECT_TRUE(aVector.holdsValue()); // storage alone makes a vector present
   EXPECT_EQ(aVector.getNumberOfElements(), 4);
   aVector.clear();
-  EXPECT_EQ(aVector.getRowNbr(), 0);
-  EXPECT_EQ(aVector.getColNbr(), 0);
+  EXPECT_EQ(std::make_pair(aVector.getRowNbr(), aVector.getColNbr()), std::make_pair(0, 0));
   EXPECT_FALSE(aVector.holdsValue());
   EXPECT_EQ(tlrxCodeOf([&] { aVector.setDouble(0, 1.0); }), CTLRX_ERR_DS_RANGE);
-}
-
-TEST_F(DescriptionTest, ClearingAScalarKeepsItsStorage) {
-  CDescriptionField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
+  TLRXField aScalar("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING);
   aScalar.setString("a");
   aScalar.clear();
   EXPECT_FALSE(aScalar.holdsValue());
   EXPECT_EQ(aScalar.getRowNbr(), 1);
   aScalar.setString("b");
   EXPECT_STREQ(aScalar.getString(), "b");
-}
-
-TEST_F(DescriptionTest, AllocationRefusesStructsAndUnusableCounts) {
-  CDescriptionField aStruct("Orbit", CTLRX_DS_MULTIPLE, CTLRX_DS_FIELD_POINTER);
+  // Allocation refuses structs, unknown types and unusable counts (a product beyond 32 bits too).
+  TLRXField aStruct("Orbit", CTLRX_DS_MULTIPLE, CTLRX_DS_FIELD_POINTER), aInts("V", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
+  TLRXField aUnknown("U", CTLRX_DS_VECTOR, CTLRX_DS_UNRECOGNISED);
   EXPECT_EQ(tlrxCodeOf([&] { aStruct.allocate(1, 3); }), CTLRX_ERR_DS_TYPE);
-  CDescriptionField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_INTEGER);
-  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(-1, 3); }), CTLRX_ERR_DS_RANGE);
-  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(1, -3); }), CTLRX_ERR_DS_RANGE);
-  // The product overflows 32 bits: refused before anything is allocated.
-  EXPECT_EQ(tlrxCodeOf([&] { aVector.allocate(INT32_MAX, INT32_MAX); }), CTLRX_ERR_DS_RANGE);
-  CDescriptionField aUnknown("U", CTLRX_DS_VECTOR, CTLRX_DS_UNRECOGNISED);
   EXPECT_EQ(tlrxCodeOf([&] { aUnknown.allocate(1, 1); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.allocate(-1, 3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.allocate(1, -3); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(tlrxCodeOf([&] { aInts.allocate(INT32_MAX, INT32_MAX); }), CTLRX_ERR_DS_RANGE);
 }
 
-// ----------------------------------------------------------------- structs
-
-class StructTest : public DescriptionTest {
-protected:
-  std::unique_ptr<CDescriptionSection> mSection;
-  CDescriptionField *mStruct = nullptr;
-  void SetUp() override {
-    DescriptionTest::SetUp();
-    mSection = declare("[Sec]\nOrbit = 3VD x y z\n");
-    mStruct = mSection->getField(0);
-  }
-};
-
-TEST_F(StructTest, HoldsAValueOnlyWhenEveryMemberDoes) {
-  EXPECT_FALSE(mStruct->holdsValue());
-  EXPECT_EQ(mStruct->getNumberOfElements(), 0);
-  mSection->getField(1)->allocate(1, 2);
-  mSection->getField(2)->allocate(1, 2);
-  EXPECT_FALSE(mStruct->holdsValue());
-  mStruct->setNumberOfElements(10);
-  EXPECT_TRUE(mStruct->holdsValue());
+TEST_F(DescriptionTest, StructHoldsAValueOnlyWhenEveryMemberDoesAndAssignmentCopiesSetCells) {
+  auto aSection = declare("[Sec]\nOrbit = 3VD x y z\n");
+  CDescriptionField *aStruct = aSection->getField(0);
+  EXPECT_FALSE(aStruct->holdsValue());
+  EXPECT_EQ(aStruct->getNumberOfElements(), 0);
+  aSection->getField(1)->allocate(1, 2);
+  aSection->getField(2)->allocate(1, 2);
+  EXPECT_FALSE(aStruct->holdsValue());
+  aStruct->setNumberOfElements(10);
+  EXPECT_TRUE(aStruct->holdsValue());
   for (int32_t i = 0; i < 3; ++i) {
-    EXPECT_EQ(mStruct->getMember(i)->getColNbr(), 10);
-    EXPECT_EQ(mStruct->getMember(i), mSection->getField(i + 1));
+    EXPECT_EQ(aStruct->getMember(i)->getColNbr(), 10);
+    EXPECT_EQ(aStruct->getMember(i), aSection->getField(i + 1));
   }
-  EXPECT_EQ(mStruct->getNumberOfElements(), 10);
-  EXPECT_EQ(mStruct->dumpText(), "[Orbit]  [MULTIPLE]  [Field Of Section pointer]  [Number of sub fiels : 3]\n");
+  EXPECT_EQ(aStruct->getNumberOfElements(), 10);
+  EXPECT_EQ(aStruct->dumpText(), "[Orbit]  [MULTIPLE]  [Field Of Section pointer]  [Number of sub fiels : 3]\n");
   // An element of the struct is set when every member's element is.
-  mSection->getField(1)->setDouble(4, 1.0);
-  mSection->getField(2)->setDouble(4, 2.0);
-  EXPECT_FALSE(mStruct->isSet(4));
-  mSection->getField(3)->setDouble(4, 3.0);
-  EXPECT_TRUE(mStruct->isSet(4));
-  EXPECT_FALSE(mStruct->isSet(10));
-}
-
-TEST_F(StructTest, StructOfScalarsNeedsEveryMemberSetAndRefusesElementCounts) {
-  auto aSection = declare("[Sec]\nCorner = 2D lat lon\n");
-  CDescriptionField *aCorner = aSection->getField(0);
-  aSection->getField(1)->setDouble(1.0);
-  EXPECT_FALSE(aCorner->holdsValue());
-  aSection->getField(2)->setDouble(2.0);
-  EXPECT_TRUE(aCorner->holdsValue());
-  EXPECT_EQ(tlrxCodeOf([&] { aCorner->setNumberOfElements(3); }), CTLRX_ERR_DS_TYPE);
-}
-
-TEST_F(StructTest, AssignmentOfAStructComparesMemberCountsOnly) {
+  aSection->getField(1)->setDouble(4, 1.0);
+  aSection->getField(2)->setDouble(4, 2.0);
+  EXPECT_FALSE(aStruct->isSet(4));
+  aSection->getField(3)->setDouble(4, 3.0);
+  EXPECT_TRUE(aStruct->isSet(4));
+  EXPECT_FALSE(aStruct->isSet(10));
+  // Assignment compares member counts only; members are copied as fields.
   auto aOther = declare("[Sec]\nOrbit = 3VD x y z\n");
   aOther->getField(0)->setNumberOfElements(2);
-  EXPECT_TRUE(mStruct->assignFrom(*aOther->getField(0)));
-  EXPECT_EQ(mSection->getField(1)->getColNbr(), 0); // members are copied as fields
+  EXPECT_TRUE(aStruct->assignFrom(*aOther->getField(0)));
+  EXPECT_EQ(aSection->getField(1)->getColNbr(), 10);
   auto aSmaller = declare("[Sec]\nOrbit = 2VD x y\n");
   aSmaller->getField(0)->setNumberOfElements(2);
-  EXPECT_EQ(tlrxCodeOf([&] { mStruct->assignFrom(*aSmaller->getField(0)); }), CTLRX_ERR_DS_TYPE);
-}
-
-// -------------------------------------------------------------- assignment
-
-TEST_F(DescriptionTest, AssignmentCopiesSetCellsOnly) {
-  CDescriptionField aSource("V", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
+  EXPECT_EQ(tlrxCodeOf([&] { aStruct->assignFrom(*aSmaller->getField(0)); }), CTLRX_ERR_DS_TYPE);
+  // A struct of scalars needs every member set and has no element count.
+  auto aCorner = declare("[Sec]\nCorner = 2D lat lon\n");
+  aCorner->getField(1)->setDouble(1.0);
+  EXPECT_FALSE(aCorner->getField(0)->holdsValue());
+  aCorner->getField(2)->setDouble(2.0);
+  EXPECT_TRUE(aCorner->getField(0)->holdsValue());
+  EXPECT_EQ(tlrxCodeOf([&] { aCorner->getField(0)->setNumberOfElements(3); }), CTLRX_ERR_DS_TYPE);
+  // Assignment copies set cells only; an empty source leaves the target alone.
+  TLRXField aSource("V", CTLRX_DS_VECTOR, CTLRX_DS_STRING), aTarget("V", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
   aSource.allocate(1, 3);
   aSource.setString(0, "a");
   aSource.setString(2, "c");
-  CDescriptionField aTarget("V", CTLRX_DS_VECTOR, CTLRX_DS_STRING);
   EXPECT_TRUE(aTarget.assignFrom(aSource));
   EXPECT_EQ(aTarget.getColNbr(), 3);
   EXPECT_STREQ(aTarget.getString(0), "a");
@@ -345,134 +259,124 @@ TEST_F(DescriptionTest, AssignmentCopiesSetCellsOnly) {
   EXPECT_STREQ(aTarget.getString(2), "c");
   aSource.setString(0, "changed");
   EXPECT_STREQ(aTarget.getString(0), "a");
+  TLRXField aEmpty("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING), aDouble("T", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
+  aDouble.setDouble(3.0);
+  EXPECT_TRUE(aDouble.assignFrom(aEmpty)); // another type, but empty
+  EXPECT_EQ(aDouble.getDouble(), 3.0);
+  aEmpty.setString("x");
+  EXPECT_EQ(tlrxCodeOf([&] { aDouble.assignFrom(aEmpty); }), CTLRX_ERR_DS_TYPE);
+  EXPECT_EQ(aDouble.getDouble(), 3.0);
 }
-
-TEST_F(DescriptionTest, AssignmentFromAnEmptyFieldLeavesTheTargetAlone) {
-  CDescriptionField aSource("S", CTLRX_DS_SCALAR, CTLRX_DS_STRING); // other type, but empty
-  CDescriptionField aTarget("T", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE);
-  aTarget.setDouble(3.0);
-  EXPECT_TRUE(aTarget.assignFrom(aSource));
-  EXPECT_EQ(aTarget.getDouble(), 3.0);
-  aSource.setString("x");
-  EXPECT_EQ(tlrxCodeOf([&] { aTarget.assignFrom(aSource); }), CTLRX_ERR_DS_TYPE);
-  EXPECT_EQ(aTarget.getDouble(), 3.0);
-}
-
-// ------------------------------------------------------------------- dumps
 
 TEST_F(DescriptionTest, DumpShowsShapeCountsAndFirstValue) {
-  CDescriptionField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE);
+  TLRXField aVector("V", CTLRX_DS_VECTOR, CTLRX_DS_DOUBLE), aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_STRING);
   aVector.allocate(1, 3);
   aVector.setDouble(0, 3.14159265);
   EXPECT_EQ(aVector.dumpText(), "[V]  [VECTOR]  [Double]  [Number of elements : 3]  =  3.14159\n");
-  CDescriptionField aMatrix("M", CTLRX_DS_MATRIX, CTLRX_DS_STRING);
   aMatrix.allocate(2, 2);
   aMatrix.setString(0, 0, "a");
   EXPECT_EQ(aMatrix.dumpText(), "[M]  [MARTIX]  [String]  [Row Nbr : 2]  [Col Nbr : 2]  =  [a]\n");
-  CDescriptionField aInt("I", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER);
+  TLRXField aInt("I", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER), aOdd("W", 7, 9);
   aInt.setInteger(-12);
   EXPECT_EQ(aInt.dumpText(), "[I]  [SCALAR]  [Integer]  =  -12\n");
-  CDescriptionField aOdd("W", 7, 9);
   EXPECT_EQ(aOdd.dumpText(), "[W]  [WRONG]  [WRONG] : EMPTY\n");
   EXPECT_STREQ(fdfShapeName(-1), "WRONG");
   EXPECT_STREQ(fdfValueTypeName(3), "Field Of Section pointer");
+  // A description prints its sections and their fields.
+  auto aSection = declare("[Sec]\na = I\nb = S\n");
+  aSection->getField(0)->setInteger(4);
+  CDescription aDescription;
+  aDescription.addSection(std::move(aSection));
+  EXPECT_EQ(aDescription.printText(true), "\n\n << Total number of Sections : 1 >>"
+                                          "\n\n << [Sec]  -  Total number of Fields : 2 >>\n\n"
+                                          "[a]  [SCALAR]  [Integer]  =  4\n[b]  [SCALAR]  [String] : EMPTY\n\n\n");
+  EXPECT_EQ(aDescription.getSection(0)->printText(false),
+            "\n\n << [Sec]  -  Total number of Fields : 2 >>\n\n[a]  [SCALAR]  [Integer]  =  4\n");
 }
 
-// --------------------------------------------------------------- key files
-
-TEST_F(DescriptionTest, KeyFileStructWithCommentDeclaresMembersAfterTheStruct) {
-  auto aSection = declare("; header comment\n[Sec]\nFirst = I\nOrbit = 3VD x y z ; positions\nLast = MS\n");
-  ASSERT_EQ(aSection->getFieldCount(), 6);
+TEST_F(DescriptionTest, KeyFileDeclaresTypeCodesAndStructMembersAfterTheirStruct) {
+  auto aSection = declare("; header comment\n[Sec]\nFirst = I\nOrbit = 3VD x y z ; positions\nLast = MS\n"
+                          "a=I\nb = D\nc\t=\tF\nd = S\ne = VI\nf = VD(3)\ng = MI\nh = MF\n");
+  ASSERT_EQ(aSection->getFieldCount(), 14);
   EXPECT_STREQ(aSection->getName(), "Sec");
   const CDescriptionField *aOrbit = aSection->getField(1);
   EXPECT_STREQ(aOrbit->getName(), "Orbit");
-  EXPECT_EQ(aOrbit->getShape(), CTLRX_DS_MULTIPLE);
-  EXPECT_EQ(aOrbit->getValueType(), CTLRX_DS_FIELD_POINTER);
   EXPECT_EQ(aOrbit->getParentIndex(), -1);
   EXPECT_EQ(aOrbit->getMemberCount(), 3);
-  const char *aNames[] = {"x", "y", "z"};
   for (int32_t i = 0; i < 3; ++i) {
     const CDescriptionField *aMember = aSection->getField(2 + i);
-    EXPECT_STREQ(aMember->getName(), aNames[i]);
-    EXPECT_EQ(aMember->getShape(), CTLRX_DS_VECTOR);
-    EXPECT_EQ(aMember->getValueType(), CTLRX_DS_DOUBLE);
+    EXPECT_EQ(aMember->getName(), std::string(1, static_cast<char>('x' + i)));
     EXPECT_EQ(aMember->getParentIndex(), 1);
     EXPECT_EQ(aOrbit->getMember(i), aMember);
   }
-  EXPECT_EQ(aSection->getField(5)->getShape(), CTLRX_DS_MATRIX);
-  EXPECT_EQ(aSection->getField(5)->getValueType(), CTLRX_DS_STRING);
-  EXPECT_EQ(aSection->getField(6), nullptr);
-}
-
-TEST_F(DescriptionTest, KeyFileTypeCodesGiveShapesAndValueTypes) {
-  auto aSection = declare("[Sec]\na=I\nb = D\nc\t=\tF\nd = S\ne = VI\nf = VD(3)\ng = MI\nh = MF\n");
-  const int32_t aExpected[][2] = {{0, 0}, {0, 1}, {0, 1}, {0, 2}, {1, 0}, {1, 1}, {2, 0}, {2, 1}};
-  ASSERT_EQ(aSection->getFieldCount(), 8);
-  for (int32_t i = 0; i < 8; ++i) {
+  const int32_t aExpected[][2] = {{0, 0}, {3, 3}, {1, 1}, {1, 1}, {1, 1}, {2, 2}, {0, 0},
+                                  {0, 1}, {0, 1}, {0, 2}, {1, 0}, {1, 1}, {2, 0}, {2, 1}};
+  for (int32_t i = 0; i < 14; ++i) {
     EXPECT_EQ(aSection->getField(i)->getShape(), aExpected[i][0]) << i;
     EXPECT_EQ(aSection->getField(i)->getValueType(), aExpected[i][1]) << i;
   }
+  EXPECT_EQ(aSection->getField(14), nullptr);
 }
 
-TEST_F(DescriptionTest, KeyFileRejectsBadTypeCodesAndMissingMemberNames) {
-  for (const char *aLine : {"x = VX", "x = vd", "x = DV", "x = V", "x = ", "x = -3VD a b c", "x = VDD"}) {
-    tlrxWriteFile(keyPath(), std::string("[Sec]\nok = I\n") + aLine + "\n");
+// The header opens in the first two characters, the section runs to the end
+// of the file; an over-long line is cut (its tail is no line of its own); a
+// huge struct count is refused before it sizes anything.
+TEST_F(DescriptionTest, KeyFileLinesDecideTheFieldsOfTheSection) {
+  std::vector<std::string> aMany;
+  auto aFields = [&aMany](int theCount) {
+    std::string aText = "[Sec]\n";
+    aMany.clear();
+    for (int i = 0; i < theCount; ++i) {
+      aMany.push_back("f" + std::to_string(i));
+      aText += aMany.back() + " = D\n";
+    }
+    return aText;
+  };
+  std::string aNul = "[Sec]\na = I";
+  aNul += '\0';
+  const struct {
+    std::string mText;
+    int32_t mCode; // -1: nothing declared, no error
+    std::vector<std::string> mNames;
+    const char *mMessage;
+  } aCases[] = {{"[Other]\nq = I\n[Sec]\nv = D\n", 0, {"v"}, nullptr},
+                {"[Other]\nq = I\n [Sec]\nv = D\n", 0, {"v"}, nullptr},
+                {"[Other]\nq = I\n[ Sec ]\nv = D\n", 0, {"v"}, nullptr},
+                {"[Other]\nq = I\n\t[Sec]\nv = D\n", 0, {"v"}, nullptr},
+                {"  [Sec]\nv = D\n", -1, {}, nullptr},
+                {"[Sec]\na = I\n[Next]\nb = D\n", 0, {"a", "b"}, nullptr},
+                {"[Sec]\nA = I ;" + std::string(1500000, 'x') + " Ghost = I\nB = D\n", 0, {"A", "B"}, nullptr},
+                {aNul + " junk\nb = D\n", 0, {"a", "b"}, nullptr},
+                {"[Sec]\nOrbit = 3VD x y ; z forgotten\n", CTLRX_ERR_DS_DECLARATION, {}, nullptr},
+                {aFields(CTLRX_DS_MAX_NBR_FIELDS), CTLRX_ERR_DS_DECLARATION, {}, "Sec"},
+                {aFields(5046) + "S = 3VD a b c\n", CTLRX_ERR_DS_DECLARATION, {}, nullptr},
+                {"[Sec]\nS = 99999999999999999999VD a\n", CTLRX_ERR_DS_DECLARATION, {}, nullptr},
+                {aFields(CTLRX_DS_MAX_NBR_FIELDS - 1), 0, aMany, nullptr}};
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mText.substr(0, 40));
+    tlrxWriteFile(keyPath(), aCase.mText);
     CDescriptionSection aSection;
+    bool aDeclared = false;
     std::string aMessage;
-    EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_TYPE)
-        << aLine;
+    EXPECT_EQ(tlrxCodeOf([&] { aDeclared = aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage),
+              std::max(aCase.mCode, 0));
+    EXPECT_EQ(aDeclared, aCase.mCode == 0);
+    std::vector<std::string> aNames;
+    for (int32_t i = 0; i < aSection.getFieldCount() && aCase.mCode == 0; ++i)
+      aNames.push_back(aSection.getField(i)->getName());
+    EXPECT_EQ(aNames, aCase.mNames);
+    if (aCase.mMessage != nullptr)
+      EXPECT_EQ(aMessage, aCase.mMessage);
+  }
+  for (const char *aLine : {"x = VX", "x = vd", "x = DV", "x = V", "x = ", "x = -3VD a b c", "x = VDD"}) {
+    std::string aMessage;
+    EXPECT_EQ(declareCode(std::string("[Sec]\nok = I\n") + aLine + "\n", &aMessage), CTLRX_ERR_DS_TYPE) << aLine;
     EXPECT_EQ(aMessage, "Sec");
   }
-  tlrxWriteFile(keyPath(), "[Sec]\nOrbit = 3VD x y ; z forgotten\n");
-  CDescriptionSection aSection;
-  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
-}
-
-TEST_F(DescriptionTest, SectionHeaderMustOpenInTheFirstTwoCharacters) {
-  for (const char *aHeader : {"[Sec]", " [Sec]", "[ Sec ]", "\t[Sec]"}) {
-    auto aSection = declare(std::string("[Other]\nq = I\n") + aHeader + "\nv = D\n");
-    ASSERT_EQ(aSection->getFieldCount(), 1) << aHeader;
-    EXPECT_STREQ(aSection->getField(0)->getName(), "v");
-  }
-  tlrxWriteFile(keyPath(), "  [Sec]\nv = D\n");
-  CDescriptionSection aSection;
-  EXPECT_FALSE(aSection.declareFromKeyFile(keyPath().c_str(), "Sec"));
-  EXPECT_EQ(aSection.getFieldCount(), 0);
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);
 }
 
-TEST_F(DescriptionTest, KeyFileSectionRunsToTheEndOfTheFile) {
-  // A later header is read as a line without "=" and skipped.
-  auto aSection = declare("[Sec]\na = I\n[Next]\nb = D\n");
-  ASSERT_EQ(aSection->getFieldCount(), 2);
-  EXPECT_STREQ(aSection->getField(1)->getName(), "b");
-  // Without a name the first header names the section.
-  tlrxWriteFile(keyPath(), "[First]\nc = S\n");
-  CDescriptionSection aAny;
-  EXPECT_TRUE(aAny.declareFromKeyFile(keyPath().c_str(), nullptr));
-  EXPECT_STREQ(aAny.getName(), "First");
-}
-
-TEST_F(DescriptionTest, OverLongKeyFileLineIsCutNotSplit) {
-  // The tail of a line longer than the line buffer must not come back as a
-  // line of its own: here it would declare a field.
-  std::string aText = "[Sec]\nA = I ;" + std::string(1500000, 'x') + " Ghost = I\nB = D\n";
-  auto aSection = declare(aText);
-  ASSERT_EQ(aSection->getFieldCount(), 2);
-  EXPECT_STREQ(aSection->getField(0)->getName(), "A");
-  EXPECT_STREQ(aSection->getField(1)->getName(), "B");
-}
-
-TEST_F(DescriptionTest, NulByteInsideALineDoesNotSwallowTheNextLine) {
-  std::string aText = "[Sec]\na = I";
-  aText += '\0';
-  aText += " junk\nb = D\n";
-  auto aSection = declare(aText);
-  ASSERT_EQ(aSection->getFieldCount(), 2);
-  EXPECT_STREQ(aSection->getField(1)->getName(), "b");
-}
-
-TEST_F(DescriptionTest, KeyFileDeclarationFailuresNameTheirCause) {
+TEST_F(DescriptionTest, KeyFileNamesItsSectionIsFoundOrRaisesAndRedeclaresFromScratch) {
   CDescriptionSection aSection;
   EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(nullptr, nullptr); }), CTLRX_ERR_DS_DECLARATION);
   std::string aMessage;
@@ -480,107 +384,63 @@ TEST_F(DescriptionTest, KeyFileDeclarationFailuresNameTheirCause) {
   EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(aMissing.c_str(), "Sec"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
   EXPECT_EQ(aMessage, aMissing);
   EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(nullptr, "NoSuchSection"); }, &aMessage), CTLRX_ERR_FILE_OPEN);
-  std::string aDir;
-  ASSERT_TRUE(fdfGetEnvVar(aDir, "TELLURIX_KEY_FILES_DIR"));
-  EXPECT_EQ(aMessage, aDir + "NoSuchSection.key");
+  EXPECT_EQ(aMessage, fdfGetRequiredEnvVar("TELLURIX_KEY_FILES_DIR") + "NoSuchSection.key");
   // A "_hdr" key file name falls back to its ".sml" form.
   tlrxWriteFile(mDir.file("keys.sml"), "[Sec]\nv = D\n");
   EXPECT_TRUE(aSection.declareFromKeyFile(mDir.file("keys_hdr").c_str(), "Sec"));
   EXPECT_EQ(aSection.getFieldCount(), 1);
-  EXPECT_EQ(fdfScratchBuffersInUse(), 0);
+  // Without a name the first header names the section; redeclaring releases the old fields.
+  tlrxWriteFile(keyPath(), "[First]\nc = S\n");
+  EXPECT_TRUE(aSection.declareFromKeyFile(keyPath().c_str(), nullptr));
+  EXPECT_STREQ(aSection.getName(), "First");
+  EXPECT_EQ(aSection.getFieldCount(), 1);
+  tlrxWriteFile(keyPath(), "[First]\na = I\nb = I\n");
+  EXPECT_TRUE(aSection.declareFromKeyFile(keyPath().c_str(), "First"));
+  EXPECT_EQ(aSection.getFieldCount(), 2);
 }
-
-TEST_F(DescriptionTest, TheFieldLimitIsReachedByThe5050thField) {
-  auto aFields = [](int theCount) {
-    std::string aText = "[Sec]\n";
-    for (int i = 0; i < theCount; ++i) {
-      aText += "f" + std::to_string(i) + " = D\n";
-    }
-    return aText;
-  };
-  auto aSection = declare(aFields(CTLRX_DS_MAX_NBR_FIELDS - 1));
-  EXPECT_EQ(aSection->getFieldCount(), 5049);
-  tlrxWriteFile(keyPath(), aFields(CTLRX_DS_MAX_NBR_FIELDS)); // the 5050th is the last line
-  CDescriptionSection aFull;
-  std::string aMessage;
-  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }, &aMessage), CTLRX_ERR_DS_DECLARATION);
-  EXPECT_EQ(aMessage, "Sec");
-  // Struct members count too; a huge declared count is refused before any
-  // member array is sized by it.
-  tlrxWriteFile(keyPath(), aFields(5046) + "S = 3VD a b c\n");
-  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
-  tlrxWriteFile(keyPath(), "[Sec]\nS = 99999999999999999999VD a\n");
-  EXPECT_EQ(tlrxCodeOf([&] { aFull.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_DECLARATION);
-  EXPECT_EQ(fdfScratchBuffersInUse(), 0);
-}
-
-TEST_F(DescriptionTest, RedeclaringASectionReleasesItsOldFields) {
-  auto aSection = declare("[Sec]\na = I\nb = I\n");
-  tlrxWriteFile(keyPath(), "[Sec]\nc = S\n");
-  EXPECT_TRUE(aSection->declareFromKeyFile(keyPath().c_str(), "Sec"));
-  ASSERT_EQ(aSection->getFieldCount(), 1);
-  EXPECT_STREQ(aSection->getField(0)->getName(), "c");
-}
-
-// ----------------------------------------------------------- scratch pool
 
 TEST_F(DescriptionTest, ScratchPoolHas110SlotsAndReportsExhaustion) {
   std::vector<std::unique_ptr<CScratchBuffer>> aLeases;
-  for (int i = 0; i < CTLRX_DS_POOL_SLOTS; ++i) {
+  for (int i = 0; i < CTLRX_DS_POOL_SLOTS; ++i)
     aLeases.push_back(std::make_unique<CScratchBuffer>(16));
-  }
   EXPECT_EQ(fdfScratchBuffersInUse(), 110);
   std::string aMessage;
   EXPECT_EQ(tlrxCodeOf([] { CScratchBuffer aOne(16); }, &aMessage), CTLRX_ERR_DS_RANGE);
   EXPECT_EQ(aMessage, "All pools are busy");
-  tlrxWriteFile(keyPath(), "[Sec]\na = I\n");
-  CDescriptionSection aSection;
-  EXPECT_EQ(tlrxCodeOf([&] { aSection.declareFromKeyFile(keyPath().c_str(), "Sec"); }), CTLRX_ERR_DS_RANGE);
+  EXPECT_EQ(declareCode("[Sec]\na = I\n"), CTLRX_ERR_DS_RANGE);
   aLeases.pop_back();
-  EXPECT_TRUE(aSection.declareFromKeyFile(keyPath().c_str(), "Sec"));
+  EXPECT_EQ(declareCode("[Sec]\na = I\n"), 0);
   aLeases.clear();
   EXPECT_EQ(fdfScratchBuffersInUse(), 0);
   CScratchBuffer aBig(2000000);
   EXPECT_GE(aBig.capacity(), 2000000u);
 }
 
-// ------------------------------------------------------------ descriptions
-
 TEST_F(DescriptionTest, DottedKeysSplitAtTheFirstDot) {
   CDescription aDescription;
-  auto aSection = std::make_unique<CDescriptionSection>();
-  aSection->setName("A");
-  aSection->appendField(std::make_unique<CDescriptionField>("b.c", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER));
-  aSection->appendField(std::make_unique<CDescriptionField>("x", CTLRX_DS_SCALAR, CTLRX_DS_INTEGER));
-  aDescription.addSection(std::move(aSection));
-  auto aOther = std::make_unique<CDescriptionSection>();
-  aOther->setName("B");
-  aOther->appendField(std::make_unique<CDescriptionField>("x", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE));
-  aOther->appendField(std::make_unique<CDescriptionField>("y", CTLRX_DS_SCALAR, CTLRX_DS_DOUBLE));
-  aDescription.addSection(std::move(aOther));
-
-  EXPECT_EQ(aDescription.findField("A.b.c"), aDescription.getSection(0)->getField(0));
-  EXPECT_EQ(aDescription.findField("x"), aDescription.getSection(0)->getField(1)); // first section wins
-  EXPECT_EQ(aDescription.findField("B.x"), aDescription.getSection(1)->getField(0));
-  EXPECT_EQ(aDescription.findField("y"), aDescription.getSection(1)->getField(1));
-  EXPECT_EQ(aDescription.findField("A.y"), nullptr); // only the named section
-  EXPECT_EQ(aDescription.findField("C.x"), nullptr);
-  EXPECT_EQ(aDescription.findField(".x"), nullptr);
-  EXPECT_EQ(aDescription.findField("b.c"), nullptr);
-  EXPECT_EQ(aDescription.findSection("B"), aDescription.getSection(1));
+  tlrxDeclare(aDescription, mDir.path(), "[A]\nb.c = I\nx = I\n", {"A"});
+  tlrxDeclare(aDescription, mDir.path(), "[B]\nx = D\ny = D\n", {"B"});
+  const CDescriptionSection &aA = *aDescription.getSection(0), &aB = *aDescription.getSection(1);
+  EXPECT_EQ(aDescription.findField("A.b.c"), aA.getField(0));
+  EXPECT_EQ(aDescription.findField("x"), aA.getField(1)); // first section wins
+  EXPECT_EQ(aDescription.findField("B.x"), aB.getField(0));
+  EXPECT_EQ(aDescription.findField("y"), aB.getField(1));
+  for (const char *aKey : {"A.y", "C.x", ".x", "b.c"}) // only the named section
+    EXPECT_EQ(aDescription.findField(aKey), nullptr) << aKey;
+  EXPECT_EQ(aDescription.findSection("B"), &aB);
   EXPECT_EQ(aDescription.findSection("b"), nullptr);
   std::string aMessage;
   EXPECT_EQ(tlrxCodeOf([&] { aDescription.getField("A.missing"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "A.missing");
   // A declared field without a value is missing for the value accessor only.
-  EXPECT_NO_THROW(aDescription.getField("B.y"));
+  EXPECT_EQ(tlrxCodeOf([&] { aDescription.getField("B.y"); }), 0);
   EXPECT_EQ(tlrxCodeOf([&] { aDescription.getFieldWithValue("B.y"); }, &aMessage), CTLRX_ERR_DS_FIELD_MISSING);
   EXPECT_EQ(aMessage, "B.y");
   aDescription.getField("B.y").setDouble(1.0);
   EXPECT_EQ(aDescription.getFieldWithValue("B.y").getDouble(), 1.0);
 }
 
-TEST_F(DescriptionTest, CopyBetweenRasterInfoSectionsKeepsTheTargetScaleFactors) {
+TEST_F(DescriptionTest, CopyKeepsTheTargetScaleFactorsAndNeedsTheSameNameAndLayout) {
   CDescription aSource({"RasterInfo", "Processing"});
   CDescription aTarget({"RasterInfo"});
   aSource.getField("RasterInfo.NrOfLinesPerImage").setInteger(100);
@@ -590,7 +450,6 @@ TEST_F(DescriptionTest, CopyBetweenRasterInfoSectionsKeepsTheTargetScaleFactors)
   aSource.getField("Processing.PixelSpacingRg").setDouble(7.9);
   aTarget.getField("RasterInfo.RealScaleFactor").setDouble(0.5);
   aTarget.getField("RasterInfo.DataUnits").setString("POWER");
-
   EXPECT_TRUE(aTarget.copyFrom(aSource, false));
   EXPECT_EQ(aTarget.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 100);
   EXPECT_STREQ(aTarget.getField("RasterInfo.CellType").getString(), "FLOAT");
@@ -598,14 +457,11 @@ TEST_F(DescriptionTest, CopyBetweenRasterInfoSectionsKeepsTheTargetScaleFactors)
   EXPECT_FALSE(aTarget.getField("RasterInfo.ImaginaryScaleFactor").holdsValue());
   EXPECT_STREQ(aTarget.getField("RasterInfo.DataUnits").getString(), "POWER"); // not held by the source
   EXPECT_EQ(aTarget.findSection("Processing"), nullptr);
-
   aTarget = aSource; // clears first
   EXPECT_FALSE(aTarget.getField("RasterInfo.DataUnits").holdsValue());
   EXPECT_FALSE(aTarget.getField("RasterInfo.RealScaleFactor").holdsValue());
   EXPECT_EQ(aTarget.getField("RasterInfo.NrOfLinesPerImage").getInteger(), 100);
-}
-
-TEST_F(DescriptionTest, CopyOfSectionsOfAnotherNameOrLayoutFails) {
+  // Sections of another name or layout are not copied.
   auto aSmall = declare("[RasterInfo]\nNrOfLinesPerImage = I\n", "RasterInfo");
   CDescriptionSection aFull("RasterInfo");
   aSmall->getField(0)->setInteger(3);
@@ -616,37 +472,17 @@ TEST_F(DescriptionTest, CopyOfSectionsOfAnotherNameOrLayoutFails) {
   EXPECT_FALSE(aSameLayout->copyValuesFrom(*aOtherName));
   EXPECT_TRUE(aSameLayout->copyValuesFrom(*aSmall));
   EXPECT_EQ(aSameLayout->getField(0)->getInteger(), 3);
-
-  CDescription aTarget({"RasterInfo"});
-  CDescription aSource;
-  auto aSection = std::make_unique<CDescriptionSection>();
-  aSection->setName("RasterInfo");
-  aSource.addSection(std::move(aSection));
-  EXPECT_FALSE(aTarget.copyFrom(aSource, true));
-  EXPECT_EQ(tlrxCodeOf([&] { aTarget = aSource; }), CTLRX_ERR_DS_DECLARATION);
+  CDescription aNoFields;
+  aNoFields.addSection(std::make_unique<CDescriptionSection>())->setName("RasterInfo");
+  EXPECT_FALSE(aTarget.copyFrom(aNoFields, true));
+  EXPECT_EQ(tlrxCodeOf([&] { aTarget = aNoFields; }), CTLRX_ERR_DS_DECLARATION);
   // Same layout, another value type at one position: the assignment raises.
   auto aTyped = declare("[RasterInfo]\nNrOfLinesPerImage = D\n", "RasterInfo");
   aTyped->getField(0)->setDouble(1.0);
   EXPECT_EQ(tlrxCodeOf([&] { aSameLayout->copyValuesFrom(*aTyped); }), CTLRX_ERR_DS_TYPE);
 }
 
-TEST_F(DescriptionTest, PrintListsSectionsAndFields) {
-  auto aSection = declare("[Sec]\na = I\nb = S\n");
-  aSection->getField(0)->setInteger(4);
-  CDescription aDescription;
-  aDescription.addSection(std::move(aSection));
-  EXPECT_EQ(aDescription.printText(true), "\n\n << Total number of Sections : 1 >>"
-                                          "\n\n << [Sec]  -  Total number of Fields : 2 >>\n\n"
-                                          "[a]  [SCALAR]  [Integer]  =  4\n"
-                                          "[b]  [SCALAR]  [String] : EMPTY\n"
-                                          "\n\n");
-  EXPECT_EQ(aDescription.getSection(0)->printText(false),
-            "\n\n << [Sec]  -  Total number of Fields : 2 >>\n\n[a]  [SCALAR]  [Integer]  =  4\n");
-}
-
-// --------------------------------------------------------- mandatory files
-
-TEST_F(DescriptionTest, MandatoryCheckLogsEveryEmptyListedField) {
+TEST_F(DescriptionTest, MandatoryCheckLogsEveryEmptyListedFieldOfTheFirstFailingSection) {
   CDescription aHeader({"RasterInfo", "Processing"});
   aHeader.getField("RasterInfo.NrOfLinesPerImage").setInteger(10);
   const std::string aMandatory = mDir.file("check.mandatory");
@@ -657,29 +493,96 @@ TEST_F(DescriptionTest, MandatoryCheckLogsEveryEmptyListedField) {
   EXPECT_NE(aLog.find("Mandatory Field [NrOfPixelsPerLine] is not found in [RasterInfo] section\n"), std::string::npos);
   EXPECT_NE(aLog.find("Mandatory Field [CellType] is not found in [RasterInfo] section\n"), std::string::npos);
   EXPECT_EQ(aLog.find("NotDeclaredHere"), std::string::npos);
-  EXPECT_EQ(aLog.find("[PixelSpacingRg]"), std::string::npos); // stops at the first failing section
+  EXPECT_EQ(aLog.find("[PixelSpacingRg]"), std::string::npos);
   std::string aMessage;
   EXPECT_EQ(tlrxCodeOf([&] { aHeader.checkMandatory(aMandatory.c_str(), true); }, &aMessage), CTLRX_ERR_DS_CHECK);
   EXPECT_EQ(aMessage, aMandatory);
-
   aHeader.getField("RasterInfo.NrOfPixelsPerLine").setInteger(10);
   aHeader.getField("RasterInfo.CellType").setString("FLOAT");
   EXPECT_FALSE(aHeader.checkMandatory(aMandatory.c_str(), false)); // Processing now
   aHeader.getField("Processing.PixelSpacingRg").setDouble(1.0);
   EXPECT_TRUE(aHeader.checkMandatory(aMandatory.c_str(), true));
+  // A bare name comes from the mandatory folder; without the file nothing can be verified.
+  CDescription aStandard;
+  fdfDeclareStandardHeader(aStandard);
+  EXPECT_FALSE(aStandard.checkMandatory("StandardHeader", false));
+  aStandard.getField("RasterInfo.NrOfLinesPerImage").setInteger(1);
+  aStandard.getField("RasterInfo.NrOfPixelsPerLine").setInteger(1);
+  aStandard.getField("RasterInfo.CellType").setString("FLOAT");
+  EXPECT_TRUE(aStandard.checkMandatory("StandardHeader", false));
+  EXPECT_FALSE(aStandard.checkMandatory("GeocodedHeader", false));
+  EXPECT_FALSE(aStandard.checkMandatory("NoSuchList", false));
+  EXPECT_EQ(tlrxCodeOf([&] { aStandard.checkMandatory("NoSuchList", true); }), CTLRX_ERR_DS_CHECK);
+  EXPECT_EQ(fdfScratchBuffersInUse(), 0);
 }
 
-TEST_F(DescriptionTest, MandatoryFileByNameComesFromTheMandatoryDirectory) {
+TEST_F(DescriptionTest, HeaderNumberAccessorsReadWholeNumbersAndNameTheFieldOfAnyOther) {
   CDescription aHeader;
-  fdfDeclareStandardHeader(aHeader);
-  EXPECT_FALSE(aHeader.checkMandatory("StandardHeader", false));
-  aHeader.getField("RasterInfo.NrOfLinesPerImage").setInteger(1);
-  aHeader.getField("RasterInfo.NrOfPixelsPerLine").setInteger(1);
-  aHeader.getField("RasterInfo.CellType").setString("FLOAT");
-  EXPECT_TRUE(aHeader.checkMandatory("StandardHeader", false));
-  EXPECT_FALSE(aHeader.checkMandatory("GeocodedHeader", false));
-  // Nothing can be verified without the file.
-  EXPECT_FALSE(aHeader.checkMandatory("NoSuchList", false));
-  EXPECT_EQ(tlrxCodeOf([&] { aHeader.checkMandatory("NoSuchList", true); }), CTLRX_ERR_DS_CHECK);
-  EXPECT_EQ(fdfScratchBuffersInUse(), 0);
+  tlrxDeclare(aHeader, mDir.path(), "[RasterInfo]\nLines = I\nNullCellValue = D\nText = S\nVec = VD\n", {"RasterInfo"});
+  auto aStore = [&aHeader](const SNumberCase &theCase) {
+    aHeader.clearValues();
+    CDescriptionField *aField = aHeader.findField(theCase.mKey);
+    if (aField == nullptr || theCase.mText == nullptr)
+      return;
+    if (aField->getShape() != CTLRX_DS_SCALAR)
+      aField->setNumberOfElements(1);
+    if (aField->getValueType() == CTLRX_DS_STRING)
+      aField->setString(theCase.mText);
+    else
+      fdfSetNumberFromText(*aField, 0, 0, theCase.mText);
+  };
+  const double aInf = std::numeric_limits<double>::infinity();
+  const SNumberCase aCases[] = {
+      {"RasterInfo.Lines", "7", EAccessor::kInteger, 7, nullptr},
+      {"RasterInfo.Text", " -12", EAccessor::kInteger, -12, nullptr},
+      {"RasterInfo.Text", "7abc", EAccessor::kInteger, 0, "RasterInfo.Text is not an integer [7abc]"},
+      {"RasterInfo.Text", "7.9", EAccessor::kInteger, 0, "RasterInfo.Text is not an integer [7.9]"},
+      {"RasterInfo.Text", "4294967303", EAccessor::kInteger, 0, "RasterInfo.Text is not an integer [4294967303]"},
+      {"RasterInfo.NullCellValue", "7", EAccessor::kInteger, 7, nullptr},
+      {"RasterInfo.NullCellValue", "7.5", EAccessor::kInteger, 0, "RasterInfo.NullCellValue is not an integer [7.5]"},
+      {"RasterInfo.NullCellValue", "1e10", EAccessor::kInteger, 0,
+       "RasterInfo.NullCellValue is not an integer [10000000000]"},
+      {"RasterInfo.Lines", nullptr, EAccessor::kInteger, 0, "RasterInfo.Lines holds no value"},
+      {"RasterInfo.Undeclared", nullptr, EAccessor::kInteger, 0, "RasterInfo.Undeclared holds no value"},
+      {"RasterInfo.Vec", "1", EAccessor::kReal, 0, "RasterInfo.Vec is not a single value"},
+      {"RasterInfo.Lines", nullptr, EAccessor::kIntegerOr, -1, nullptr},
+      {"RasterInfo.Text", "2x", EAccessor::kIntegerOr, 0, "RasterInfo.Text is not an integer [2x]"},
+      {"RasterInfo.Lines", "900000", EAccessor::kSize, 900000, nullptr},
+      {"RasterInfo.Lines", "0", EAccessor::kSize, 0, "RasterInfo.Lines is not in 1 to 900000 [0]"},
+      {"RasterInfo.Text", "900001", EAccessor::kSize, 0, "RasterInfo.Text is not in 1 to 900000 [900001]"},
+      {"RasterInfo.Lines", "3", EAccessor::kReal, 3, nullptr},
+      {"RasterInfo.Text", "-NaN", EAccessor::kReal, sNaN, nullptr},
+      {"RasterInfo.Text", "nan(0x7)", EAccessor::kReal, sNaN, nullptr},
+      {"RasterInfo.Text", "2.5e3", EAccessor::kReal, 2500, nullptr},
+      {"RasterInfo.Text", "2.5 m", EAccessor::kReal, 0, "RasterInfo.Text is not a number [2.5 m]"},
+      {"RasterInfo.Text", "1e999", EAccessor::kReal, 0, "RasterInfo.Text is not a number [1e999]"},
+      {"RasterInfo.Text", "inf", EAccessor::kReal, aInf, nullptr},
+      {"RasterInfo.Text", "inf", EAccessor::kFinite, 0, "RasterInfo.Text is not a finite number [inf]"},
+      {"RasterInfo.NullCellValue", "NaN", EAccessor::kFinite, 0,
+       "RasterInfo.NullCellValue is not a finite number [nan]"},
+      {"RasterInfo.NullCellValue", "-2.5", EAccessor::kFinite, -2.5, nullptr},
+      {"RasterInfo.NullCellValue", nullptr, EAccessor::kRealOr, -1, nullptr},
+      {"RasterInfo.NullCellValue", nullptr, EAccessor::kNull, 0, nullptr},
+      {"RasterInfo.NullCellValue", "NaN", EAccessor::kNull, sNaN, nullptr},
+      {"RasterInfo.NullCellValue", "-9999", EAccessor::kNull, -9999, nullptr},
+  };
+  for (const SNumberCase &aCase : aCases) {
+    SCOPED_TRACE(std::string(aCase.mKey) + " [" + (aCase.mText != nullptr ? aCase.mText : "unset") + "] accessor " +
+                 std::to_string(static_cast<int>(aCase.mAccessor)));
+    aStore(aCase);
+    double aValue = 0.0;
+    std::string aMessage;
+    const int32_t aCode = tlrxCodeOf([&] { aValue = read(aHeader, aCase); }, &aMessage);
+    EXPECT_EQ(aCode, aCase.mError == nullptr ? 0 : CTLRX_ERR_DS_FIELD_MISSING) << aMessage;
+    if (aCase.mError == nullptr)
+      EXPECT_TRUE(tlrxSameDouble(aValue, aCase.mValue)) << aValue;
+    else
+      EXPECT_EQ(aMessage, aCase.mError);
+  }
+  // A reader raises its own code, its file first.
+  const SNumberCase aCase = {"RasterInfo.Text", "12 pixels", EAccessor::kSize, 0, nullptr};
+  aStore(aCase);
+  std::string aMessage;
+  EXPECT_EQ(tlrxCodeOf([&] { read(aHeader, aCase, {261121, "out.hdr"}); }, &aMessage), 261121);
+  EXPECT_EQ(aMessage, "out.hdr: RasterInfo.Text is not an integer [12 pixels]");
 }
