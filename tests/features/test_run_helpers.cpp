@@ -1,6 +1,5 @@
-// Helpers of the commands: the orders of dated inputs (the temporal command
-// compares day numbers only, min and max the seconds of equal days too) and
-// the setters of result headers.
+// Helpers of the commands: the orders of dated inputs and the setters of
+// result headers.
 #include "tlrx_acquisition_dates.h"
 #include "tlrx_description_test_support.h"
 #include "tlrx_features_common.h"
@@ -8,17 +7,6 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-
-namespace {
-
-STLRXDate date(long theDay, double theSeconds) {
-  STLRXDate aDate;
-  aDate.mDay = theDay;
-  aDate.mSeconds = theSeconds;
-  return aDate;
-}
-
-} // namespace
 
 // Guards the temporal command's order: it once shared the min-and-max order,
 // which moves an afternoon image before a morning one of the same day.
@@ -31,7 +19,7 @@ TEST(AcquisitionDates, ExchangeSortComparesDaysOrDaysThenSeconds) {
       {ETLRXDateOrder::kDayThenSeconds, {"d1_am", "d1_pm", "d2", "d5"}},
   };
   for (const auto &aCase : aCases) {
-    std::vector<STLRXDate> aDates = {date(5, 0), date(1, 50000), date(2, 10), date(1, 100)};
+    std::vector<STLRXDate> aDates = {{5, 0}, {1, 50000}, {2, 10}, {1, 100}}; // day, seconds
     std::vector<std::string> aNames = {"d5", "d1_pm", "d2", "d1_am"};
     fdfSortByDate(aDates, aNames, aCase.mOrder);
     EXPECT_EQ(aNames, aCase.mExpected);

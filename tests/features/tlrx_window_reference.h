@@ -1,14 +1,11 @@
 // Slow, obviously right references for the window measures: every window is
-// summed directly, in double precision, from the image in memory. Plus
-// seeded speckle generators for the statistical tests.
+// summed directly, in double precision, from the image in memory.
 #pragma once
 
 #include <algorithm>
 #include <cmath>
-#include <complex>
 #include <cstdint>
 #include <functional>
-#include <limits>
 #include <random>
 #include <vector>
 
@@ -24,24 +21,19 @@ struct STestImage {
   }
 };
 
-// Window of output (l, j): lines l + R/2 - R + 1 .. l + R/2 and columns
-// j - K/2 .. j + K/2, both clipped to the image. theVisit(line, pixel) is
-// called for every pixel of it.
+// theVisit(line, pixel) for every pixel of the window of output (l, j): lines
+// l + R/2 - R + 1 .. l + R/2 and columns j - K/2 .. j + K/2, clipped.
 inline void refForWindow(int theLines, int thePixels, int theRows, int theCols, int theLine, int thePixel,
                          const std::function<void(int, int)> &theVisit) {
-  const int aFirst = std::max(0, theLine + theRows / 2 - theRows + 1);
-  const int aLast = std::min(theLines - 1, theLine + theRows / 2);
-  const int aLeft = std::max(0, thePixel - theCols / 2);
-  const int aRight = std::min(thePixels - 1, thePixel + theCols / 2);
-  for (int y = aFirst; y <= aLast; ++y)
-    for (int x = aLeft; x <= aRight; ++x)
+  for (int y = std::max(0, theLine + theRows / 2 - theRows + 1); y <= std::min(theLines - 1, theLine + theRows / 2);
+       ++y)
+    for (int x = std::max(0, thePixel - theCols / 2); x <= std::min(thePixels - 1, thePixel + theCols / 2); ++x)
       theVisit(y, x);
 }
 
-// Exact window of output (l, j): lines l - R/2 .. l - R/2 + R - 1 and columns
-// j - K/2 .. j - K/2 + K - 1. False for a border pixel (within R/2 lines or
-// K/2 columns of an edge), whose output is the null value; otherwise
-// theVisit(line, pixel) for every pixel of the window.
+// The same for the exact window: lines l - R/2 .. l - R/2 + R - 1, columns
+// j - K/2 .. j - K/2 + K - 1; false for a border pixel (within R/2 lines or
+// K/2 columns of an edge), whose output is the null value.
 inline bool refForExactWindow(int theLines, int thePixels, int theRows, int theCols, int theLine, int thePixel,
                               const std::function<void(int, int)> &theVisit) {
   const int aHalfRows = theRows / 2, aHalfCols = theCols / 2;
@@ -58,28 +50,19 @@ inline bool refForExactWindow(int theLines, int thePixels, int theRows, int theC
 inline std::vector<double> refTexture(const STestImage &theImage, bool thePower, int theRows, int theCols,
                                       double theNull) {
   std::vector<double> aOut;
-  auto aAmplitude = [&](int y, int x) {
-    return thePower ? std::sqrt(std::fabs(theImage.at(y, x))) : theImage.at(y, x);
-  };
   for (int l = 0; l < theImage.mLines; ++l)
     for (int j = 0; j < theImage.mPixels; ++j) {
       std::vector<double> aSample;
       refForWindow(theImage.mLines, theImage.mPixels, theRows, theCols, l, j, [&](int y, int x) {
         if (theImage.valid(y, x))
-          aSample.push_back(aAmplitude(y, x));
+          aSample.push_back(thePower ? std::sqrt(std::fabs(theImage.at(y, x))) : theImage.at(y, x));
       });
-      double aSum = 0;
+      double aMean = 0, aSquares = 0;
       for (double v : aSample)
-        aSum += v;
-      if (!theImage.valid(l, j) || aSample.empty() || !(aSum > 0)) {
-        aOut.push_back(theNull);
-        continue;
-      }
-      const double aMean = aSum / aSample.size();
-      double aSquares = 0;
+        aMean += v / aSample.size();
       for (double v : aSample)
-        aSquares += (v - aMean) * (v - aMean);
-      aOut.push_back(std::sqrt(aSquares / aSample.size()) / aMean);
+        aSquares += (v - aMean) * (v - aMean) / aSample.size();
+      aOut.push_back(theImage.valid(l, j) && !aSample.empty() && aMean > 0 ? std::sqrt(aSquares) / aMean : theNull);
     }
   return aOut;
 }
@@ -95,14 +78,10 @@ inline std::vector<double> refNormalize(const STestImage &theA, bool thePowerA, 
       double aSumA = 0, aSumB = 0;
       int aCountA = 0, aCountB = 0;
       refForWindow(theA.mLines, theA.mPixels, theRows, theCols, l, j, [&](int y, int x) {
-        if (theA.valid(y, x)) {
-          aSumA += refIntensity(theA.at(y, x), thePowerA);
-          ++aCountA;
-        }
-        if (theB.valid(y, x)) {
-          aSumB += refIntensity(theB.at(y, x), thePowerB);
-          ++aCountB;
-        }
+        aSumA += theA.valid(y, x) ? refIntensity(theA.at(y, x), thePowerA) : 0.0;
+        aCountA += theA.valid(y, x) ? 1 : 0;
+        aSumB += theB.valid(y, x) ? refIntensity(theB.at(y, x), thePowerB) : 0.0;
+        aCountB += theB.valid(y, x) ? 1 : 0;
       });
       const bool aDefined = theA.valid(l, j) && theB.valid(l, j) && aCountA > 0 && aCountB > 0;
       aOut.push_back(aDefined ? (aSumA / aCountA + aSumB / aCountB) / 2 : theNull);
@@ -131,34 +110,32 @@ inline std::vector<double> refCoherence(const STestImage &theA, bool thePowerA, 
         aAA += aX1 * aX1;
         aBB += aX2 * aX2;
       });
-      if (!aCounts(l, j) || !(aAA * aBB > 0)) {
-        aOut.push_back(theNull);
-        continue;
-      }
       const double aR = aX / std::sqrt(aAA * aBB);
-      aOut.push_back(aR > 0.5 ? std::sqrt(2 * aR - 1) : 0.0);
+      aOut.push_back(!aCounts(l, j) || !(aAA * aBB > 0) ? theNull : aR > 0.5 ? std::sqrt(2 * aR - 1) : 0.0);
     }
   return aOut;
 }
 
-// Seeded random pairs of single-look intensities of coherence theGamma, from
-// circular Gaussian fields s2 = gamma s1 + sqrt(1 - gamma^2) n.
-class CTestSpeckle {
-public:
-  explicit CTestSpeckle(uint64_t theSeed) : mEngine(theSeed) {}
-  std::complex<double> circular() {
-    std::normal_distribution<double> aNormal(0.0, std::sqrt(0.5));
-    const double aRe = aNormal(mEngine);
-    return {aRe, aNormal(mEngine)};
-  }
-  // Intensities of a pair of single-look pixels with coherence theGamma.
-  void pair(double theGamma, double &theI1, double &theI2) {
-    const std::complex<double> aS1 = circular();
-    const std::complex<double> aS2 = theGamma * aS1 + std::sqrt(1 - theGamma * theGamma) * circular();
-    theI1 = std::norm(aS1);
-    theI2 = std::norm(aS2);
-  }
+// A theLines x thePixels image of theValue, every pixel valid.
+inline STestImage constantImage(int theLines, int thePixels, double theValue) {
+  STestImage aImage{theLines, thePixels, std::vector<double>(static_cast<size_t>(theLines) * thePixels, theValue), {}};
+  aImage.mValid.assign(aImage.mValues.size(), 1);
+  return aImage;
+}
 
-private:
-  std::mt19937_64 mEngine;
-};
+// Seeded uniform values in [theLow, theHigh), no data at theNoData.
+inline STestImage randomImage(int theLines, int thePixels, uint64_t theSeed, double theLow, double theHigh,
+                              const std::vector<int> &theNoData) {
+  STestImage aImage = constantImage(theLines, thePixels, 0.0);
+  std::mt19937_64 aEngine(theSeed);
+  std::uniform_real_distribution<double> aValue(theLow, theHigh);
+  for (double &aCell : aImage.mValues)
+    aCell = aValue(aEngine);
+  for (int aIndex : theNoData)
+    aImage.mValid[aIndex] = 0;
+  return aImage;
+}
+
+// No-data pixels of a 7 x 9 image: corners, edges, the first pixel of
+// several lines and inside.
+inline std::vector<int> sevenByNineNoData() { return {0, 8, 9, 18, 22, 31, 32, 40, 54, 62}; }

@@ -2,10 +2,7 @@
 // written into a temporary folder.
 #pragma once
 
-#include "tlrx_enviroment.h"
-#include "tlrx_errors.h"
 #include "tlrx_command_test_support.h"
-#include "tlrx_test_support.h"
 #include "tlrx_window_reference.h"
 
 #include <gtest/gtest.h>
@@ -20,13 +17,7 @@ protected:
   // as they are, to test non-finite input).
   void write(const std::string &theName, const STestImage &theImage, const std::string &theUnits,
              double theNull = -1.0, const std::string &theTime = "") const {
-    STLRXTestRaster aRaster;
-    aRaster.mLines = theImage.mLines;
-    aRaster.mPixels = theImage.mPixels;
-    aRaster.mDataUnits = theUnits;
-    aRaster.mHasNull = true;
-    aRaster.mNull = theNull;
-    aRaster.mAcquisitionTime = theTime;
+    STLRXTestRaster aRaster{theImage.mLines, theImage.mPixels, {}, "FLOAT", theUnits, true, theNull, theTime};
     for (size_t i = 0; i < theImage.mValues.size(); ++i)
       aRaster.mValues.push_back(theImage.mValid[i] != 0 ? theImage.mValues[i] : theNull);
     tlrxWriteTestRaster(file(theName), aRaster);
@@ -42,17 +33,13 @@ protected:
     aArgv.push_back(nullptr);
     return theStep(static_cast<int>(aStrings.size()), aArgv.data());
   }
-};
 
-// A constant image of theLines x thePixels.
-inline STestImage constantImage(int theLines, int thePixels, double theValue) {
-  STestImage aImage;
-  aImage.mLines = theLines;
-  aImage.mPixels = thePixels;
-  aImage.mValues.assign(static_cast<size_t>(theLines) * thePixels, theValue);
-  aImage.mValid.assign(aImage.mValues.size(), 1);
-  return aImage;
-}
+  // The code a step program raises with theArgs, its message into theMessage.
+  static int32_t raised(int (*theStep)(int, char **), const std::vector<std::string> &theArgs,
+                        std::string *theMessage = nullptr) {
+    return tlrxRaisedCode([&] { run(theStep, theArgs); }, theMessage);
+  }
+};
 
 // Compares a result with a reference: no-data positions exactly, values to a
 // relative float tolerance.

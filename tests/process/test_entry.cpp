@@ -1,16 +1,9 @@
 // The built program run as a host runs it: exit status, log, trace, working
 // file and error file.
 #include "tlrx_command_test_support.h"
-#include "tlrx_test_support.h"
 
-#include <gtest/gtest.h>
-
-#include <algorithm>
-#include <csignal>
 #include <filesystem>
 #include <set>
-#include <sys/stat.h>
-#include <unistd.h>
 
 namespace {
 
@@ -20,29 +13,22 @@ protected:
   void SetUp() override { tlrxWriteFile(workingFile(), "12\nhost status line\n"); }
   std::string workingFile() const { return mDir.file("Process.working"); }
   std::string log() const { return tlrxReadFile(mDir.file("Process.log")); }
+  std::string error() const { return tlrxReadFile(workingFile() + "_error"); }
   // A configuration of our own in the temporary folder.
   std::map<std::string, std::string> withConfiguration(const std::map<int, std::string> &theLines, int theCount = 14) {
     tlrxWriteConfiguration(mDir.path(), theLines, theCount);
     return {{"TELLURIX_INIT_DIR", mDir.path()}};
   }
-  // A simulated series in the folder and the argument file of a ratio over
-  // it; returns the command line.
-  std::string ratioOverSeries(int theCount, int theSize, const std::string &theTiff) {
-    const STLRXRun aSim = tlrxRun("tlrx_simulate",
-                                  {"series", "--out", mDir.file("s"), "--count", std::to_string(theCount), "--lines",
-                                   std::to_string(theSize), "--pixels", std::to_string(theSize), "--scene", "flat"},
-                                  mDir.path());
-    EXPECT_EQ(aSim.mExitStatus, 0) << aSim.mOutput;
-    tlrxWriteFile(mDir.file("args.txt"), "ratio\n" + mDir.file("s_list.txt") + "\n" + mDir.file("ratio") +
-                                             "\n0\nunused\n" + theTiff + "\n0.3\n");
-    return "main_ratio#" + mDir.file("args.txt");
-  }
-  // The progress in the working file, -1 while it cannot be read as one.
-  int progress() const {
-    const std::vector<std::string> aLines = tlrxReadLines(workingFile());
-    return aLines.size() >= 2 && !aLines[0].empty() ? std::atoi(aLines[0].c_str()) : -1;
-  }
 };
+
+// The first lines of thePath are theLines ("*" for any).
+void expectLines(const std::string &thePath, const std::vector<std::string> &theLines) {
+  const std::vector<std::string> aLines = tlrxReadLines(thePath);
+  ASSERT_GE(aLines.size(), theLines.size()) << thePath;
+  for (size_t i = 0; i < theLines.size(); ++i)
+    if (theLines[i] != "*")
+      EXPECT_EQ(aLines[i], theLines[i]) << thePath << " line " << i;
+}
 
 std::set<std::string> namesIn(const std::string &theDir) {
   std::set<std::string> aNames;
@@ -51,269 +37,140 @@ std::set<std::string> namesIn(const std::string &theDir) {
   return aNames;
 }
 
-bool contains(const std::string &theText, const std::string &thePart) {
-  return theText.find(thePart) != std::string::npos;
-}
-
 } // namespace
 
-TEST_F(EntryTest, UnknownCommandReportsEverywhere) {
-  const STLRXRun aRun = tlrxRunMain("main_principal_component_analysis#x", mDir.path());
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  const std::vector<std::string> aError = tlrxReadLines(workingFile() + "_error");
-  ASSERT_GE(aError.size(), 3u);
-  EXPECT_EQ(aError[0], "-1");
-  EXPECT_EQ(aError[1], "COMMAND PARAMETER ERROR");
-  EXPECT_EQ(aError[2], "Unknown command [EC :456963]");
-  const std::vector<std::string> aWorking = tlrxReadLines(workingFile());
-  ASSERT_GE(aWorking.size(), 4u);
-  EXPECT_EQ(aWorking[0], "-1");
-  EXPECT_EQ(aWorking[1], "host status line");
-  EXPECT_EQ(aWorking[3], "Unknown command [EC :456963]");
+TEST_F(EntryTest, UnknownCommandReportsEverywhereWhateverTheTrailerStreamsAndFolders) {
+  EXPECT_EQ(tlrxRunMain("main_principal_component_analysis#x", mDir.path()).mExitStatus, 8);
+  expectLines(workingFile() + "_error", {"-1", "COMMAND PARAMETER ERROR", "Unknown command [EC :456963]"});
+  expectLines(workingFile(), {"-1", "host status line", "*", "Unknown command [EC :456963]"});
   const std::string aLog = log();
-  EXPECT_TRUE(contains(aLog, "[ERROR ID : 456963]\n  COMMAND PARAMETER ERROR [Unknown command]\n   \n\n"));
-  EXPECT_TRUE(contains(aLog, "\nERROR :\n   \n\n"));
-  EXPECT_TRUE(contains(aLog, "\nEND : Tellurix Feature Extraction"));
+  EXPECT_TRUE(tlrxContains(aLog, "[ERROR ID : 456963]\n  COMMAND PARAMETER ERROR [Unknown command]\n   \n\n"));
+  EXPECT_TRUE(tlrxContains(aLog, "\nERROR :\n   \n\n"));
+  EXPECT_TRUE(tlrxContains(aLog, "\nEND : Tellurix Feature Extraction"));
   EXPECT_FALSE(tlrxFileExists(mDir.file("Process.trace")));
-}
-
-TEST_F(EntryTest, PrefixIsCaseSensitiveAndNeedsItsHash) {
-  const STLRXRun aUpper = tlrxRunMain("MAIN_RATIO#abc", mDir.path());
-  EXPECT_EQ(aUpper.mExitStatus, 8) << aUpper.mOutput;
-  EXPECT_EQ(tlrxRunMain("main_ratio", mDir.path()).mExitStatus, 8);
-  EXPECT_EQ(tlrxRunMain("", mDir.path()).mExitStatus, 8);
-}
-
-TEST_F(EntryTest, TrailerIsCutBeforeMatchingAndTraced) {
+  // A trailer is cut before matching; the arguments are joined; both traced.
   const auto aEnv = withConfiguration({{12, "ACTIVE"}});
-  const STLRXRun aRun =
-      tlrxRunMain("main_principal_component_analysis#x###Tellurix###main_ratio#y", mDir.path(), aEnv);
-  EXPECT_EQ(aRun.mExitStatus, 8);
+  EXPECT_EQ(tlrxRunMain("main_principal_component_analysis#x###Tellurix###main_ratio#y", mDir.path(), aEnv).mExitStatus,
+            8);
   const std::string aTrace = tlrxReadFile(mDir.file("Process.trace"));
-  EXPECT_TRUE(contains(aTrace, "\nlpCmdLine =main_principal_component_analysis#x\n"));
-  EXPECT_TRUE(contains(aTrace, "aCommand =5\n"));
-  EXPECT_TRUE(contains(aTrace, "LINE=100"));
+  EXPECT_TRUE(tlrxContains(aTrace, "\nlpCmdLine =main_principal_component_analysis#x\n"));
+  EXPECT_TRUE(tlrxContains(aTrace, "aCommand =5\n"));
+  EXPECT_TRUE(tlrxContains(aTrace, "LINE=100"));
   // An error run keeps a dated copy of the trace.
-  const STLRXRun aList = tlrxRun("/bin/sh", {"-c", "ls Process_*_trace.txt"}, mDir.path());
-  EXPECT_EQ(aList.mExitStatus, 0);
-}
-
-TEST_F(EntryTest, ArgumentsAreJoinedIntoOneCommandLine) {
-  const auto aEnv = withConfiguration({{12, "ACTIVE"}});
+  EXPECT_EQ(tlrxRun("/bin/sh", {"-c", "ls Process_*_trace.txt"}, mDir.path()).mExitStatus, 0);
   tlrxRun("main_features_extraction", {"main_texture#a", "b"}, mDir.path(), aEnv);
-  EXPECT_TRUE(contains(tlrxReadFile(mDir.file("Process.trace")), "lpCmdLine =main_texture#a b\n"));
+  EXPECT_TRUE(tlrxContains(tlrxReadFile(mDir.file("Process.trace")), "lpCmdLine =main_texture#a b\n"));
+  // Closed standard streams do not capture the files.
+  std::remove(mDir.file("Process.log").c_str());
+  std::remove((workingFile() + "_error").c_str());
+  const std::string aClosed = "exec 0<&- 1>&- 2>&-; TELLURIX_WORKING_DIR=" + mDir.path() + " TELLURIX_BATCH_DIR=" +
+                              mDir.path() + " " + tlrxBinPath("main_features_extraction") + " x";
+  EXPECT_EQ(tlrxRun("/bin/sh", {"-c", aClosed}, mDir.path()).mExitStatus, 8);
+  EXPECT_TRUE(tlrxContains(log(), "[ERROR ID : 456963]"));
+  EXPECT_TRUE(tlrxNamesCode(error(), 456963));
+  // The batch folder and the working file's name come from the environment.
+  CTempDir aBatch;
+  tlrxWriteFile(aBatch.file("job.work"), "0\nhost\n");
+  std::remove(mDir.file("Process.log").c_str());
+  const std::map<std::string, std::string> aJob = {{"TELLURIX_BATCH_DIR", aBatch.path()},
+                                                    {"TELLURIX_WORKING_FILE", "job.work"}};
+  EXPECT_EQ(tlrxRunMain("bad", mDir.path(), aJob).mExitStatus, 8);
+  EXPECT_TRUE(tlrxNamesCode(tlrxReadFile(aBatch.file("job.work_error")), 456963));
+  expectLines(aBatch.file("job.work"), {"-1"});
+  EXPECT_TRUE(tlrxFileExists(mDir.file("Process.log")));
 }
 
-// The batch folder is known from the environment before the configuration
-// is read: the status goes where the host looks for it.
-TEST_F(EntryTest, ThirteenLineConfigurationStopsStartUp) {
-  const STLRXRun aRun = tlrxRunMain("main_ratio#x", mDir.path(), withConfiguration({}, 13));
-  EXPECT_EQ(aRun.mExitStatus, 13);
-  const std::string aError = tlrxReadFile(workingFile() + "_error");
-  EXPECT_TRUE(contains(aError, "AN ERROR OCCUR DURING Tellurix INIT  : [783360]")) << aError;
-  EXPECT_TRUE(contains(aError, "[EC :783360]"));
-  EXPECT_TRUE(contains(aError, "TELLURIX_DUMMY_VALUE"));
+// The command prefix is case sensitive and needs its hash; configuration,
+// catalogue and working folder failures are numbered errors.
+TEST_F(EntryTest, FailuresExitWithTheirStatusAndNameTheirCode) {
+  CTempDir aEmpty, aBadCatalogue;
+  tlrxWriteFile(aBadCatalogue.file("tlrx_errors_catalog.des"), "40\nC\nA\n");
+  const struct {
+    std::string mCommand;
+    std::map<int, std::string> mConfiguration;
+    int mLines, mExit, mCode; // mLines 0: the build tree's configuration
+    std::map<std::string, std::string> mEnv;
+    std::string mNamed;
+  } aCases[] = {
+      {"MAIN_RATIO#abc", {}, 0, 8, 456963, {}, ""},
+      {"main_ratio", {}, 0, 8, 456963, {}, ""},
+      {"", {}, 0, 8, 456963, {}, ""},
+      {"main_ratio#x", {}, 0, 5, 261122, {{"TELLURIX_INIT_DIR", aEmpty.path()}}, ""},
+      {"main_ratio#x", {}, 2, 13, 783360, {}, "TELLURIX_WORKING_DIR"},
+      {"main_ratio#x", {{6, aEmpty.path()}}, 14, 5, 261122, {}, ""},
+      {"main_ratio#x", {{6, aBadCatalogue.path()}}, 14, 5, 261121, {}, ""},
+      {"main_ratio#x", {}, 0, 5, 261122, {{"TELLURIX_WORKING_DIR", mDir.path() + "missing/folder"}},
+       "missing/folder/Process.log"},
+      {"main_ratio#x", {}, 13, 13, 783360, {}, "TELLURIX_DUMMY_VALUE"},
+  };
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCommand + " " + std::to_string(aCase.mCode) + " " + aCase.mNamed);
+    std::remove((workingFile() + "_error").c_str());
+    std::remove(mDir.file("Process.log").c_str());
+    SetUp();
+    const auto aEnv = aCase.mLines == 0 ? aCase.mEnv : withConfiguration(aCase.mConfiguration, aCase.mLines);
+    EXPECT_EQ(tlrxRunMain(aCase.mCommand, mDir.path(), aEnv).mExitStatus, aCase.mExit);
+    EXPECT_TRUE(tlrxNamesCode(error(), aCase.mCode)) << error();
+    EXPECT_TRUE(tlrxContains(error(), aCase.mNamed)) << error();
+  }
+  // The last case: the batch folder is known from the environment before the
+  // configuration is read, so the status goes where the host looks for it.
+  EXPECT_TRUE(tlrxContains(error(), "AN ERROR OCCUR DURING Tellurix INIT  : [783360]")) << error();
   EXPECT_FALSE(tlrxFileExists(mDir.file("Process.log")));
   EXPECT_FALSE(tlrxFileExists(mDir.file("_error")));
-  const std::vector<std::string> aWorking = tlrxReadLines(workingFile());
-  ASSERT_GE(aWorking.size(), 4u);
-  EXPECT_EQ(aWorking[0], "-1");
-  EXPECT_EQ(aWorking[1], "host status line");
-  EXPECT_EQ(aWorking[2], "AN ERROR OCCUR DURING Tellurix INIT  : [783360]");
-}
-
-TEST_F(EntryTest, MissingOrShortConfigurationIsANumberedError) {
-  CTempDir aEmpty;
-  STLRXRun aRun = tlrxRunMain("main_ratio#x", mDir.path(), {{"TELLURIX_INIT_DIR", aEmpty.path()}});
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  EXPECT_TRUE(contains(tlrxReadFile(workingFile() + "_error"), "[EC :261122]"));
-  aRun = tlrxRunMain("main_ratio#x", mDir.path(), withConfiguration({}, 2));
-  EXPECT_EQ(aRun.mExitStatus, 13);
-  EXPECT_TRUE(contains(tlrxReadFile(workingFile() + "_error"), "TELLURIX_WORKING_DIR"));
+  expectLines(workingFile(), {"-1", "host status line", "AN ERROR OCCUR DURING Tellurix INIT  : [783360]", "*"});
 }
 
 // A start-up that fails before its configuration is read leaves its status
 // files in the batch folder, else the working folder, never in the folder it
 // was started from; only an error file without any known folder goes there.
 TEST_F(EntryTest, FailedStartUpLeavesNoStrayFilesInTheCurrentFolder) {
-  struct SCase {
-    const char *mName;
+  // The folders named, a prepared working file, then what the batch, working
+  // and current folders hold afterwards.
+  const struct {
     bool mBatch, mWorking, mPrepared;
-    const char *mErrorIn; // "batch", "working" or "current"
-    const char *mTmpIn;   // the same, or "" for none
-  };
-  const SCase aCases[] = {
-      {"batch folder, prepared working file", true, true, true, "batch", ""},
-      {"batch folder, no working file", true, true, false, "batch", "batch"},
-      {"working folder only", false, true, false, "working", "working"},
-      {"no folder at all", false, false, false, "current", ""},
+    std::set<std::string> mHeld[3];
+  } aCases[] = {
+      {true, true, true, {{"Process.working", "Process.working_error"}, {}, {}}},
+      {true, true, false, {{"Process.working_error", "Process.working_tmp"}, {}, {}}},
+      {false, true, false, {{}, {"Process.working_error", "Process.working_tmp"}, {}}},
+      {false, false, false, {{}, {}, {"_error"}}},
   };
   CTempDir aNoConfiguration;
-  for (const SCase &aCase : aCases) {
-    CTempDir aCurrent, aBatch, aWorking;
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(std::to_string(aCase.mBatch) + std::to_string(aCase.mWorking) + std::to_string(aCase.mPrepared));
+    CTempDir aFolders[3]; // batch, working, current
     if (aCase.mPrepared)
-      tlrxWriteFile(aBatch.file("Process.working"), "3\nhost\n");
-    const STLRXRun aRun = tlrxRunMain("main_ratio#x", aCurrent.path(),
-                                      {{"TELLURIX_INIT_DIR", aNoConfiguration.path()},
-                                       {"TELLURIX_BATCH_DIR", aCase.mBatch ? aBatch.path() : ""},
-                                       {"TELLURIX_WORKING_DIR", aCase.mWorking ? aWorking.path() : ""}});
-    EXPECT_EQ(aRun.mExitStatus, 5) << aCase.mName;
-    const std::pair<const char *, const CTempDir *> aFolders[] = {
-        {"batch", &aBatch}, {"working", &aWorking}, {"current", &aCurrent}};
-    for (const auto &aFolder : aFolders) {
-      const std::string aKind = aFolder.first;
-      std::set<std::string> aExpected;
-      if (aCase.mPrepared && aKind == "batch")
-        aExpected.insert("Process.working");
-      if (aKind == aCase.mErrorIn)
-        aExpected.insert(aKind == "current" ? "_error" : "Process.working_error");
-      if (aKind == aCase.mTmpIn)
-        aExpected.insert("Process.working_tmp");
-      EXPECT_EQ(namesIn(aFolder.second->path()), aExpected) << aCase.mName << " in the " << aKind << " folder";
-    }
-    const std::string aError = aCase.mErrorIn == std::string("current")
-                                   ? aCurrent.file("_error")
-                                   : (aCase.mBatch ? aBatch : aWorking).file("Process.working_error");
-    const std::vector<std::string> aLines = tlrxReadLines(aError);
-    ASSERT_GE(aLines.size(), 3u) << aCase.mName;
-    EXPECT_EQ(aLines[0], "-1");
-    EXPECT_EQ(aLines[2], "AN ERROR OCCUR DURING Tellurix INIT  : [261122] [EC :261122]") << aCase.mName;
+      tlrxWriteFile(aFolders[0].file("Process.working"), "3\nhost\n");
+    EXPECT_EQ(tlrxRunMain("main_ratio#x", aFolders[2].path(),
+                          {{"TELLURIX_INIT_DIR", aNoConfiguration.path()},
+                           {"TELLURIX_BATCH_DIR", aCase.mBatch ? aFolders[0].path() : ""},
+                           {"TELLURIX_WORKING_DIR", aCase.mWorking ? aFolders[1].path() : ""}})
+                  .mExitStatus,
+              5);
+    for (int f = 0; f < 3; ++f)
+      EXPECT_EQ(namesIn(aFolders[f].path()), aCase.mHeld[f]) << "folder " << f;
+    const int aHolder = aCase.mBatch ? 0 : aCase.mWorking ? 1 : 2;
+    expectLines(aFolders[aHolder].file(aHolder == 2 ? "_error" : "Process.working_error"),
+                {"-1", "*", "AN ERROR OCCUR DURING Tellurix INIT  : [261122] [EC :261122]"});
     if (aCase.mPrepared)
-      EXPECT_EQ(tlrxReadLines(aBatch.file("Process.working"))[0], "-1");
+      expectLines(aFolders[0].file("Process.working"), {"-1"});
   }
 }
 
-// A person at a terminal, or a rerun after a success removed the working
-// file: nobody prepared it, so the run creates it and never waits for it.
-TEST_F(EntryTest, RunWithoutAPreparedWorkingFileCreatesItAndDoesNotWait) {
-  struct SCase {
-    std::string mCommand;
-    int mExitStatus;
-  };
-  const auto aEnv = withConfiguration({{12, "ACTIVE"}});
-  const SCase aCases[] = {{ratioOverSeries(2, 6, "NO"), 0}, {"main_principal_component_analysis#x", 8}};
-  for (const SCase &aCase : aCases) {
-    std::remove(workingFile().c_str());
-    // Waiting for the file would take 45 seconds, and as long again on the
-    // error path: far beyond the bound.
-    const int aPid = tlrxStart("main_features_extraction", {aCase.mCommand}, mDir.path(), aEnv);
-    EXPECT_EQ(tlrxWait(aPid, 30), aCase.mExitStatus) << aCase.mCommand;
-    EXPECT_TRUE(contains(tlrxReadFile(mDir.file("Process.trace")),
-                         "fdfInitEnvironment - Not found the working file, created : " + workingFile() + "\n"))
-        << aCase.mCommand;
-    EXPECT_FALSE(tlrxFileExists(workingFile() + "_tmp"));
-  }
-  // The failed run reported into the file it created.
-  const std::vector<std::string> aWorking = tlrxReadLines(workingFile());
-  ASSERT_GE(aWorking.size(), 4u);
-  EXPECT_EQ(aWorking[0], "-1");
-  EXPECT_EQ(aWorking[1], "");
-  EXPECT_EQ(aWorking[3], "Unknown command [EC :456963]");
-}
-
-TEST_F(EntryTest, RunWithItsOwnWorkingFileRemovesItOnSuccess) {
-  const std::string aCommand = ratioOverSeries(2, 6, "NO");
-  std::remove(workingFile().c_str());
-  const int aPid = tlrxStart("main_features_extraction", {aCommand}, mDir.path());
-  ASSERT_EQ(tlrxWait(aPid, 30), 0);
-  EXPECT_FALSE(tlrxFileExists(workingFile()));
-  EXPECT_TRUE(tlrxFileExists(mDir.file("ratio_rto")));
-}
-
-// SIGTERM from a host or SIGINT from a terminal ends the run as the host's
-// own interruption does: through the error path, exit status 6.
-TEST_F(EntryTest, SignalEndsTheRunAsAnOperatorInterruption) {
-  const std::string aCommand = ratioOverSeries(6, 2048, "OK");
-  const std::pair<int, std::string> aSignals[] = {{SIGTERM, "SIGTERM"}, {SIGINT, "SIGINT"}};
-  for (const auto &aSignal : aSignals) {
-    tlrxWriteFile(workingFile(), "0\nhost status line\n");
-    std::remove((workingFile() + "_error").c_str());
-    const int aPid = tlrxStart("main_features_extraction", {aCommand}, mDir.path());
-    // Signal it once it works: its handlers are installed by then.
-    bool aWorking = false;
-    for (int i = 0; i < 30000 && !aWorking; ++i) {
-      aWorking = progress() > 0;
-      if (!aWorking)
-        usleep(1000);
-    }
-    ASSERT_TRUE(aWorking) << aSignal.second;
-    ASSERT_EQ(kill(aPid, aSignal.first), 0);
-    EXPECT_EQ(tlrxWait(aPid, 120), 6) << aSignal.second;
-    const std::vector<std::string> aError = tlrxReadLines(workingFile() + "_error");
-    ASSERT_GE(aError.size(), 4u) << aSignal.second;
-    EXPECT_EQ(aError[0], "-1");
-    EXPECT_EQ(aError[1], "PROCESSING INTERRUPTED");
-    EXPECT_EQ(aError[2], " [EC :326400]");
-    EXPECT_EQ(aError[3], "Interrupted by " + aSignal.second);
-    const std::vector<std::string> aStatus = tlrxReadLines(workingFile());
-    ASSERT_GE(aStatus.size(), 4u);
-    EXPECT_EQ(aStatus[0], "-1");
-    EXPECT_EQ(aStatus[1], "host status line");
-    EXPECT_EQ(aStatus[3], " [EC :326400]");
-    EXPECT_TRUE(contains(log(), "[ERROR ID : 326400]\n  PROCESSING INTERRUPTED []\n  Interrupted by " +
-                                    aSignal.second + " \n"));
-  }
-}
-
-TEST_F(EntryTest, MissingOrMalformedCatalogueIsANumberedError) {
-  CTempDir aDes;
-  STLRXRun aRun = tlrxRunMain("main_ratio#x", mDir.path(), withConfiguration({{6, aDes.path()}}));
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  EXPECT_TRUE(contains(tlrxReadFile(workingFile() + "_error"), "[EC :261122]"));
-  tlrxWriteFile(aDes.file("tlrx_errors_catalog.des"), "40\nC\nA\n");
-  aRun = tlrxRunMain("main_ratio#x", mDir.path(), withConfiguration({{6, aDes.path()}}));
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  EXPECT_TRUE(contains(tlrxReadFile(workingFile() + "_error"), "[EC :261121]"));
-}
-
-TEST_F(EntryTest, UnwritableWorkingFolderEndsWithAFileError) {
-  const STLRXRun aRun =
-      tlrxRunMain("main_ratio#x", mDir.path(), {{"TELLURIX_WORKING_DIR", mDir.path() + "missing/folder"}});
-  EXPECT_EQ(aRun.mExitStatus, 5);
-  const std::string aError = tlrxReadFile(workingFile() + "_error");
-  EXPECT_TRUE(contains(aError, "[EC :261122]"));
-  EXPECT_TRUE(contains(aError, "missing/folder/Process.log"));
-}
-
-TEST_F(EntryTest, ClosedStandardStreamsDoNotCaptureFiles) {
-  const STLRXRun aRun = tlrxRun("/bin/sh",
-                                {"-c", "exec 0<&- 1>&- 2>&-; TELLURIX_WORKING_DIR=" + mDir.path() + " TELLURIX_BATCH_DIR=" +
-                                           mDir.path() + " " + tlrxBinPath("main_features_extraction") + " x"},
-                                mDir.path());
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  EXPECT_TRUE(contains(log(), "[ERROR ID : 456963]"));
-  EXPECT_TRUE(contains(tlrxReadFile(workingFile() + "_error"), "[EC :456963]"));
-}
-
-TEST_F(EntryTest, BatchFolderAndWorkingFileNameFromTheEnvironment) {
-  CTempDir aBatch;
-  tlrxWriteFile(aBatch.file("job.work"), "0\nhost\n");
-  const STLRXRun aRun = tlrxRunMain("bad", mDir.path(),
-                                    {{"TELLURIX_BATCH_DIR", aBatch.path()}, {"TELLURIX_WORKING_FILE", "job.work"}});
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  EXPECT_TRUE(contains(tlrxReadFile(aBatch.file("job.work_error")), "[EC :456963]"));
-  EXPECT_EQ(tlrxReadLines(aBatch.file("job.work"))[0], "-1");
-  EXPECT_TRUE(tlrxFileExists(mDir.file("Process.log")));
-}
-
+// Without TELLURIX_INIT_DIR the installation's own etc/tellurix is found.
 TEST_F(EntryTest, InstalledLayoutRunsWithItsOwnConfiguration) {
   CTempDir aPrefix;
   const STLRXRun aInstall =
       tlrxRun("/bin/sh", {"-c", "cmake --install " + tlrxBuildDir() + " --prefix " + aPrefix.path()}, mDir.path());
   ASSERT_EQ(aInstall.mExitStatus, 0) << aInstall.mOutput;
-  for (const char *aPath : {"bin/main_features_extraction", "bin/main_delete_file", "etc/tellurix/Tellurix_configuration.ini",
-                            "share/tellurix/des_files/tlrx_errors_catalog.des"})
-    EXPECT_TRUE(tlrxFileExists(aPrefix.path() + aPath)) << aPath;
-  const std::vector<std::string> aConfig = tlrxReadLines(aPrefix.path() + "etc/tellurix/Tellurix_configuration.ini");
-  ASSERT_EQ(aConfig.size(), 14u);
-  EXPECT_EQ(aConfig[0], aPrefix.path() + "share/tellurix/key_files/");
-  EXPECT_EQ(aConfig[2], "./");
-  EXPECT_EQ(aConfig[3], aPrefix.path() + "bin/");
-  // No TELLURIX_INIT_DIR: the installation's own etc/tellurix is found.
-  const STLRXRun aRun = tlrxRun(aPrefix.path() + "bin/main_features_extraction", {"main_min_and_max_x#"}, mDir.path(),
-                                {{"TELLURIX_INIT_DIR", ""}});
-  EXPECT_EQ(aRun.mExitStatus, 8);
-  EXPECT_TRUE(contains(log(), "[ERROR ID : 456963]"));
+  expectLines(aPrefix.path() + "etc/tellurix/Tellurix_configuration.ini",
+              {aPrefix.path() + "share/tellurix/key_files/", "*", "./", aPrefix.path() + "bin/"});
+  EXPECT_EQ(tlrxRun(aPrefix.path() + "bin/main_features_extraction", {"main_min_and_max_x#"}, mDir.path(),
+                    {{"TELLURIX_INIT_DIR", ""}})
+                .mExitStatus,
+            8);
+  EXPECT_TRUE(tlrxContains(log(), "[ERROR ID : 456963]"));
 }
 
 using CommandArgumentsTest = CommandTest;
@@ -325,22 +182,19 @@ TEST_F(CommandArgumentsTest, TooFewTokensOrFilesRunNothing) {
   list({"a"});
   const std::string aList = file("list.txt"), aA = file("a");
   const struct {
-    const char *mCase;
     const char *mCommand;
     std::vector<std::string> mTokens;
     std::string mNamed, mAbsent;
   } aCases[] = {
-      {"ratio, three tokens", "main_ratio#", {"list", "root", "0"}, "", "root_rto"},
-      {"ratio, one file", "main_ratio#", {aList, file("out"), "0", "x", "NO", "0.3"}, "list.txt", "out_rto"},
-      {"min and max, two tokens", "main_min_and_max#", {"list", "root"}, "list root", "root_min"},
-      {"min and max, one file", "main_min_and_max#", {aList, file("out"), "2", "3", "4", "5", "6", "NO", "0.3"},
-       "list.txt", "out_min"},
-      {"texture, seven tokens", "main_texture#", {aA, file("out.img"), "0", "5", "5", "x", "OK"}, "", "out.img"},
-      {"correlation, ten tokens", "main_correlation#", {aA, aA, file("coh"), "-5", "11", "11", "11", "11", "NO", "NO"},
-       "", "coh_norm"},
+      {"main_ratio#", {"list", "root", "0"}, "", "root_rto"},
+      {"main_ratio#", {aList, file("out"), "0", "x", "NO", "0.3"}, "list.txt", "out_rto"},
+      {"main_min_and_max#", {"list", "root"}, "list root", "root_min"},
+      {"main_min_and_max#", {aList, file("out"), "2", "3", "4", "5", "6", "NO", "0.3"}, "list.txt", "out_min"},
+      {"main_texture#", {aA, file("out.img"), "0", "5", "5", "x", "OK"}, "", "out.img"},
+      {"main_correlation#", {aA, aA, file("coh"), "-5", "11", "11", "11", "11", "NO", "NO"}, "", "coh_norm"},
   };
   for (const auto &aCase : aCases) {
-    SCOPED_TRACE(aCase.mCase);
+    SCOPED_TRACE(aCase.mCommand + std::to_string(aCase.mTokens.size()));
     resetWorking();
     expectFailure(runCommand(aCase.mCommand, aCase.mTokens, true), 8, 456962, aCase.mNamed);
     EXPECT_FALSE(tlrxContains(trace(), "Step ("));

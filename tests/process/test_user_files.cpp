@@ -1,15 +1,13 @@
-// A run never destroys a file it was only meant to read, and a run that
-// fails leaves no result that claims to be complete. Each command is run the
-// way a careless user would: results named like inputs (directly, through a
-// link, through a relative path), reruns over good results, failures late in
-// the run. The folder is compared file by file before and after.
+// A run never destroys a file it was only meant to read, and a failed run
+// leaves no result that looks complete: commands run the way a careless user
+// would, the folder compared file by file before and after.
 #include "tlrx_command_test_support.h"
 #include "tlrx_temporal_test_support.h"
 
-#include <dirent.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <filesystem>
 #include <functional>
 #include <map>
 
@@ -25,23 +23,19 @@ protected:
                        (theDay < 10 ? "0" : "") + std::to_string(theDay) + "-JAN-2010 00:00:00.000000", false);
   }
   void stack(int theLines = 2) {
-    image("a", std::vector<double>(4 * theLines, 1.0), 1, theLines);
-    image("b", std::vector<double>(4 * theLines, 2.0), 2, theLines);
-    image("c", std::vector<double>(4 * theLines, 4.0), 3, theLines);
+    for (int i = 0; i < 3; ++i)
+      image(std::string(1, static_cast<char>('a' + i)), std::vector<double>(4 * theLines, 1 << i), i + 1, theLines);
   }
 
   // Every file of the folder but the status, argument and list files, with
   // its content.
   CFolderSnapshot snapshot() const {
     CFolderSnapshot aFiles;
-    DIR *aDir = opendir(mDir.path().c_str());
-    while (const dirent *aEntry = readdir(aDir)) {
-      const std::string aName = aEntry->d_name;
-      if (aName != "." && aName != ".." && aName.rfind("Process", 0) != 0 && aName.rfind("args", 0) != 0 &&
-          aName != "list.txt")
+    for (const auto &aEntry : std::filesystem::directory_iterator(mDir.path())) {
+      const std::string aName = aEntry.path().filename().string();
+      if (aName.rfind("Process", 0) != 0 && aName.rfind("args", 0) != 0 && aName != "list.txt")
         aFiles[aName] = tlrxReadFile(file(aName));
     }
-    closedir(aDir);
     return aFiles;
   }
 
@@ -74,9 +68,8 @@ protected:
 TEST_F(UserFilesTest, ResultsNamedLikeInputsAreRefusedBeforeAnythingIsWritten) {
   stack();
   // Inputs that the results of each case would land on.
-  image("q_rto", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
-  image("z_max", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
-  image("w_mea", {1, 1, 1, 1, 1, 1, 1, 1}, 4, 2);
+  for (const char *aName : {"q_rto", "z_max", "w_mea"})
+    image(aName, std::vector<double>(8, 1.0), 4, 2);
   ASSERT_EQ(symlink(file("a").c_str(), file("link_to_a").c_str()), 0);
   ASSERT_EQ(symlink(file("a.sml").c_str(), file("u.sml").c_str()), 0);
   ASSERT_EQ(link(file("a").c_str(), file("hard_a").c_str()), 0);
@@ -102,12 +95,11 @@ TEST_F(UserFilesTest, ResultsNamedLikeInputsAreRefusedBeforeAnythingIsWritten) {
     SCOPED_TRACE(aCase.mCase);
     const CFolderSnapshot aBefore = snapshot();
     expectFailure(aCase.mRun(), aCase.mStatus, aCase.mCode, aCase.mNamed);
-    const CFolderSnapshot aAfter = snapshot();
-    EXPECT_TRUE(aAfter == aBefore) << "files changed, added or removed";
+    EXPECT_TRUE(snapshot() == aBefore) << "files changed, added or removed";
   }
 }
 
-TEST_F(UserFilesTest, TemporalTemporariesNeverTakeTheNamesOfUserFiles) {
+TEST_F(UserFilesTest, TemporariesNeverTakeTheNamesOfUserFilesAndPartsOfKilledRunsGoWithTheNextRun) {
   stack();
   // A root beside the user's "results.txt" and "results.hdr", and a root
   // equal to an input's name: its headers are the user's too.
@@ -116,8 +108,7 @@ TEST_F(UserFilesTest, TemporalTemporariesNeverTakeTheNamesOfUserFiles) {
   const CFolderSnapshot aBefore = snapshot();
   for (const char *aRoot : {"results", "a"}) {
     SCOPED_TRACE(aRoot);
-    const STLRXRun aRun = temporal({"a", "b", "c"}, aRoot);
-    ASSERT_EQ(aRun.mExitStatus, 0) << aRun.mOutput << error();
+    ASSERT_EQ(temporal({"a", "b", "c"}, aRoot).mExitStatus, 0) << error();
   }
   CFolderSnapshot aAfter = snapshot();
   for (const char *aResult : {"results_mea", "a_mea"}) {
@@ -126,83 +117,10 @@ TEST_F(UserFilesTest, TemporalTemporariesNeverTakeTheNamesOfUserFiles) {
       EXPECT_EQ(aAfter.erase(std::string(aResult) + aSuffix), 1u) << aResult << aSuffix;
   }
   EXPECT_TRUE(aAfter == aBefore) << "only the results are new; nothing else changed";
-}
-
-TEST_F(UserFilesTest, FailedRunsLeaveNoResultThatLooksComplete) {
-  stack();
-  image("short", {1, 1, 1, 1}, 9, 1);
+  // Parts left by killed runs go with the next run of that result: the pid of
+  // a process that has ended, not one that is alive, nor names that only look
+  // like parts.
   list({"a", "b"});
-  ASSERT_EQ(minMax("good", "OK").mExitStatus, 0) << error();
-  ASSERT_EQ(ratio("good").mExitStatus, 0) << error();
-  const CFolderSnapshot aBefore = snapshot();
-  const struct {
-    const char *mCase;
-    std::function<STLRXRun()> mRun;
-    int mStatus, mCode;
-  } aCases[] = {
-      // A rerun over a good result that fails on its inputs keeps the old
-      // result as it was: values, dates and headers.
-      {"min and max rerun over a good result", [&] { list({"a", "short"}); return minMax("good", "OK"); }, 11, 652803},
-      // The first pair is written, the second fails: neither stays.
-      {"ratio fails at its second pair", [&] { list({"a", "b", "short"}); return ratio("new"); }, 11, 652807},
-      // One input: the standard deviation holds no valid sample, so its
-      // quick-look fails after every raster is written.
-      {"temporal quick-look fails", [&] {
-         return temporal({"a"}, "one", {{"mean", "OK"}, {"std", "OK"}, {"make_tiff", "OK"}});
-       }, 3, 130564},
-  };
-  for (const auto &aCase : aCases) {
-    SCOPED_TRACE(aCase.mCase);
-    const STLRXRun aRun = aCase.mRun();
-    expectFailure(aRun, aCase.mStatus, aCase.mCode);
-    EXPECT_TRUE(snapshot() == aBefore) << "a result or a temporary was left or changed";
-  }
-}
-
-TEST_F(UserFilesTest, HostInterruptionRemovesPartialResultsAndTemporaries) {
-  stack(64);
-  resetWorking("101");
-  const CFolderSnapshot aBefore = snapshot();
-  list({"a", "b", "c"});
-  const STLRXRun aMinMax = minMax("out");
-  EXPECT_EQ(aMinMax.mExitStatus, 6) << aMinMax.mOutput;
-  resetWorking("101");
-  const STLRXRun aTemporal = temporal({"a", "b", "c"}, "out");
-  EXPECT_EQ(aTemporal.mExitStatus, 6) << aTemporal.mOutput;
-  EXPECT_TRUE(snapshot() == aBefore) << "a partial result or a temporary was left";
-}
-
-TEST_F(UserFilesTest, TemporalRunsThatWouldWriteNothingAreRefused) {
-  stack();
-  const struct {
-    const char *mCase;
-    std::string mRoot;
-    std::vector<std::pair<std::string, std::string>> mSettings;
-    std::string mNamed;
-  } aCases[] = {
-      {"every output off", "none", {{"mean", "NotOK"}, {"make_tiff", "OK"}}, "no output switch"},
-      {"empty root", "", {{"out_root_file_name", ""}, {"mean", "OK"}}, "MAIN_CMD.out_root_file_name"},
-  };
-  const CFolderSnapshot aBefore = snapshot();
-  for (const auto &aCase : aCases) {
-    SCOPED_TRACE(aCase.mCase);
-    expectFailure(temporal({"a", "b"}, aCase.mRoot, aCase.mSettings), 8, 456960, aCase.mNamed);
-    EXPECT_TRUE(snapshot() == aBefore);
-  }
-  // Nothing landed in the current folder either (the runs start in the
-  // test folder, so a stray "_mea" would have shown above).
-}
-
-TEST_F(UserFilesTest, MissingTemporalInputIsReportedAsMissing) {
-  stack();
-  expectFailure(temporal({"a", "absent"}, "out"), 5, 261122, "absent.sml");
-}
-
-TEST_F(UserFilesTest, PartsLeftByKilledRunsGoWithTheNextRunOfThatResult) {
-  stack();
-  list({"a", "b"});
-  // The pid of a process that has ended, one that is alive, and names that
-  // only look like parts.
   const pid_t aEnded = fork();
   if (aEnded == 0)
     _exit(0);
@@ -217,3 +135,43 @@ TEST_F(UserFilesTest, PartsLeftByKilledRunsGoWithTheNextRunOfThatResult) {
     EXPECT_TRUE(tlrxFileExists(file(aName))) << aName;
   EXPECT_TRUE(tlrxFileExists(file(aAlive)));
 }
+
+// Failed, refused and interrupted runs leave the folder as it was: a rerun
+// over a good result that fails on its inputs keeps the old result (values,
+// dates and headers); a ratio whose second pair fails keeps neither pair; a
+// temporal run whose quick-look fails after every raster is written (one
+// input: the deviation holds no valid sample) keeps none; a temporal run
+// that would write nothing writes nothing, in the current folder neither.
+TEST_F(UserFilesTest, FailedRefusedOrInterruptedRunsLeaveTheFolderAsItWas) {
+  stack(64);
+  image("short", {1, 1, 1, 1}, 9, 1);
+  list({"a", "b"});
+  ASSERT_EQ(minMax("good", "OK").mExitStatus, 0) << error();
+  ASSERT_EQ(ratio("good").mExitStatus, 0) << error();
+  const CFolderSnapshot aBefore = snapshot();
+  const std::vector<std::pair<std::string, std::string>> aStd = {{"mean", "OK"}, {"std", "OK"}, {"make_tiff", "OK"}};
+  const struct {
+    const char *mCase;
+    std::function<STLRXRun()> mRun;
+    int mStatus, mCode;
+    std::string mNamed;
+  } aCases[] = {
+      {"min and max rerun", [&] { list({"a", "short"}); return minMax("good", "OK"); }, 11, 652803, ""},
+      {"ratio fails at its second pair", [&] { list({"a", "b", "short"}); return ratio("new"); }, 11, 652807, ""},
+      {"temporal quick-look fails", [&] { return temporal({"a"}, "one", aStd); }, 3, 130564, ""},
+      {"every temporal output off",
+       [&] { return temporal({"a", "b"}, "none", {{"mean", "NotOK"}, {"make_tiff", "OK"}}); }, 8, 456960,
+       "no output switch"},
+      {"empty temporal root", [&] { return temporal({"a", "b"}, "", {{"out_root_file_name", ""}, {"mean", "OK"}}); }, 8,
+       456960, "MAIN_CMD.out_root_file_name"},
+      {"min and max interrupted", [&] { list({"a", "b", "c"}); resetWorking("101"); return minMax("out"); }, 6, 326400,
+       ""},
+      {"temporal interrupted", [&] { resetWorking("101"); return temporal({"a", "b", "c"}, "out"); }, 6, 326400, ""},
+  };
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(aCase.mCase);
+    expectFailure(aCase.mRun(), aCase.mStatus, aCase.mCode, aCase.mNamed);
+    EXPECT_TRUE(snapshot() == aBefore) << "a result or a temporary was left or changed";
+  }
+}
+
