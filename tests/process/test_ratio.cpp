@@ -49,6 +49,8 @@ TEST_F(RatioTest, NullValuesAndTheDecibelSwitchReachTheLineFormula) {
       else
         EXPECT_FLOAT_EQ(aGot[i], aCase.second[i]) << aCase.first << " " << i;
     EXPECT_FALSE(tlrxFileExists(working())); // a clean run removes it
+    EXPECT_TRUE(tlrxContains(log(), "\n\nSUCCESSFUL\n\n"));
+    EXPECT_FALSE(tlrxContains(log(), "[ERROR ID"));
   }
   EXPECT_FALSE(tlrxFileExists(file("out_rto.tif")));
   tlrxExpectHeader(file("out_rto"), "CellType=FLOAT;DataUnits=RATIO;NullCellValue=-9999;FilesList=" + file("a") + "," +
