@@ -175,11 +175,13 @@ TEST_F(GeocodedStackTest, MeanAndWeightAverageTheCellsUnderTheFootprint) {
   // floor((2 + 10 c) / 20) and floor((12 + 10 c) / 20).
   raster("in", 2, 5, 6000, 1000, 20, [](int l, int p) { return 10.0 * l + p * p; });
   grid(4, 9, 1002, 10);
+  std::vector<std::vector<double>> aLines;
   for (const char *aKernel : {"mean", "weight"}) {
     CGeocodedImageStack aStack;
     open(aStack, {"in"}, aKernel);
     for (int r = 0; r < 4; ++r) {
       const std::vector<double> aLine = line(aStack, 0, r);
+      aLines.push_back(aLine);
       for (int c = 0; c < 9; ++c) {
         const int aLeft = (2 + 10 * c) / 20, aRight = (12 + 10 * c) / 20;
         const double aLeftPart = std::min(10.0, 20.0 * (aLeft + 1) - (2 + 10 * c));
@@ -189,6 +191,21 @@ TEST_F(GeocodedStackTest, MeanAndWeightAverageTheCellsUnderTheFootprint) {
           aExpected = std::string(aKernel) == "mean" ? (vL + vR) / 2 : (aLeftPart * vL + (10 - aLeftPart) * vR) / 10;
         EXPECT_NEAR(aLine[c], aExpected, 1e-9) << aKernel << " " << r << "," << c;
       }
+    }
+  }
+  // The same grid begun two columns west: those two lie outside the input,
+  // the others repeat the lines above.
+  grid(4, 11, 982, 10);
+  size_t k = 0;
+  for (const char *aKernel : {"mean", "weight"}) {
+    CGeocodedImageStack aStack;
+    open(aStack, {"in"}, aKernel);
+    for (int r = 0; r < 4; ++r, ++k) {
+      const std::vector<double> aLine = line(aStack, 0, r);
+      EXPECT_EQ(aLine[0], sNull);
+      EXPECT_EQ(aLine[1], sNull);
+      for (int c = 0; c < 9; ++c)
+        EXPECT_EQ(aLine[c + 2], aLines[k][c]) << aKernel << " " << r << "," << c;
     }
   }
 }
