@@ -155,8 +155,7 @@ TEST_F(CorrelationStepTest, ErrorsAndTheirCodes) {
 // A complex input asked for its parts gives the cells (a coherence step sums
 // them), no data only where both parts are the null value.
 TEST_F(CorrelationStepTest, ComplexInputGivesItsPartsWithNoData) {
-  STestImage aParts = constantImage(2, 6, 0.0);
-  aParts.mValues = {1, 2, -1, -1, -1, 5, 3, -4, 0.5, 0.25, -1, -1};
+  const STestImage aParts{2, 6, {1, 2, -1, -1, -1, 5, 3, -4, 0.5, 0.25, -1, -1}, std::vector<int>(12, 1)};
   write("z", aParts, "AMPLITUDE", -1.0);
   CDescription aHeader;
   fdfReadStandardHeader(file("z").c_str(), aHeader);

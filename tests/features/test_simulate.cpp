@@ -248,9 +248,8 @@ TEST_F(SimulateTest, PairIntensityCorrelationIsTheSquaredCoherence) {
     SCOPED_TRACE(std::string(aCase.mCoherence) + " " + aCase.mLooks);
     const std::string aRoot = file(std::string("p") + aCase.mCoherence);
     simulate({"pair", "--out", aRoot, "--scene", "flat", "--coherence", aCase.mCoherence, "--looks", aCase.mLooks});
-    const double aGamma = std::atof(aCase.mCoherence);
     const std::vector<double> aFirst = tlrxReadTestRaster(aRoot + "_1"), aSecond = tlrxReadTestRaster(aRoot + "_2");
-    EXPECT_NEAR(correlation(aFirst, aSecond), aGamma * aGamma, 0.02);
+    EXPECT_NEAR(correlation(aFirst, aSecond), std::pow(std::atof(aCase.mCoherence), 2), 0.02);
     EXPECT_NEAR(stats(aSecond).mMean, 1.0, 0.03);
     EXPECT_NEAR(stats(aFirst).cv(), aCase.mCv, 0.015);
     EXPECT_NEAR(stats(aSecond).cv(), aCase.mCv, 0.03);
@@ -308,10 +307,8 @@ TEST_F(SimulateTest, SlcPairCarriesThePhaseRampAndTheIntensitiesAndNoDataFollows
 TEST_F(SimulateTest, ConstantImagesHoldTheirValueExactlyAndExtremeSizesAreAccepted) {
   simulate({"constant", "--out", file("k"), "--value", "4", "--cell-type", "DOUBLE", "--lines", "3", "--pixels", "5",
             "--null", "-9999", "--nodata-box", "1,1,1,2", "--list", file("k.txt")});
-  const std::vector<double> aCells = rawCells<double>(file("k"));
-  ASSERT_EQ(aCells.size(), 15u);
-  for (size_t i = 0; i < aCells.size(); ++i)
-    EXPECT_EQ(aCells[i], i == 6 || i == 7 ? -9999.0 : 4.0) << i;
+  const double N = -9999;
+  EXPECT_EQ(rawCells<double>(file("k")), std::vector<double>({4, 4, 4, 4, 4, 4, N, N, 4, 4, 4, 4, 4, 4, 4}));
   tlrxExpectHeader(file("k"), "DataUnits=NUMBER");
   EXPECT_EQ(tlrxReadLines(file("k.txt")), std::vector<std::string>{file("k")});
   simulate({"constant", "--out", file("kc"), "--value", "3,-4", "--cell-type", "FLOAT_COMPLEX", "--lines", "1",

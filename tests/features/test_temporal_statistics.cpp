@@ -166,11 +166,9 @@ TEST(TemporalSeries, FeaturesOfSmallSeries) {
 }
 
 TEST(TemporalSeries, OnlyWantedFeaturesAreComputedAndStridedInputsAreRead) {
-  STemporalSettings aSettings;
-  aSettings.mNull = sN;
+  STemporalSettings aSettings = settings(true, true, 1e100, sN);
+  std::fill(std::begin(aSettings.mWanted), std::end(aSettings.mWanted), false);
   aSettings.mWanted[CTLRX_TF_MAX] = true;
-  aSettings.mNormalize = true;
-  aSettings.mDecibels = true;
   CTemporalSeries aSeries(aSettings, {0, 1, 2}, {-1, -1, -1});
   // Pixel 1 of three interleaved rows.
   const double aRows[] = {0, 10, 0, 0, 20, 0, 0, 40, 0};

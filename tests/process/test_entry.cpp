@@ -173,11 +173,9 @@ TEST_F(EntryTest, InstalledLayoutRunsWithItsOwnConfiguration) {
   EXPECT_TRUE(tlrxContains(log(), "[ERROR ID : 456963]"));
 }
 
-using CommandArgumentsTest = CommandTest;
-
 // Every command counts its tokens and its listed files before it plans a
 // step or writes a file.
-TEST_F(CommandArgumentsTest, TooFewTokensOrFilesRunNothing) {
+TEST_F(CommandTest, TooFewTokensOrFilesRunNothing) {
   image("a", {1, 2, 3, 4}, 2, "01-JAN-2007 00:00:00.000000");
   list({"a"});
   const std::string aList = file("list.txt"), aA = file("a");

@@ -1,6 +1,6 @@
 // The min-and-max command run as a host runs it, against a direct
 // computation on small stacks with no-data pixels.
-#include "../features/tlrx_header_expect.h"
+#include "tlrx_header_expect.h"
 #include "tlrx_command_test_support.h"
 
 namespace {

@@ -1,7 +1,7 @@
 // The ratio command run as a host runs it: the null values and the decibel
 // switch reach the line formula, pair naming, GeoTIFF steps and the number
 // tokens.
-#include "../features/tlrx_header_expect.h"
+#include "tlrx_header_expect.h"
 #include "tlrx_command_test_support.h"
 
 #include <cmath>
@@ -19,13 +19,6 @@ protected:
     list(theFiles);
     resetWorking();
     return runCommand("main_ratio#", {file("list.txt"), file(theRoot), theDb, "unused", theTiff, "0.3"}, theTracing);
-  }
-  // Two images of 2 x 2 ones named "a" and "b", and theOthers.
-  void images(const std::vector<std::string> &theOthers = {}) const {
-    for (const std::string &aName : {"a", "b"})
-      image(aName, {1, 2, 3, 4}, 2);
-    for (const std::string &aName : theOthers)
-      image(aName, {1, 2, 3, 4}, 2);
   }
 };
 
@@ -60,7 +53,8 @@ TEST_F(RatioTest, NullValuesAndTheDecibelSwitchReachTheLineFormula) {
 }
 
 TEST_F(RatioTest, PairNamingGeoTiffStepsAndNumberTokens) {
-  images({"c"});
+  for (const char *aName : {"a", "b", "c"})
+    image(aName, {1, 2, 3, 4}, 2);
   ASSERT_EQ(ratio({"a", "b"}, "out_rto").mExitStatus, 0);
   EXPECT_TRUE(tlrxFileExists(file("out_rto")));
   EXPECT_FALSE(tlrxFileExists(file("out_rto_rto")));

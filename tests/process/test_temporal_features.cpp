@@ -1,7 +1,7 @@
 // The temporal feature extraction command run as a host runs it: the order,
 // null values and settings reaching the features, the output headers, the
 // geocoded grid, and the failures with their codes.
-#include "../features/tlrx_header_expect.h"
+#include "tlrx_header_expect.h"
 #include "tlrx_command_test_support.h"
 #include "tlrx_temporal_test_support.h"
 

@@ -43,18 +43,17 @@ TEST_F(TextureCommandTest, TiffSwitchPlansTheConversionWithItsArgumentsOnlyWhenO
             "--null", "-1"});
   texture("in.img", "5", "OK", true);
   const std::string aTrace = trace();
-  for (const std::string &aArg : std::vector<std::string>{"Step (0) texture", "aArgv[1] " + file("in.img"),
-                                                          "aArgv[2] " + file("out.img"), "aArgv[3] 0", "aArgv[4] 5",
-                                                          "aArgv[5] 5"})
-    EXPECT_TRUE(tlrxContains(aTrace, aArg + "\n")) << aArg;
   const size_t aTiff = aTrace.find("Step (1) texture to tiff conversion\n");
   ASSERT_NE(aTiff, std::string::npos);
-  const std::string aTiffPart = aTrace.substr(aTiff);
-  EXPECT_EQ(tlrxTracedProcessName(aTiffPart), "texture to tiff conversion");
-  for (const std::string &aArg : std::vector<std::string>{"aArgv[1] " + file("out.img"),
-                                                          "aArgv[2] " + file("out.img.tif"), "aArgv[3] 0",
-                                                          "aArgv[4] 1", "aArgv[5] 1"})
-    EXPECT_TRUE(tlrxContains(aTiffPart, aArg + "\n")) << aArg;
+  EXPECT_EQ(tlrxTracedProcessName(aTrace.substr(aTiff)), "texture to tiff conversion");
+  const std::pair<std::string, std::vector<std::string>> aParts[] = {
+      {aTrace, {"Step (0) texture", "aArgv[1] " + file("in.img"), "aArgv[2] " + file("out.img"), "aArgv[3] 0",
+                "aArgv[4] 5", "aArgv[5] 5"}},
+      {aTrace.substr(aTiff), {"aArgv[1] " + file("out.img"), "aArgv[2] " + file("out.img.tif"), "aArgv[3] 0",
+                              "aArgv[4] 1", "aArgv[5] 1"}}};
+  for (const auto &aPart : aParts)
+    for (const std::string &aArg : aPart.second)
+      EXPECT_TRUE(tlrxContains(aPart.first, aArg + "\n")) << aArg;
   for (const char *aSwitch : {"ok", "NO"}) {
     std::remove(file("out.img.tif").c_str());
     ASSERT_EQ(texture("in.img", "5", aSwitch, true).mExitStatus, 0) << aSwitch;
