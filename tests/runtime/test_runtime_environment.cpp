@@ -293,6 +293,17 @@ TEST_F(EnvironmentTest, WarningsWriteTheirLogBlocksAndNeverHideAFailure) {
   EXPECT_EQ(fdfEndProcess(0, false, false), 0);
 }
 
+// A report of code 0 is a success: its own log text, no error block, and the
+// working file removed.
+TEST_F(EnvironmentTest, ReportOfCodeZeroLogsSuccessAndRemovesTheWorkingFile) {
+  fdfResetWarningCount();
+  tlrxWriteFile(working(), "50\nhost\n");
+  EXPECT_EQ(fdfReportError(CErrorExceptionManager(0, __LINE__, __FILE__, "", "")), 0);
+  EXPECT_TRUE(tlrxContains(log(), "\n\nSUCCESSFULL\n\n\n"));
+  EXPECT_FALSE(tlrxContains(log(), "[ERROR ID"));
+  EXPECT_FALSE(tlrxFileExists(working()));
+}
+
 TEST(ErrorCodes, TableAndCatalogueNameTheSameCodesOnce) {
   CErrorCatalogue aCatalogue;
   ASSERT_TRUE(aCatalogue.load(sCatalogue.c_str()));
