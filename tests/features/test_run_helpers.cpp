@@ -2,6 +2,7 @@
 // result headers.
 #include "tlrx_acquisition_dates.h"
 #include "tlrx_description_test_support.h"
+#include "tlrx_description_xml.h"
 #include "tlrx_features_common.h"
 
 #include <gtest/gtest.h>
@@ -51,4 +52,22 @@ TEST(ResultHeaderSetters, AnUndeclaredKeyIsAMissingFieldNamingTheKey) {
     EXPECT_EQ(aMessage, "RasterInfo.Undeclared");
   }
   EXPECT_EQ(tlrxCodeOf([&] { fdfSetHeaderNumber(aHeader, "RasterInfo.Lines", 1e10); }), CTLRX_ERR_DS_TYPE);
+}
+
+// The acquisition time is found in whichever row of "OtherInfo" holds it,
+// by its key as a prefix; no row, no value.
+TEST(ResultHeaderSetters, OtherInfoRowsAreSearchedWholeByKeyPrefix) {
+  CTempDir aDir;
+  tlrxStartLibraryEnvironment(aDir.path());
+  CDescription aHeader;
+  tlrxDeclare(aHeader, aDir.path(), "[RasterInfo]\nOtherInfo = MS\n", {"RasterInfo"});
+  std::string aValue = "unchanged";
+  EXPECT_FALSE(fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aValue));
+  fdfStampOtherInfo(aHeader, "SOFTWARE", "x");
+  fdfStampOtherInfo(aHeader, "SENSOR", "y");
+  EXPECT_FALSE(fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aValue));
+  EXPECT_EQ(aValue, "unchanged");
+  fdfStampOtherInfo(aHeader, "ACQUISITION TIME UTC", "05-MAR-2004 09:30:15.500000");
+  ASSERT_TRUE(fdfFindOtherInfo(aHeader, CTLRX_ACQUISITION_TIME_KEY, aValue));
+  EXPECT_EQ(aValue, "05-MAR-2004 09:30:15.500000");
 }
