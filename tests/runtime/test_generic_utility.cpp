@@ -215,8 +215,8 @@ TEST(AcquisitionDate, ParsesOneDigitDaysAndBlanksAsZerosAndOrdersByDayThenSecond
   }
   STLRXDate aDate;
   for (const char *aText : {"", "05-Mar-2004 09:30:15", "05-MAR-1969 00:00:00", "05-MAR-2101 00:00:00",
-                            "31-APR-2004 00:00:00", "29-FEB-2001 00:00:00", "05/MAR/2004", "xx-MAR-2004 00:00:00",
-                            "05-MAR-20a4 00:00:00"})
+                            "31-APR-2004 00:00:00", "00-MAR-2004 00:00:00", "29-FEB-2001 00:00:00", "05/MAR/2004",
+                            "xx-MAR-2004 00:00:00", "05-MAR-20a4 00:00:00"})
     EXPECT_FALSE(fdfParseAcquisitionDate(aText, aDate)) << aText;
   STLRXDate aEarly, aLate;
   fdfParseAcquisitionDate("31-DEC-2007 23:59:59.000000", aEarly);
