@@ -3,7 +3,7 @@
 #include "tlrx_acquisition_dates.h"
 #include "tlrx_description_test_support.h"
 #include "tlrx_description_xml.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 
 #include <gtest/gtest.h>
 

@@ -6,7 +6,7 @@
 #include "tlrx_driver_guard.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_to_geotiff.h"
 #include "tlrx_result_files.h"

@@ -3,7 +3,7 @@
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 
 #include <utility>
 

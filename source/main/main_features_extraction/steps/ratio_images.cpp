@@ -6,7 +6,7 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_ratio_line.h"

@@ -6,7 +6,7 @@
 
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_result_files.h"
 #include "tlrx_window_measures.h"
 #include "tlrx_window_step.h"

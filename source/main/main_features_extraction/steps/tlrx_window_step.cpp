@@ -4,7 +4,7 @@
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 
@@ -78,42 +78,13 @@ void fdfCheckSameSize(const CWindowInput &theFirst, const CWindowInput &theOther
   }
 }
 
-namespace {
-
-// Resets a copied layout field only where the input set it.
-void fdfResetIfSet(CDescription &theHeader, const char *theKey, double theValue) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  if (aField != nullptr && aField->holdsValue())
-    fdfSetHeaderNumber(theHeader, theKey, theValue);
-}
-
-} // namespace
-
 void fdfMakeWindowResultHeader(CDescription &theResult, const CDescription &theInput, double theNull,
                                const char *theUnits) {
-  fdfDeclareStandardHeader(theResult);
-  theResult = theInput;
-  fdfSetHeaderNumber(theResult, "RasterInfo.HeaderOffset", 0);
-  fdfSetHeaderNumber(theResult, "RasterInfo.RowPrefix", 0);
-  fdfSetHeaderNumber(theResult, "RasterInfo.RowSuffix", 0);
-  fdfSetHeaderText(theResult, "RasterInfo.CellType", "FLOAT");
-  if (theUnits != nullptr)
-    fdfSetHeaderText(theResult, "RasterInfo.DataUnits", theUnits);
-  fdfSetHeaderNumber(theResult, "RasterInfo.NullCellValue", theNull);
-  fdfResetIfSet(theResult, "RasterInfo.FooterLen", 0);
-  fdfResetIfSet(theResult, "RasterInfo.RealScaleFactor", 1.0);
-  fdfResetIfSet(theResult, "RasterInfo.ImaginaryScaleFactor", 1.0);
+  fdfMakeResultHeader(theResult, theInput, "FLOAT", theUnits, theNull);
 }
 
 void fdfStampPairInputs(CDescription &theResult, const CWindowInput &theFirst, const CWindowInput &theSecond) {
-  fdfSetHeaderList(theResult, "RasterInfo.FilesList", {theFirst.name(), theSecond.name()});
-  std::string aTime;
-  if (fdfFindOtherInfo(theFirst.header(), CTLRX_ACQUISITION_TIME_KEY, aTime)) {
-    fdfStampOtherInfo(theResult, "ACQUISITION TIME", aTime.c_str());
-    fdfStampOtherInfo(theResult, "MASTER ACQUISITION TIME", aTime.c_str());
-  }
-  if (fdfFindOtherInfo(theSecond.header(), CTLRX_ACQUISITION_TIME_KEY, aTime))
-    fdfStampOtherInfo(theResult, "SLAVE ACQUISITION TIME", aTime.c_str());
+  fdfStampPairHeaders(theResult, theFirst.name(), theFirst.header(), theSecond.name(), theSecond.header());
 }
 
 void fdfTraceSignificantCount(double theNull, int64_t theCount) {

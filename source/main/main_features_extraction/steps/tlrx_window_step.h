@@ -105,16 +105,11 @@ private:
 // 652807 without a message.
 void fdfCheckSameSize(const CWindowInput &theFirst, const CWindowInput &theOther);
 
-// A float result header made from an input header: cells "FLOAT" with no
-// offset, prefix or suffix, null value theNull, and theUnits as "DataUnits"
-// (nullptr keeps the input's). A footer or scale factors of the input do not
-// describe the written result, so they are reset to none.
+// fdfMakeResultHeader with cells "FLOAT".
 void fdfMakeWindowResultHeader(CDescription &theResult, const CDescription &theInput, double theNull,
                                const char *theUnits);
 
-// The result of a pair: "FilesList" of both names; input 1's acquisition
-// time as "ACQUISITION TIME" and "MASTER ACQUISITION TIME", input 2's as
-// "SLAVE ACQUISITION TIME" (each only when the input has one).
+// fdfStampPairHeaders of the two inputs.
 void fdfStampPairInputs(CDescription &theResult, const CWindowInput &theFirst, const CWindowInput &theSecond);
 
 // Usage text of the two-input steps to the trace, after their argument

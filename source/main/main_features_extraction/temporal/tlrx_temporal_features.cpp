@@ -11,7 +11,7 @@
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_geocoded_stack.h"
 #include "tlrx_raster_to_geotiff.h"

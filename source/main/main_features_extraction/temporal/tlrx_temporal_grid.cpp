@@ -4,7 +4,7 @@
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_map_grid.h"
 #include "tlrx_raster_file.h"

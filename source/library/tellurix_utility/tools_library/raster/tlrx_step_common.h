@@ -41,6 +41,19 @@ void fdfSetHeaderNumber(CDescription &theHeader, const char *theKey, double theV
 // Stores theNames in the string vector theKey.
 void fdfSetHeaderList(CDescription &theHeader, const char *theKey, const std::vector<std::string> &theNames);
 
+// A result header made from an input header: cells theCellType with no
+// offset, prefix or suffix, null value theNull, and theUnits as "DataUnits"
+// (nullptr keeps the input's). A footer or scale factors of the input do not
+// describe the written result, so they are reset to none.
+void fdfMakeResultHeader(CDescription &theResult, const CDescription &theInput, const char *theCellType,
+                         const char *theUnits, double theNull);
+
+// The result of a pair: "FilesList" of both names; the first input's
+// acquisition time as "ACQUISITION TIME" and "MASTER ACQUISITION TIME", the
+// second's as "SLAVE ACQUISITION TIME" (each only when the input has one).
+void fdfStampPairHeaders(CDescription &theResult, const std::string &theFirstName, const CDescription &theFirst,
+                         const std::string &theSecondName, const CDescription &theSecond);
+
 // Writes a result header beside raster theRaster; on failure traces "Error
 // while writing parameter file " and raises theCode with the header name.
 void fdfWriteResultHeader(const std::string &theRaster, CDescription &theHeader, int32_t theCode);

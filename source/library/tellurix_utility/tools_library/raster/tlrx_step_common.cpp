@@ -1,4 +1,4 @@
-#include "tlrx_features_common.h"
+#include "tlrx_step_common.h"
 
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
@@ -107,4 +107,43 @@ void CLineProgress::update(int64_t theLine, int64_t theLines) {
     getAndSetPerc(mLast, aPercent, nullptr);
     mLast = aPercent;
   }
+}
+
+namespace {
+
+// Resets a copied layout field only where the input set it.
+void resetIfSet(CDescription &theHeader, const char *theKey, double theValue) {
+  const CDescriptionField *aField = theHeader.findField(theKey);
+  if (aField != nullptr && aField->holdsValue())
+    fdfSetHeaderNumber(theHeader, theKey, theValue);
+}
+
+} // namespace
+
+void fdfMakeResultHeader(CDescription &theResult, const CDescription &theInput, const char *theCellType,
+                         const char *theUnits, double theNull) {
+  fdfDeclareStandardHeader(theResult);
+  theResult = theInput;
+  fdfSetHeaderNumber(theResult, "RasterInfo.HeaderOffset", 0);
+  fdfSetHeaderNumber(theResult, "RasterInfo.RowPrefix", 0);
+  fdfSetHeaderNumber(theResult, "RasterInfo.RowSuffix", 0);
+  fdfSetHeaderText(theResult, "RasterInfo.CellType", theCellType);
+  if (theUnits != nullptr)
+    fdfSetHeaderText(theResult, "RasterInfo.DataUnits", theUnits);
+  fdfSetHeaderNumber(theResult, "RasterInfo.NullCellValue", theNull);
+  resetIfSet(theResult, "RasterInfo.FooterLen", 0);
+  resetIfSet(theResult, "RasterInfo.RealScaleFactor", 1.0);
+  resetIfSet(theResult, "RasterInfo.ImaginaryScaleFactor", 1.0);
+}
+
+void fdfStampPairHeaders(CDescription &theResult, const std::string &theFirstName, const CDescription &theFirst,
+                         const std::string &theSecondName, const CDescription &theSecond) {
+  fdfSetHeaderList(theResult, "RasterInfo.FilesList", {theFirstName, theSecondName});
+  std::string aTime;
+  if (fdfFindOtherInfo(theFirst, CTLRX_ACQUISITION_TIME_KEY, aTime)) {
+    fdfStampOtherInfo(theResult, "ACQUISITION TIME", aTime.c_str());
+    fdfStampOtherInfo(theResult, "MASTER ACQUISITION TIME", aTime.c_str());
+  }
+  if (fdfFindOtherInfo(theSecond, CTLRX_ACQUISITION_TIME_KEY, aTime))
+    fdfStampOtherInfo(theResult, "SLAVE ACQUISITION TIME", aTime.c_str());
 }
