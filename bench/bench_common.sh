@@ -1,5 +1,29 @@
-# Shared by the command benchmarks (sourced): timing one run as a host runs
-# it, and the medians and ratios of the recorded rounds. Expects $WORK.
+# Shared by the command benchmarks (sourced): the build and the folder of a
+# benchmark, timing one run as a host runs it, and the medians and ratios of
+# the recorded rounds.
+
+# bench_start NAME "PYTHON MODULES" TARGET...: checks the tools, builds the
+# targets in $BUILD (default build_bench, Release, with the bench programs),
+# makes $WORK (removed at exit) and points the runtime's folders at it. Sets
+# ROOT, BUILD, PYTHON and WORK.
+bench_start() {
+  local aName=$1 aModules=$2
+  shift 2
+  ROOT=$(cd "$(dirname "$0")/.." && pwd)
+  BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
+  PYTHON=${TLRX_BENCH_PYTHON:-/usr/bin/python3}
+  command -v /usr/bin/time >/dev/null || { echo "$aName: /usr/bin/time is not installed" >&2; exit 2; }
+  for aModule in $aModules; do
+    "$PYTHON" -c "import $aModule" 2>/dev/null ||
+      { echo "$aName: $PYTHON lacks $aModule (apt-get install python3-$aModule)" >&2; exit 2; }
+  done
+  cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_TESTS=OFF -DTLRX_BUILD_BENCH=ON >/dev/null
+  cmake --build "$BUILD" -j2 --target "$@" >/dev/null
+  WORK=$(mktemp -d "/tmp/tlrx_$aName.XXXXXX")
+  trap 'rm -rf "$WORK"' EXIT
+  export TELLURIX_INIT_DIR="$BUILD/etc/tellurix" TELLURIX_WORKING_DIR="$WORK/" TELLURIX_BATCH_DIR="$WORK/"
+  printf '0\n\n' >"$WORK/Process.working"
+}
 
 # One run: wall, user, system seconds and peak resident kilobytes.
 timed() {

@@ -10,23 +10,10 @@
 # Usage: bench/bench_coregistration.sh [rounds] [peer windows]   (default 5, 60)
 # The build goes to $TLRX_BENCH_BUILD (default build_bench) in Release.
 set -euo pipefail
+source "$(dirname "$0")/bench_common.sh"
 ROUNDS=${1:-5}
 PEER_COUNT=${2:-60}
-ROOT=$(cd "$(dirname "$0")/.." && pwd)
-BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
-PYTHON=${TLRX_BENCH_PYTHON:-/usr/bin/python3}
-"$PYTHON" -c "import numpy" 2>/dev/null ||
-  { echo "bench_coregistration: $PYTHON lacks numpy (apt-get install python3-numpy)" >&2; exit 2; }
-
-cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_TESTS=OFF -DTLRX_BUILD_BENCH=ON >/dev/null
-cmake --build "$BUILD" -j2 --target bench_coregistration tlrx_simulate >/dev/null
-
-WORK=$(mktemp -d /tmp/tlrx_bench_coreg.XXXXXX)
-trap 'rm -rf "$WORK"' EXIT
-export TELLURIX_INIT_DIR="$BUILD/etc/tellurix"
-export TELLURIX_WORKING_DIR="$WORK/"
-export TELLURIX_BATCH_DIR="$WORK/"
-printf '0\n\n' >"$WORK/Process.working"
+bench_start bench_coreg "numpy" bench_coregistration tlrx_simulate
 "$BUILD/bin/tlrx_simulate" slc --out "$WORK/pair" --lines 4096 --pixels 4096 --coherence 0.8 --shift 0.3,-0.45 \
   >"$WORK/simulate.log" 2>&1 || { cat "$WORK/simulate.log" >&2; exit 1; }
 
@@ -51,7 +38,6 @@ declare -A KEYS=(
   echo '</COREGISTRATION_CMD><MAIN_CMD><TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment></MAIN_CMD></HEADER_INFO>'
 } >"$WORK/coherence.xml"
 
-median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
 for ((aRound = 0; aRound < ROUNDS; ++aRound)); do
   # Cold page cache is not ours to set: both sides read the files from memory.
   "$BUILD/bin/bench_coregistration" "$WORK/pair" "$WORK/coherence.xml" "$WORK/pair_par" >>"$WORK/ours.txt"

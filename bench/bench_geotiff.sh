@@ -8,24 +8,12 @@
 # Usage: bench/bench_geotiff.sh [side] [rounds]    (default 4096, 5)
 # The build goes to $TLRX_BENCH_BUILD (default build_bench) in Release.
 set -euo pipefail
+source "$(dirname "$0")/bench_common.sh"
 
 SIDE=${1:-4096}
 ROUNDS=${2:-5}
-ROOT=$(cd "$(dirname "$0")/.." && pwd)
-BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
-
-for aTool in gdal_translate /usr/bin/time; do
-  command -v "$aTool" >/dev/null || { echo "bench_geotiff: $aTool is not installed" >&2; exit 2; }
-done
-
-cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_BENCH=ON -DTLRX_BUILD_TESTS=OFF >/dev/null
-cmake --build "$BUILD" -j2 --target bench_geotiff tlrx_simulate >/dev/null
-
-WORK=$(mktemp -d /tmp/tlrx_bench_geotiff.XXXXXX)
-trap 'rm -rf "$WORK"' EXIT
-export TELLURIX_INIT_DIR="$BUILD/etc/tellurix"
-export TELLURIX_WORKING_DIR="$WORK/"
-export TELLURIX_BATCH_DIR="$WORK/"
+command -v gdal_translate >/dev/null || { echo "bench_geotiff: gdal_translate is not installed" >&2; exit 2; }
+bench_start bench_geotiff "" bench_geotiff tlrx_simulate
 
 "$BUILD/bin/tlrx_simulate" series --out "$WORK/scene" --count 1 --lines "$SIDE" --pixels "$SIDE" \
   --units AMPLITUDE --cell-type FLOAT --looks 1 --utm 32S >"$WORK/simulate.log" 2>&1 ||
@@ -44,12 +32,6 @@ interleave = bsq
 byte order = 0
 EOF
 
-# One run: wall, user, system seconds and peak resident kilobytes.
-timed() {
-  /usr/bin/time -f "%e %U %S %M" -o "$WORK/time.txt" "$@" >/dev/null 2>&1
-  cat "$WORK/time.txt"
-}
-
 # The first conversion also gives the stretch window for GDAL.
 "$BUILD/bin/bench_geotiff" "$RASTER" "$WORK/ours.tif" >"$WORK/first.log" 2>&1 || { cat "$WORK/first.log" >&2; exit 1; }
 field() { sed -n "s:.*<$1>\(.*\)</$1>.*:\1:p" "$WORK/ours.tif.sml" | head -n 1; }
@@ -65,7 +47,6 @@ for ((aRound = 0; aRound < ROUNDS; ++aRound)); do
 done
 [ -s "$WORK/ours.tif" ] && [ -s "$WORK/gdal.tif" ] || { echo "bench_geotiff: a conversion failed" >&2; exit 1; }
 
-median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] : (v[NR / 2] + v[NR / 2 + 1]) / 2 }'; }
 column() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$1" | median; }
 
 MB=$(awk -v s="$SIDE" 'BEGIN { print s * s * 4 / 1048576 }')

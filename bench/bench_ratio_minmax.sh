@@ -11,21 +11,10 @@ set -euo pipefail
 source "$(dirname "$0")/bench_common.sh"
 
 ROUNDS=${1:-5}
-ROOT=$(cd "$(dirname "$0")/.." && pwd)
-BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
-PYTHON=${TLRX_BENCH_PYTHON:-/usr/bin/python3}
 RATIO_SIDE=4096
 STACK_SIDE=2048
 STACK_COUNT=8
-
-command -v /usr/bin/time >/dev/null || { echo "bench: /usr/bin/time is not installed" >&2; exit 2; }
-"$PYTHON" -c "import numpy" 2>/dev/null || { echo "bench: $PYTHON lacks numpy" >&2; exit 2; }
-cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_TESTS=OFF >/dev/null
-cmake --build "$BUILD" -j2 --target main_features_extraction main_delete_file tlrx_simulate >/dev/null
-
-WORK=$(mktemp -d /tmp/tlrx_bench_ratio.XXXXXX)
-trap 'rm -rf "$WORK"' EXIT
-export TELLURIX_INIT_DIR="$BUILD/etc/tellurix" TELLURIX_WORKING_DIR="$WORK/" TELLURIX_BATCH_DIR="$WORK/"
+bench_start bench_ratio "numpy" main_features_extraction main_delete_file tlrx_simulate
 NULL=$(sed -n 14p "$TELLURIX_INIT_DIR/Tellurix_configuration.ini")
 SIM="$BUILD/bin/tlrx_simulate"
 common=(--cell-type FLOAT --null "$NULL" --nodata-fraction 0.001)

@@ -22,24 +22,9 @@ source "$(dirname "$0")/bench_common.sh"
 SIDE=${1:-2048}
 ROUNDS=${2:-3}
 COUNT=8
-ROOT=$(cd "$(dirname "$0")/.." && pwd)
-BUILD=${TLRX_BENCH_BUILD:-$ROOT/build_bench}
-PYTHON=${TLRX_BENCH_PYTHON:-/usr/bin/python3}
 PEAK_LIMIT_KB=$((64 * 1024))
 FLAT_LIMIT_KB=2048
-
-command -v /usr/bin/time >/dev/null || { echo "bench_temporal: /usr/bin/time is not installed" >&2; exit 2; }
-"$PYTHON" -c "import numpy" 2>/dev/null ||
-  { echo "bench_temporal: $PYTHON lacks numpy (apt-get install python3-numpy)" >&2; exit 2; }
-
-cmake -S "$ROOT" -B "$BUILD" -DCMAKE_BUILD_TYPE=Release -DTLRX_BUILD_TESTS=OFF >/dev/null
-cmake --build "$BUILD" -j2 --target main_features_extraction main_delete_file tlrx_simulate >/dev/null
-
-WORK=$(mktemp -d /tmp/tlrx_bench_temporal.XXXXXX)
-trap 'rm -rf "$WORK"' EXIT
-export TELLURIX_INIT_DIR="$BUILD/etc/tellurix"
-export TELLURIX_WORKING_DIR="$WORK/"
-export TELLURIX_BATCH_DIR="$WORK/"
+bench_start bench_temporal "numpy" main_features_extraction main_delete_file tlrx_simulate
 NULL=-9999
 
 simulate() {
