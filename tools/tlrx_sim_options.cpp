@@ -11,6 +11,7 @@
 
 #include <cerrno>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <limits>
@@ -384,11 +385,25 @@ const SSimOptionSpec sOptionTable[] = {
     {"--topography", "RAD", CTLRX_SIM_SLC, "adds hills of peak phase RAD radians to the interferometric phase",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mTopography = parseAnyReal(n, v); }},
     {"--doppler", "F1,F2", CTLRX_SIM_SLC,
-     "Doppler centroids of master and slave as fractions of the PRF, -0.5..0.5 (azimuth spectra centred there)",
+     "Doppler centroids of master and slave as fractions of the PRF, -0.5..0.5: both see one reflectivity, each "
+     "through the azimuth band of width PRF / OSR_AZ centred at its own centroid, the same content at the same "
+     "frequency (centroids are ground frequencies: 0.45 and -0.45 lie 0.9 PRF apart), so the pair's coherence is "
+     "g (1 - |F1 - F2| OSR_AZ) until both are filtered to the common band",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        const std::vector<std::string> aItems = splitFields(n, v, 2, "F1,F2");
        for (size_t i = 0; i < 2; ++i)
          o.mDoppler[i] = parseReal(n, aItems[i], -0.5, 0.5, "a number in -0.5..0.5");
+     }},
+    {"--range-band-shift", "F", CTLRX_SIM_SLC,
+     "geometric decorrelation: master and slave see one reflectivity through range bands moved by F times the "
+     "range bandwidth, 0 <= F < 1, the master the lower end and the slave the upper end, each brought to "
+     "baseband; master x conj(slave) then shows a range fringe of F / OSR cycles per pixel and a coherence "
+     "1 - F times the chosen one until both are filtered to the common band (needs (1 + F) / OSR <= 1, so "
+     "that the reflectivity's band fits the sampling)",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       o.mRangeBandShift = parseReal(n, v, 0.0, 1.0, "a number in 0..1 (1 excluded)");
+       if (o.mRangeBandShift >= 1.0)
+         failValue(n, "a number in 0..1 (1 excluded)", v);
      }},
 
     {nullptr, nullptr, 0, "Constant image", nullptr},
@@ -479,6 +494,13 @@ void checkUnits(SSimOptions &theOptions) {
     theOptions.mUnits = "SLC";
     if (theOptions.mFieldGiven && (theOptions.mShift[0] != 0.0 || theOptions.mShift[1] != 0.0))
       throw CSimUsageError("give either --shift or --shift-field, not both");
+    if ((1.0 + theOptions.mRangeBandShift) / theOptions.mBandOversampling[0] > 1.0 + 1e-12) {
+      char aText[200];
+      std::snprintf(aText, sizeof aText,
+                    "option --range-band-shift: a shift of %g needs a range band oversampling of at least %g, not %g",
+                    theOptions.mRangeBandShift, 1.0 + theOptions.mRangeBandShift, theOptions.mBandOversampling[0]);
+      throw CSimUsageError(aText);
+    }
     return;
   }
   if (theOptions.mCommand == CTLRX_SIM_PAIR && aComplex)

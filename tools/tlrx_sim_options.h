@@ -139,6 +139,7 @@ struct SSimOptions {
   double mField[6] = {0, 0, 0, 0, 0, 0};    // R0, RX, RY, A0, AX, AY
   double mTopography = 0.0;                 // peak phase of the hills, radians
   double mDoppler[2] = {0.0, 0.0};          // centroid of master and slave, fraction of the PRF
+  double mRangeBandShift = 0.0;             // range band offset of the slave, fraction of the bandwidth
   std::vector<std::pair<SSimBox, double>> mCoherenceBoxes;
   // constant
   bool mValueGiven = false;

@@ -1,9 +1,17 @@
 // Single-look complex pair (see tlrx_sim_slc.h). The images are held whole in
 // double precision: band-limiting and moving them are global operations.
 //
-// Master a and an independent field n are white circular Gaussian noise
-// filtered to |f| <= 1 / (2 osr) in each direction (unit mean power); the
-// slave before its move is g a + sqrt(1 - g^2) n. A constant shift multiplies
+// One white circular Gaussian reflectivity w and an independent field n are
+// seen by each image through its own band (unit mean power): in azimuth
+// |f - fDC| <= 1 / (2 osr) around the image's Doppler centroid, over ground
+// frequencies (beyond +-0.5 cycle per line they are other content, which
+// aliases into the sampled interval), in range
+// |f| <= 1 / (2 osr) after the reflectivity was moved by -c (w e^(-2 pi i c x),
+// c = -F b / 2 for the master and +F b / 2 for the slave, b = 1 / osr), so
+// both see the same content at the same ground frequency. The master is B_m w,
+// the slave before its move g B_s w + sqrt(1 - g^2) B_s n, which is the model
+// g w + sqrt(1 - g^2) n seen through the slave's band while g stays sharp at
+// coherence-box edges. A constant shift multiplies
 // the slave's spectrum by e^(-2 pi i (f_x dx + f_y dy)). An affine field
 // x_s = x + R0 + RX x + RY y, y_s = y + A0 + AX x + AY y is inverted to the
 // master position of every slave pixel and the slave evaluated there, column
@@ -57,29 +65,82 @@ double signedFrequency(int64_t theK, int64_t theN) {
   return static_cast<double>(2 * theK <= theN ? theK : theK - theN) / static_cast<double>(theN);
 }
 
-// White noise filtered to the band (centred at theDoppler cycles per line in
-// azimuth), scaled to unit mean power.
-TImage speckle(const SSimOptions &theOptions, int64_t theImage, double theDoppler) {
+// The band of one image: its azimuth centroid (cycles per line) and the
+// offset of its range band on the ground (cycles per pixel).
+struct SSimBand {
+  double mDoppler = 0.0;
+  double mRangeCentre = 0.0;
+  bool operator==(const SSimBand &theOther) const {
+    return mDoppler == theOther.mDoppler && mRangeCentre == theOther.mRangeCentre;
+  }
+};
+
+// The spectrum of the white reflectivity of stream theImage: unit-power
+// circular Gaussian noise moved by -theRangeCentre in range (white noise stays
+// white), transformed. theAlias numbers the copy of the azimuth frequency
+// interval: the ground frequency s + theAlias (s in [-0.5, 0.5] cycles per
+// line) is another ground frequency than s, with content of its own, which
+// only shows at s after sampling.
+TImage reflectivitySpectrum(const SSimOptions &theOptions, int64_t theImage, int64_t theAlias, double theRangeCentre) {
   const int32_t aLines = theOptions.mLines, aPixels = theOptions.mPixels;
   TImage aImage(static_cast<size_t>(aLines) * static_cast<size_t>(aPixels));
-  CSimRandom aRandom(fdfSimKey(theOptions.mSeed, CTLRX_SIM_STREAM_SPECKLE, theImage));
+  CSimRandom aRandom(fdfSimKey(theOptions.mSeed, CTLRX_SIM_STREAM_SPECKLE, theImage, theAlias));
   const double aHalf = std::sqrt(0.5);
   for (TComplex &aValue : aImage)
     aValue = TComplex(aHalf * aRandom.normal(), aHalf * aRandom.normal());
-  CSimFft aForward(aImage, aLines, aPixels, FFTW_FORWARD), aInverse(aImage, aLines, aPixels, FFTW_BACKWARD);
+  if (theRangeCentre != 0.0) {
+    // Ground frequency k + c lands on baseband k.
+    std::vector<TComplex> aTurn(static_cast<size_t>(aPixels));
+    for (int32_t p = 0; p < aPixels; ++p)
+      aTurn[static_cast<size_t>(p)] = std::polar(1.0, -2.0 * CTLRX_SIM_PI * theRangeCentre * p);
+    for (size_t i = 0; i < aImage.size(); ++i)
+      aImage[i] *= aTurn[i % static_cast<size_t>(aPixels)];
+  }
+  CSimFft aForward(aImage, aLines, aPixels, FFTW_FORWARD);
   aForward.run();
+  return aImage;
+}
+
+// The reflectivity of stream theImage seen through theBand, scaled to unit
+// mean power. The same stream through two bands gives the same content at
+// the same ground frequency; an azimuth band reaching past +-0.5 cycle per
+// line takes the frequencies beyond from the neighbouring copy.
+TImage speckle(const SSimOptions &theOptions, int64_t theImage, const SSimBand &theBand) {
+  const int32_t aLines = theOptions.mLines, aPixels = theOptions.mPixels;
+  // Per azimuth bin: 0 outside the band, else 1 + the copy (0, 1 or 2 for -1, 0, +1).
+  std::vector<int> aCopy(static_cast<size_t>(aLines), 0);
+  for (int32_t l = 0; l < aLines; ++l) {
+    const double aSigned = signedFrequency(l, aLines);
+    const double aAlias = -std::round(aSigned - theBand.mDoppler);
+    const bool aInAzimuth = std::fabs(aSigned + aAlias - theBand.mDoppler) <= 0.5 / theOptions.mBandOversampling[1];
+    aCopy[static_cast<size_t>(l)] = aInAzimuth ? 2 + static_cast<int>(aAlias) : 0;
+  }
+  std::vector<char> aInRange(static_cast<size_t>(aPixels));
+  int64_t aRangeKept = 0;
+  for (int32_t p = 0; p < aPixels; ++p) {
+    aInRange[static_cast<size_t>(p)] = std::fabs(signedFrequency(p, aPixels)) <= 0.5 / theOptions.mBandOversampling[0];
+    aRangeKept += aInRange[static_cast<size_t>(p)];
+  }
+  TImage aImage = reflectivitySpectrum(theOptions, theImage, 0, theBand.mRangeCentre);
   int64_t aKept = 0;
   for (int32_t l = 0; l < aLines; ++l) {
-    double aFl = signedFrequency(l, aLines) - theDoppler;
-    aFl -= std::round(aFl);
-    const bool aInAzimuth = std::fabs(aFl) <= 0.5 / theOptions.mBandOversampling[1];
-    for (int32_t p = 0; p < aPixels; ++p) {
-      const bool aIn = aInAzimuth && std::fabs(signedFrequency(p, aPixels)) <= 0.5 / theOptions.mBandOversampling[0];
-      TComplex &aValue = aImage[static_cast<size_t>(l) * aPixels + p];
-      aValue = aIn ? aValue : TComplex(0.0, 0.0);
-      aKept += aIn ? 1 : 0;
-    }
+    const bool aRow = aCopy[static_cast<size_t>(l)] == 2;
+    aKept += aCopy[static_cast<size_t>(l)] != 0 ? aRangeKept : 0;
+    for (int32_t p = 0; p < aPixels; ++p)
+      if (!aRow || !aInRange[static_cast<size_t>(p)])
+        aImage[static_cast<size_t>(l) * aPixels + p] = TComplex(0.0, 0.0);
   }
+  for (const int aAlias : {-1, 1}) {
+    if (std::find(aCopy.begin(), aCopy.end(), 2 + aAlias) == aCopy.end())
+      continue;
+    const TImage aOther = reflectivitySpectrum(theOptions, theImage, aAlias, theBand.mRangeCentre);
+    for (int32_t l = 0; l < aLines; ++l)
+      if (aCopy[static_cast<size_t>(l)] == 2 + aAlias)
+        for (int32_t p = 0; p < aPixels; ++p)
+          if (aInRange[static_cast<size_t>(p)])
+            aImage[static_cast<size_t>(l) * aPixels + p] = aOther[static_cast<size_t>(l) * aPixels + p];
+  }
+  CSimFft aInverse(aImage, aLines, aPixels, FFTW_BACKWARD);
   aInverse.run();
   // The forward and inverse pair multiplies by the cell count; the band keeps
   // aKept of the cells' power.
@@ -98,16 +159,21 @@ double coherenceAt(const SSimOptions &theOptions, int32_t theLine, int32_t thePi
   return std::clamp(aCoherence, 0.0, 1.0); // the ramp continues into the margin
 }
 
+// A move along azimuth turns each frequency by its true value: the one
+// nearest the slave's centroid, not the sampled one in [-0.5, 0.5).
 void constantShift(const SSimOptions &theOptions, TImage &theImage) {
   const int32_t aLines = theOptions.mLines, aPixels = theOptions.mPixels;
   CSimFft aForward(theImage, aLines, aPixels, FFTW_FORWARD), aInverse(theImage, aLines, aPixels, FFTW_BACKWARD);
   aForward.run();
-  for (int32_t l = 0; l < aLines; ++l)
+  const double aCentroid = theOptions.mDoppler[1];
+  for (int32_t l = 0; l < aLines; ++l) {
+    const double aSampled = signedFrequency(l, aLines);
+    const double aAzimuth = aSampled - std::round(aSampled - aCentroid);
     for (int32_t p = 0; p < aPixels; ++p)
       theImage[static_cast<size_t>(l) * aPixels + p] *=
           std::polar(1.0 / static_cast<double>(theImage.size()),
-                     -2.0 * CTLRX_SIM_PI *
-                         (signedFrequency(p, aPixels) * theOptions.mShift[0] + signedFrequency(l, aLines) * theOptions.mShift[1]));
+                     -2.0 * CTLRX_SIM_PI * (signedFrequency(p, aPixels) * theOptions.mShift[0] + aAzimuth * theOptions.mShift[1]));
+  }
   aInverse.run();
 }
 
@@ -119,14 +185,20 @@ void affineShift(const SSimOptions &theOptions, TImage &theImage) {
   const double p1 = (1.0 + f[5]) / aDet, p2 = -f[2] / aDet, q1 = -f[4] / aDet, q2 = (1.0 + f[1]) / aDet;
   const double p0 = -(p1 * f[0] + p2 * f[3]), q0 = -(q1 * f[0] + q2 * f[3]);
   const int32_t aLines = theOptions.mLines, aPixels = theOptions.mPixels;
+  const double aCentroid = theOptions.mDoppler[1];
   TImage aColumn(static_cast<size_t>(aLines));
   for (int32_t c = 0; c < aPixels; ++c) {
+    // The column is brought to zero frequency around the slave's centroid
+    // for the evaluation and turned back at the evaluated positions.
     for (int32_t l = 0; l < aLines; ++l)
-      aColumn[static_cast<size_t>(l)] = theImage[static_cast<size_t>(l) * aPixels + c];
+      aColumn[static_cast<size_t>(l)] =
+          theImage[static_cast<size_t>(l) * aPixels + c] * std::polar(1.0, -2.0 * CTLRX_SIM_PI * aCentroid * l);
     // Master column c sits near slave range x_s = (1 + RX) c + R0 + RY y_s.
-    fdfSimEvaluateAffine(aColumn, q0 + q1 * ((1.0 + f[1]) * c + f[0]), q2 + q1 * f[2]);
+    const double aStart = q0 + q1 * ((1.0 + f[1]) * c + f[0]), aStep = q2 + q1 * f[2];
+    fdfSimEvaluateAffine(aColumn, aStart, aStep);
     for (int32_t l = 0; l < aLines; ++l)
-      theImage[static_cast<size_t>(l) * aPixels + c] = aColumn[static_cast<size_t>(l)];
+      theImage[static_cast<size_t>(l) * aPixels + c] =
+          aColumn[static_cast<size_t>(l)] * std::polar(1.0, 2.0 * CTLRX_SIM_PI * aCentroid * (aStart + aStep * l));
   }
   TImage aLine(static_cast<size_t>(aPixels));
   for (int32_t l = 0; l < aLines; ++l) {
@@ -183,9 +255,10 @@ void writeImage(const SSimOptions &theOptions, int32_t theImage, const TImage &t
   aSpec.mUnits = "SLC";
   aSpec.mDate = theOptions.mDates.at(static_cast<size_t>(theImage - 1));
   char aNote[240];
-  std::snprintf(aNote, sizeof aNote, "tlrx_simulate slc image %d of 2, coherence %g, osr %g,%g, seed %llu", theImage,
+  std::snprintf(aNote, sizeof aNote,
+                "tlrx_simulate slc image %d of 2, coherence %g, osr %g,%g, range band shift %g, seed %llu", theImage,
                 theOptions.mCoherence0, theOptions.mBandOversampling[0], theOptions.mBandOversampling[1],
-                static_cast<unsigned long long>(theOptions.mSeed));
+                theOptions.mRangeBandShift, static_cast<unsigned long long>(theOptions.mSeed));
   aSpec.mNote = aNote;
   CSimRasterWriter aWriter(theOptions, aSpec);
   // The header is written by finish(): the SAR fields go in before.
@@ -256,26 +329,33 @@ void fdfSimWriteSlcPair(const SSimOptions &theOptions) {
   aGrid.mPixels += 2 * aPad;
   aGrid.mField[0] -= (theOptions.mField[1] + theOptions.mField[2]) * aPad;
   aGrid.mField[3] -= (theOptions.mField[4] + theOptions.mField[5]) * aPad;
-  TImage aMaster = speckle(aGrid, 1, theOptions.mDoppler[0]);
-  TImage aSlave = speckle(aGrid, 2, theOptions.mDoppler[0]);
-  const size_t aPixels = static_cast<size_t>(aGrid.mPixels);
-  for (int32_t l = 0; l < aGrid.mLines; ++l)
-    for (int32_t p = 0; p < aGrid.mPixels; ++p) {
-      const double g = coherenceAt(theOptions, l - aPad, p - aPad);
-      TComplex &aValue = aSlave[static_cast<size_t>(l) * aPixels + static_cast<size_t>(p)];
-      aValue = g * aMaster[static_cast<size_t>(l) * aPixels + static_cast<size_t>(p)] + std::sqrt(1.0 - g * g) * aValue;
-    }
+  const double aRangeOffset = 0.5 * theOptions.mRangeBandShift / theOptions.mBandOversampling[0];
+  const SSimBand aMasterBand{theOptions.mDoppler[0], -aRangeOffset}, aSlaveBand{theOptions.mDoppler[1], aRangeOffset};
+  TImage aMaster = speckle(aGrid, 1, aMasterBand);
+  TImage aSlave = speckle(aGrid, 2, aSlaveBand);
+  {
+    // The master's reflectivity through the slave's band (the master itself
+    // when the bands agree).
+    const TImage aCommon = aSlaveBand == aMasterBand ? TImage() : speckle(aGrid, 1, aSlaveBand);
+    const TImage &aSeen = aCommon.empty() ? aMaster : aCommon;
+    const size_t aPixels = static_cast<size_t>(aGrid.mPixels);
+    for (int32_t l = 0; l < aGrid.mLines; ++l)
+      for (int32_t p = 0; p < aGrid.mPixels; ++p) {
+        const double g = coherenceAt(theOptions, l - aPad, p - aPad);
+        const size_t i = static_cast<size_t>(l) * aPixels + static_cast<size_t>(p);
+        aSlave[i] = g * aSeen[i] + std::sqrt(1.0 - g * g) * aSlave[i];
+      }
+  }
   if (theOptions.mFieldGiven)
     affineShift(aGrid, aSlave);
   else if (theOptions.mShift[0] != 0.0 || theOptions.mShift[1] != 0.0)
     constantShift(aGrid, aSlave);
-  // The slave's azimuth spectrum moved to its own Doppler centroid; fringes
-  // turn the slave so that master x conj(slave) carries the phase.
+  // Fringes turn the slave so that master x conj(slave) carries the phase.
+  const size_t aPixels = static_cast<size_t>(aGrid.mPixels);
   for (int32_t l = 0; l < aGrid.mLines; ++l)
     for (int32_t p = 0; p < aGrid.mPixels; ++p)
       aSlave[static_cast<size_t>(l) * aPixels + static_cast<size_t>(p)] *=
-          std::polar(1.0, 2.0 * CTLRX_SIM_PI * (theOptions.mDoppler[1] - theOptions.mDoppler[0]) * l -
-                              phaseAt(theOptions, l - aPad, p - aPad));
+          std::polar(1.0, -phaseAt(theOptions, l - aPad, p - aPad));
   writeImage(theOptions, 1, aMaster, aGrid.mPixels, theOptions.mDoppler[0]);
   aMaster = TImage();
   writeImage(theOptions, 2, aSlave, aGrid.mPixels, theOptions.mDoppler[1]);

@@ -374,6 +374,11 @@ TEST_F(SimulateTest, BadCommandLinesExitWithTwoTheMessageAndTheUsageLine) {
        "raster name 'x.sml' ends in '.sml', which names a header file; choose another --out"},
       {{"--seed", "-1"}, "option --seed: expected an integer in 0..18446744073709551615, got '-1'"},
       {{"--scale-factor", "0"}, "option --scale-factor: expected a positive number, got '0'"},
+      {{"slc", "--out", "x", "--range-band-shift", "1"},
+       "option --range-band-shift: expected a number in 0..1 (1 excluded), got '1'"},
+      {{"slc", "--out", "x", "--range-band-shift", "0.3"},
+       "option --range-band-shift: a shift of 0.3 needs a range band oversampling of at least 1.3, not 1.2"},
+      {{"pair", "--out", "x", "--range-band-shift", "0.1"}, "option --range-band-shift does not apply to pair"},
   };
   for (const SCase &aCase : aCases) {
     std::vector<std::string> aArgs = aCase.mArgs;
@@ -418,3 +423,49 @@ TEST_F(SimulateTest, WriteFailuresAndMissingConfigurationExitWithOneClippingWarn
 }
 
 } // namespace
+
+// One reflectivity seen through each image's band: every image's spectrum is
+// centred at its own Doppler centroid in azimuth (lag-one correlation phase)
+// and at 0 in range, and master x conj(slave) has no azimuth fringe, a range
+// fringe of F / osr and coherence g (1 - F) (1 - |dfDC| osr); centroids 0.45
+// and -0.45 are 0.9 of the PRF apart and share nothing, although both bands
+// cross the +-0.5 wrap.
+TEST_F(SimulateTest, SlcPairSeesOneReflectivityThroughBandsMovedByTheDopplerAndTheRangeShift) {
+  const struct {
+    const char *mDoppler, *mShift, *mCoherence;
+    double mMaster, mSlave, mExpected;
+  } aCases[] = {{"0.1,0", "0", "1", 0.1, 0.0, 0.88},          {"0,0", "0.15", "1", 0.0, 0.0, 0.85},
+                {"-0.05,0.05", "0.2", "0.7", -0.05, 0.05, 0.7 * 0.8 * 0.88}, {"0.45,-0.45", "0", "1", 0.45, -0.45, 0.0}};
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(std::string(aCase.mDoppler) + " " + aCase.mShift);
+    simulate({"slc", "--out", file("d"), "--lines", "256", "--pixels", "256", "--doppler", aCase.mDoppler,
+              "--range-band-shift", aCase.mShift, "--coherence", aCase.mCoherence});
+    const std::vector<std::complex<float>> aM = rawCells<std::complex<float>>(file("d_1"));
+    const std::vector<std::complex<float>> aS = rawCells<std::complex<float>>(file("d_2"));
+    ASSERT_EQ(aM.size(), 256u * 256u);
+    const double aFringe = std::atof(aCase.mShift) / 1.2;
+    std::complex<double> aCross = 0.0, aLag[2][2] = {{0.0, 0.0}, {0.0, 0.0}};
+    double aPower1 = 0.0, aPower2 = 0.0;
+    for (size_t i = 0; i < aM.size(); ++i) {
+      const std::complex<double> m(aM[i]), s(aS[i]);
+      aCross += m * std::conj(s) * std::polar(1.0, -2.0 * CTLRX_PI * aFringe * double(i % 256));
+      aPower1 += std::norm(m);
+      aPower2 += std::norm(s);
+      if (i + 256 < aM.size()) {
+        aLag[0][0] += std::complex<double>(aM[i + 256]) * std::conj(m);
+        aLag[1][0] += std::complex<double>(aS[i + 256]) * std::conj(s);
+      }
+      if (i % 256 != 255) {
+        aLag[0][1] += std::complex<double>(aM[i + 1]) * std::conj(m);
+        aLag[1][1] += std::complex<double>(aS[i + 1]) * std::conj(s);
+      }
+    }
+    EXPECT_NEAR(std::abs(aCross) / std::sqrt(aPower1 * aPower2), aCase.mExpected, 0.03);
+    if (aCase.mExpected > 0.5)
+      EXPECT_NEAR(std::arg(aCross), 0.0, 0.1);
+    EXPECT_NEAR(std::arg(aLag[0][0]) / (2 * CTLRX_PI), aCase.mMaster, 0.01);
+    EXPECT_NEAR(std::arg(aLag[1][0]) / (2 * CTLRX_PI), aCase.mSlave, 0.01);
+    EXPECT_NEAR(std::arg(aLag[0][1]), 0.0, 0.05);
+    EXPECT_NEAR(std::arg(aLag[1][1]), 0.0, 0.05);
+  }
+}
