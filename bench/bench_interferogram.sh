@@ -28,8 +28,8 @@ simulate "$WORK/pair" "$SIDE"
 simulate "$WORK/half" $((SIDE / 2))
 # The co-registration parameters: the master's header with the shifts.
 parameters() {
-  sed 's:</HEADER_INFO>::' "$1_1_hdr" >"$2_hdr"
-  cat >>"$2_hdr" <<XML
+  sed 's:</HEADER_INFO>::' "$1_1.sml" >"$2.sml"
+  cat >>"$2.sml" <<XML
 <interferometric_processing>
 <DRangePoly><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">0.3</ValueDouble></VectorDouble></DRangePoly>
 <DAzimuthPoly><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">-0.45</ValueDouble></VectorDouble></DAzimuthPoly>

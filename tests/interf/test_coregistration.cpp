@@ -6,6 +6,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_init_from_xml_schema.h"
 #include "tlrx_interf_utility.h"
+#include "tlrx_slc_test_support.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
 #include "tlrx_trace_test_support.h"
@@ -39,12 +40,8 @@ protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
 
-  // tlrx_simulate slc ROOT with the options; ROOT_1 master, ROOT_2 slave.
   std::string simulate(const std::string &theRoot, std::vector<std::string> theOptions) {
-    theOptions.insert(theOptions.begin(), {"slc", "--out", mDir.file(theRoot)});
-    const STLRXRun aRun = tlrxRun("tlrx_simulate", theOptions, mDir.path());
-    EXPECT_EQ(aRun.mExitStatus, 0) << aRun.mOutput;
-    return mDir.file(theRoot);
+    return tlrxSimulateSlc(mDir, theRoot, std::move(theOptions));
   }
 
   // The command's parameter file: the defaults with theChanges ("" removes a key).

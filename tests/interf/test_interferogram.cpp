@@ -9,6 +9,7 @@
 #include "tlrx_header_expect.h"
 #include "tlrx_hires_interf_SLC_with_sint.h"
 #include "tlrx_raster_file.h"
+#include "tlrx_slc_test_support.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
 #include "tlrx_trace_test_support.h"
@@ -25,22 +26,7 @@ namespace {
 using TCell = std::complex<float>;
 constexpr double sPi = 3.14159265358979323846;
 
-struct SImage {
-  int mLines = 0, mPixels = 0;
-  std::vector<TCell> mCells;
-  TCell at(int theLine, int thePixel) const { return mCells[static_cast<size_t>(theLine) * mPixels + thePixel]; }
-};
-
-SImage readComplex(const std::string &theName) {
-  CRasterFile aRaster;
-  aRaster.open_read(theName.c_str());
-  SImage aImage{aRaster.getNrOfLinesPerImage(), aRaster.getNrOfPixelsPerLine(), {}};
-  aImage.mCells.resize(static_cast<size_t>(aImage.mLines) * aImage.mPixels);
-  for (int l = 0; l < aImage.mLines; ++l)
-    aRaster.getComplexLine(aImage.mCells.data() + static_cast<size_t>(l) * aImage.mPixels, l);
-  aRaster.close();
-  return aImage;
-}
+using SImage = STLRXTestSlc;
 
 // Coherence of the multilooked product over a whole image, with a phase
 // model removed: |sum z sqrt(Pm Ps) e^(-i phase)| / sqrt(sum Pm sum Ps).
@@ -65,42 +51,39 @@ protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
 
-  // tlrx_simulate slc ROOT; ROOT_1 master, ROOT_2 slave.
   std::string simulate(const std::string &theRoot, std::vector<std::string> theOptions) {
-    theOptions.insert(theOptions.begin(), {"slc", "--out", mDir.file(theRoot)});
-    const STLRXRun aRun = tlrxRun("tlrx_simulate", theOptions, mDir.path());
-    EXPECT_EQ(aRun.mExitStatus, 0) << aRun.mOutput;
-    return mDir.file(theRoot);
+    return tlrxSimulateSlc(mDir, theRoot, std::move(theOptions));
   }
 
-  // The co-registration parameter file: the master's header with constant
-  // shifts and their inverse (theInverse false leaves the inverse out).
-  std::string parameters(const std::string &theMaster, double theRange, double theAzimuth, bool theInverse = true) {
+  // The co-registration parameter file theName: the master's header with
+  // constant shifts in polynomials of theTerms terms and their inverse
+  // (theInverse false leaves the inverse out).
+  std::string parameters(const std::string &theMaster, double theRange, double theAzimuth, int theTerms = 3,
+                         bool theInverse = true, const std::string &theName = "pair_par") {
     CDescription aParameters;
     fdfReadStandardHeader(theMaster.c_str(), aParameters);
-    const auto aSet = [&](const char *theKey, std::vector<double> theValues) {
-      CDescriptionField &aField = aParameters.getField(theKey);
-      aField.setNumberOfElements(static_cast<int32_t>(theValues.size()));
-      for (size_t i = 0; i < theValues.size(); ++i)
-        aField.setDouble(static_cast<int32_t>(i), theValues[i]);
+    const auto aSet = [&](const char *theKey, double theShift) {
+      CDescriptionField &aField = aParameters.getField((std::string("interferometric_processing.") + theKey).c_str());
+      aField.setNumberOfElements(theTerms);
+      for (int32_t i = 0; i < theTerms; ++i)
+        aField.setDouble(i, i == 0 ? theShift : 0.0);
     };
-    aSet("interferometric_processing.DRangePoly", {theRange, 0, 0});
-    aSet("interferometric_processing.DAzimuthPoly", {theAzimuth, 0, 0});
+    aSet("DRangePoly", theRange);
+    aSet("DAzimuthPoly", theAzimuth);
     if (theInverse) {
-      aSet("interferometric_processing.DRangePolyInv", {-theRange, 0, 0});
-      aSet("interferometric_processing.DAzimuthPolyInv", {-theAzimuth, 0, 0});
+      aSet("DRangePolyInv", -theRange);
+      aSet("DAzimuthPolyInv", -theAzimuth);
     }
-    const std::string aName = mDir.file("pair_par");
-    EXPECT_TRUE(fdfWriteStandardHeader(aName.c_str(), aParameters));
-    return aName;
+    EXPECT_TRUE(fdfWriteStandardHeader(mDir.file(theName).c_str(), aParameters));
+    return mDir.file(theName);
   }
 
-  // Runs the generator on ROOT_1, ROOT_2 into OUT_mpwr, OUT_spwr, OUT_int
-  // with arguments 7 onwards.
+  // Runs the generator on ROOT_1 and ROOT_2 (or theSlave) into OUT_mpwr,
+  // OUT_spwr, OUT_int with arguments 7 onwards.
   void run(const std::string &theRoot, const std::string &theOut, std::vector<std::string> theRest,
-           const std::string &theParameters = "") {
-    std::vector<std::string> aArgs = {"tlrx_hires_interf_SLC_with_sint", theRoot + "_1", theRoot + "_2",
-                                      theParameters.empty() ? mDir.file("pair_par") : theParameters,
+           const std::string &theSlave = "") {
+    std::vector<std::string> aArgs = {"tlrx_hires_interf_SLC_with_sint", theRoot + "_1",
+                                      theSlave.empty() ? theRoot + "_2" : theSlave, mDir.file("pair_par"),
                                       mDir.file(theOut + "_mpwr"), mDir.file(theOut + "_spwr"),
                                       mDir.file(theOut + "_int")};
     aArgs.insert(aArgs.end(), theRest.begin(), theRest.end());
@@ -112,7 +95,7 @@ protected:
 
   // Coherence of OUT's product with the phase model removed.
   double coherence(const std::string &theOut, const std::function<double(int, int)> &thePhase) {
-    return globalCoherence(readComplex(mDir.file(theOut + "_int")), tlrxReadTestRaster(mDir.file(theOut + "_mpwr")),
+    return globalCoherence(tlrxReadSlc(mDir.file(theOut + "_int")), tlrxReadTestRaster(mDir.file(theOut + "_mpwr")),
                            tlrxReadTestRaster(mDir.file(theOut + "_spwr")), thePhase);
   }
 
@@ -142,15 +125,8 @@ TEST_F(Interferogram, ImageWithItselfGivesUnitMagnitudeAndZeroPhase) {
   }
   for (const int aRangeLooks : {1, 2}) {
     SCOPED_TRACE(aRangeLooks);
-    // The master as its own slave.
-    std::vector<std::string> aFull = {"tlrx_hires_interf_SLC_with_sint", aRoot + "_1", aRoot + "_1",
-                                      mDir.file("pair_par"), mDir.file("s_mpwr"), mDir.file("s_spwr"),
-                                      mDir.file("s_int"), std::to_string(aRangeLooks), "1", "NotOK"};
-    std::vector<char *> aArgv;
-    for (std::string &aArg : aFull)
-      aArgv.push_back(aArg.data());
-    ASSERT_EQ(tlrx_hires_interf_SLC_with_sint(static_cast<int>(aArgv.size()), aArgv.data()), 0);
-    const SImage aZ = readComplex(mDir.file("s_int"));
+    run(aRoot, "s", {std::to_string(aRangeLooks), "1", "NotOK"}, aRoot + "_1"); // the master as its own slave
+    const SImage aZ = tlrxReadSlc(mDir.file("s_int"));
     const std::vector<double> aMaster = tlrxReadTestRaster(mDir.file("s_mpwr")),
                               aSlavePower = tlrxReadTestRaster(mDir.file("s_spwr"));
     ASSERT_EQ(aZ.mPixels, 48 / aRangeLooks);
@@ -183,7 +159,7 @@ TEST_F(Interferogram, ShiftIsUndoneAndPhaseRampRecovered) {
   run(aRoot, "out", {"1", "1", "NotOK"});
   const auto aRamp = [](int l, int p) { return 2 * sPi * (0.005 * (l - 0.61) + 0.01 * (p + 0.37)); };
   EXPECT_GE(coherence("out", aRamp), 0.998);
-  const SImage aZ = readComplex(mDir.file("out_int"));
+  const SImage aZ = tlrxReadSlc(mDir.file("out_int"));
   std::complex<double> aResidual;
   for (int l = 8; l < aZ.mLines - 8; ++l)
     for (int p = 8; p < aZ.mPixels - 8; ++p) {
@@ -331,7 +307,7 @@ TEST_F(Interferogram, BlockSizeDoesNotChangeTheResult) {
   CDescription aHeader;
   fdfReadStandardHeader(mDir.file("msbf_int").c_str(), aHeader);
   EXPECT_STREQ(aHeader.getField("RasterInfo.BytesOrder").getString(), "MSBF");
-  EXPECT_EQ(readComplex(mDir.file("msbf_int")).mCells, readComplex(mDir.file("small_int")).mCells);
+  EXPECT_EQ(tlrxReadSlc(mDir.file("msbf_int")).mCells, tlrxReadSlc(mDir.file("small_int")).mCells);
 }
 
 // Positions 20 and 21: the kernel table beside the interferogram, and the
@@ -351,9 +327,9 @@ TEST_F(Interferogram, KernelFileAndCoregisteredPair) {
   while (aRow >> aValue)
     aSum += aValue;
   EXPECT_NEAR(aSum, 1.0, 1e-5) << "every row has unit sum";
-  const SImage aMaster = readComplex(aRoot + "_1"), aMasterRsp = readComplex(mDir.file("rsp_1_rsp"));
+  const SImage aMaster = tlrxReadSlc(aRoot + "_1"), aMasterRsp = tlrxReadSlc(mDir.file("rsp_1_rsp"));
   EXPECT_EQ(aMaster.mCells, aMasterRsp.mCells);
-  const SImage aSlave = readComplex(aRoot + "_2"), aSlaveRsp = readComplex(mDir.file("rsp_2_rsp"));
+  const SImage aSlave = tlrxReadSlc(aRoot + "_2"), aSlaveRsp = tlrxReadSlc(mDir.file("rsp_2_rsp"));
   // A whole-pixel shift: master pixel p is slave pixel p + 1, up to the kernel's rounding.
   for (int l = 0; l < 40; ++l)
     for (int p = 4; p < 27; ++p)
@@ -393,7 +369,7 @@ TEST_F(Interferogram, ShiftRastersSyntheticPhaseAndIncidence) {
   run(aRoot, "rasters", {"1", "1", "NotOK", "-", "NotOK", "NotOK", "5000", "50", "NotOK", "NotOK", aRange, aAzimuth});
   EXPECT_EQ(tlrxReadFile(mDir.file("rasters_int")), tlrxReadFile(mDir.file("poly_int")));
   run(aRoot, "flat", {"-2", "1", aPhase, "-", "NotOK", "NotOK", "5000", "50", aIncidence, aIncidence});
-  const SImage aZ = readComplex(mDir.file("flat_int"));
+  const SImage aZ = tlrxReadSlc(mDir.file("flat_int"));
   // Single-look phases are noisy where the speckle is dark: lines are compared.
   for (int l = 8; l < n - 8; ++l) {
     std::complex<double> aSum;
@@ -419,25 +395,8 @@ TEST_F(Interferogram, FailuresRaiseTheirCodes) {
     aHeader.getField("RasterInfo.CellType").setString("FLOAT");
     ASSERT_TRUE(fdfWriteStandardHeader((aFloat + "_2").c_str(), aHeader));
   }
-  const std::string aPar = parameters(aRoot + "_1", 0, 0);
-  const std::string aNoInverse = mDir.file("noinv_par");
-  {
-    const std::string aTemp = parameters(aRoot + "_1", 0, 0, false);
-    CDescription aHeader;
-    fdfReadStandardHeader(aTemp.c_str(), aHeader);
-    ASSERT_TRUE(fdfWriteStandardHeader(aNoInverse.c_str(), aHeader));
-    parameters(aRoot + "_1", 0, 0);
-  }
-  const std::string aSeven = mDir.file("seven_par");
-  {
-    CDescription aHeader;
-    fdfReadStandardHeader(aPar.c_str(), aHeader);
-    CDescriptionField &aField = aHeader.getField("interferometric_processing.DAzimuthPoly");
-    aField.setNumberOfElements(7);
-    for (int32_t i = 0; i < 7; ++i)
-      aField.setDouble(i, 0.0);
-    ASSERT_TRUE(fdfWriteStandardHeader(aSeven.c_str(), aHeader));
-  }
+  const std::string aPar = parameters(aRoot + "_1", 0, 0), aNoInverse = parameters(aRoot + "_1", 0, 0, 3, false, "noinv"),
+                    aSeven = parameters(aRoot + "_1", 0, 0, 7, true, "seven");
   const std::string m = aRoot + "_1", s = aRoot + "_2", o = mDir.file("o");
   const struct {
     std::vector<std::string> mArgs;
@@ -455,7 +414,7 @@ TEST_F(Interferogram, FailuresRaiseTheirCodes) {
        "DRangePolyInv, or DAzimuthPolyInv in " + aNoInverse,
        "Error: missing parameter field DRangePolyInv, or DAzimuthPolyInv"},
       {{m, s, aSeven, o + "m", o + "s", o + "i", "1", "1", "NotOK"}, CTLRX_ERR_DS_TYPE,
-       "interferometric_processing.DAzimuthPoly: 7 terms in " + aSeven, nullptr},
+       "interferometric_processing.DRangePoly: 7 terms in " + aSeven, nullptr},
       {{m, s, aPar, o + "m", o + "s", s, "1", "1", "NotOK"}, CTLRX_ERR_PARAMETER_FILE, s, nullptr},
       {{m, s, aPar, o + "m", o + "s", o + "i", "x", "1", "NotOK"}, CTLRX_ERR_ARGUMENTS,
        "range looks: not an integer [x]", nullptr},

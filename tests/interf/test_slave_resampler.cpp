@@ -6,6 +6,7 @@
 #include "tlrx_fft.h"
 #include "tlrx_interf_utility.h"
 #include "tlrx_slave_resampler.h"
+#include "tlrx_slc_test_support.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_test_support.h"
 
@@ -17,33 +18,7 @@
 
 namespace {
 
-using TImage = std::vector<TLRXComplex>; // lines x pixels, line after line
-
-double wrap(double theCycles) { return theCycles - std::floor(theCycles + 0.5); }
-
-// A periodic n x n scene, azimuth spectrum centred at theCentre (cycles per
-// line), both bands 1 / 1.2 wide; the slave is the scene, the truth the scene
-// seen at (x + dR, y + dA).
-void speckle(int n, double theCentre, double theDr, double theDa, TImage &theSlave, TImage &theTruth, int theSeed) {
-  std::mt19937 aRandom(theSeed);
-  std::normal_distribution<float> aNormal;
-  CFftBuffer aA(size_t(n * n)), aB(size_t(n * n));
-  for (size_t i = 0; i < aA.size(); ++i)
-    aA[i] = TLRXComplex(aNormal(aRandom), aNormal(aRandom));
-  fdfFftPlan(n, n, ETLRXFftDirection::FORWARD).execute(aA.data());
-  for (int r = 0; r < n; ++r)
-    for (int c = 0; c < n; ++c) {
-      const double aFr = wrap(double(r) / n - theCentre) + theCentre, aFc = wrap(double(c) / n);
-      const size_t i = size_t(r * n + c);
-      const bool aIn = std::fabs(aFr - theCentre) <= 0.5 / 1.2 && std::fabs(aFc) <= 0.5 / 1.2;
-      aA[i] = aIn ? aA[i] / float(n) : TLRXComplex(0, 0);
-      aB[i] = aA[i] * TLRXComplex(std::polar(1.0, 2 * M_PI * (aFc * theDr + aFr * theDa)));
-    }
-  fdfFftPlan(n, n, ETLRXFftDirection::INVERSE).execute(aA.data());
-  fdfFftPlan(n, n, ETLRXFftDirection::INVERSE).execute(aB.data());
-  theSlave.assign(aA.data(), aA.data() + n * n);
-  theTruth.assign(aB.data(), aB.data() + n * n);
-}
+using TImage = TLRXTestImage;
 
 CSlaveResampler::TLineReader readerOf(const TImage &theImage, int thePixels, std::map<int, int> *theCounts = nullptr) {
   return [&theImage, thePixels, theCounts](int32_t theLine, TLRXComplex *theCells) {
@@ -71,20 +46,6 @@ std::vector<int> lines(int theFrom, int theTo, int theStep = 1) {
   return aLines;
 }
 
-// |sum a conj(b)| / sqrt(sum |a|^2 sum |b|^2) over the square [theFrom, theTo)^2.
-double coherence(const TImage &theA, const TImage &theB, int thePixels, int theFrom, int theTo) {
-  std::complex<double> aCross = 0;
-  double aA = 0, aB = 0;
-  for (int r = theFrom; r < theTo; ++r)
-    for (int c = theFrom; c < theTo; ++c) {
-      const std::complex<double> a = theA[size_t(r * thePixels + c)], b = theB[size_t(r * thePixels + c)];
-      aCross += a * std::conj(b);
-      aA += std::norm(a);
-      aB += std::norm(b);
-    }
-  return std::abs(aCross) / std::sqrt(aA * aB);
-}
-
 // Mean coherence over fractional shifts 0.1 .. 0.9 in azimuth (and in range
 // too unless theAzimuthOnly) of speckle centred at theCentre.
 double meanCoherence(double theCentre, const std::vector<double> &theCentroid, bool theAzimuthOnly) {
@@ -94,9 +55,9 @@ double meanCoherence(double theCentre, const std::vector<double> &theCentroid, b
   for (double aDa = 0.1; aDa < 1.0; aDa += 0.2)
     for (double aDr = theAzimuthOnly ? 0.0 : 0.1; aDr < 1.0; aDr += theAzimuthOnly ? 1.0 : 0.2, ++aCount) {
       TImage aSlave, aTruth;
-      speckle(n, theCentre, aDr, aDa, aSlave, aTruth, 100 + aCount);
+      tlrxSpeckle(n, n, theCentre, aDr, aDa, 100 + aCount, aSlave, aTruth);
       CPolynomialShiftField aField({aDr}, {aDa});
-      aSum += coherence(resample(aSlave, n, n, n, aField, theCentroid, lines(0, n)), aTruth, n, 10, n - 10);
+      aSum += tlrxCoherence(resample(aSlave, n, n, n, aField, theCentroid, lines(0, n)), aTruth, n, 10, n - 10);
     }
   return aSum / aCount;
 }
@@ -149,7 +110,7 @@ TEST(SlaveResampler, AffineFieldWithCrossTermsMatchesDirectEvaluation) {
           aSignal(x + fdfCoregPolyValue(aRange, x, y), y + fdfCoregPolyValue(aAzimuth, x, y));
     }
   CPolynomialShiftField aField(aRange, aAzimuth);
-  const double g = coherence(resample(aSlave, n, n, n, aField, {}, lines(0, n)), aTruth, n, 10, n - 12);
+  const double g = tlrxCoherence(resample(aSlave, n, n, n, aField, {}, lines(0, n)), aTruth, n, 10, n - 12);
   EXPECT_GT(g, 0.999);
   std::printf("affine field with cross terms: coherence %.6f\n", g);
 }
@@ -233,7 +194,7 @@ TEST(SlaveResampler, LinesAreReadOnceAndMemoryFollowsTheShiftSpread) {
 TEST(SlaveResampler, ResultsDoNotDependOnWhichLinesWereReadTogether) {
   const int n = 64;
   TImage aSlave, aTruth;
-  speckle(n, 0.2, 0, 0, aSlave, aTruth, 5);
+  tlrxSpeckle(n, n, 0.2, 0, 0, 5, aSlave, aTruth);
   const std::vector<double> aRange = {0.7, 1e-3, -2e-3}, aAzimuth = {1.3, -2e-3, 5e-3, 0, 1e-5};
   std::vector<double> aCentroid(n);
   for (int x = 0; x < n; ++x)
@@ -345,7 +306,7 @@ TEST_F(SlaveResamplerFiles, DopplerFromHeaderFollowsTheRangeTimePolynomial) {
 TEST(SlaveResamplerDoppler, CentroidIsEstimatedFromTheData) {
   const int n = 512;
   TImage aSlave, aTruth;
-  speckle(n, 0.0, 0, 0, aSlave, aTruth, 9);
+  tlrxSpeckle(n, n, 0.0, 0, 0, 9, aSlave, aTruth);
   for (const auto &aCase : {std::pair<double, double>{0.3, 0.0}, {-0.45, 0.0}, {0.4, 4e-4}}) {
     TImage aMoved = aSlave;
     for (int y = 0; y < n; ++y)
@@ -354,7 +315,7 @@ TEST(SlaveResamplerDoppler, CentroidIsEstimatedFromTheData) {
     const std::vector<double> aEstimate = fdfEstimateDoppler(readerOf(aMoved, n), n, n);
     ASSERT_EQ(aEstimate.size(), size_t(n));
     for (int x = 0; x < n; x += 15) {
-      EXPECT_NEAR(wrap(aEstimate[size_t(x)] - aCase.first - aCase.second * x), 0.0, 0.01) << aCase.first << " " << x;
+      EXPECT_NEAR(std::remainder(aEstimate[size_t(x)] - aCase.first - aCase.second * x, 1.0), 0.0, 0.01) << aCase.first << " " << x;
       EXPECT_TRUE(aEstimate[size_t(x)] >= -0.5 && aEstimate[size_t(x)] < 0.5);
     }
   }

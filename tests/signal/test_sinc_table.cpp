@@ -3,6 +3,7 @@
 // 1.2) shifted by a Fourier phase ramp, which is exact for such data.
 #include "tlrx_fft.h"
 #include "tlrx_sinc_table.h"
+#include "tlrx_slc_test_support.h"
 
 #include <gtest/gtest.h>
 
@@ -14,53 +15,19 @@ namespace {
 
 constexpr int CTLRX_LINE = 2048;
 
-// A periodic band-limited line (|f| <= 0.5 / osr) and the same line moved so
-// that truth(i) = line(i + theShift).
-void speckleLine(std::mt19937 &theRandom, double theOsr, double theShift, std::vector<TLRXComplex> &theLine,
-                 std::vector<TLRXComplex> &theTruth) {
-  const int n = CTLRX_LINE;
-  std::normal_distribution<float> aNormal;
-  CFftBuffer aA(n), aB(n);
-  for (int i = 0; i < n; ++i)
-    aA[size_t(i)] = TLRXComplex(aNormal(theRandom), aNormal(theRandom));
-  fdfFftPlan(1, n, ETLRXFftDirection::FORWARD).execute(aA.data());
-  for (int k = 0; k < n; ++k) {
-    const double f = (2 * k <= n ? k : k - n) / double(n);
-    aA[size_t(k)] = std::fabs(f) <= 0.5 / theOsr ? aA[size_t(k)] / float(n) : TLRXComplex(0, 0);
-    aB[size_t(k)] = aA[size_t(k)] * TLRXComplex(std::polar(1.0, 2 * M_PI * f * theShift));
-  }
-  fdfFftPlan(1, n, ETLRXFftDirection::INVERSE).execute(aA.data());
-  fdfFftPlan(1, n, ETLRXFftDirection::INVERSE).execute(aB.data());
-  theLine.assign(aA.data(), aA.data() + n);
-  theTruth.assign(aB.data(), aB.data() + n);
-}
-
-// |sum a conj(b)| / sqrt(sum |a|^2 sum |b|^2) over [theFrom, theTo).
-double coherence(const std::vector<TLRXComplex> &theA, const std::vector<TLRXComplex> &theB, int theFrom, int theTo) {
-  std::complex<double> aCross = 0;
-  double aA = 0, aB = 0;
-  for (int i = theFrom; i < theTo; ++i) {
-    aCross += std::complex<double>(theA[size_t(i)]) * std::conj(std::complex<double>(theB[size_t(i)]));
-    aA += std::norm(theA[size_t(i)]);
-    aB += std::norm(theB[size_t(i)]);
-  }
-  return std::abs(aCross) / std::sqrt(aA * aB);
-}
-
 // Mean and least coherence of the kernel over shifts 0.05 .. 0.95.
 std::pair<double, double> kernelCoherence(double theKernelOsr) {
-  std::mt19937 aRandom(7);
   const CSincTable aTable(theKernelOsr);
   double aSum = 0, aMin = 1;
   int aCount = 0;
   for (double d = 0.05; d < 1.0; d += 0.1, ++aCount) {
-    std::vector<TLRXComplex> aLine, aTruth, aOut(CTLRX_LINE);
-    speckleLine(aRandom, 1.2, d, aLine, aTruth);
+    TLRXTestImage aLine, aTruth, aOut(CTLRX_LINE);
+    tlrxSpeckle(1, CTLRX_LINE, 0.0, d, 0.0, unsigned(7 + aCount), aLine, aTruth);
     std::vector<double> aPositions(CTLRX_LINE);
     for (int i = 0; i < CTLRX_LINE; ++i)
       aPositions[size_t(i)] = i + d;
     fdfSincResampleLine(aTable, aLine.data(), CTLRX_LINE, aPositions.data(), CTLRX_LINE, aOut.data());
-    const double g = coherence(aOut, aTruth, 16, CTLRX_LINE - 16);
+    const double g = tlrxCoherence(aOut, aTruth, CTLRX_LINE, 16, CTLRX_LINE - 16, 0, 1);
     aSum += g;
     aMin = std::min(aMin, g);
   }
