@@ -416,6 +416,11 @@ TEST_F(Interferogram, FailuresRaiseTheirCodes) {
       {{m, s, aSeven, o + "m", o + "s", o + "i", "1", "1", "NotOK"}, CTLRX_ERR_DS_TYPE,
        "interferometric_processing.DRangePoly: 7 terms in " + aSeven, nullptr},
       {{m, s, aPar, o + "m", o + "s", s, "1", "1", "NotOK"}, CTLRX_ERR_PARAMETER_FILE, s, nullptr},
+      {{m, s, aPar, o + "m", mDir.path() + "./om", o + "i", "1", "1", "NotOK"}, CTLRX_ERR_PARAMETER_FILE,
+       mDir.path() + "./om", nullptr}, // one result spelled two ways
+      {{m, m, aPar, o + "m", o + "s", o + "i", "1", "1", "NotOK", "-", "NotOK", "NotOK", "100", "10", "NotOK", "NotOK",
+        "NotOK", "NotOK", "-", "NotOK", "OK"}, // both co-registered images would be bad_1_rsp
+       CTLRX_ERR_PARAMETER_FILE, mDir.file("bad_1_rsp"), nullptr},
       {{m, s, aPar, o + "m", o + "s", o + "i", "x", "1", "NotOK"}, CTLRX_ERR_ARGUMENTS,
        "range looks: not an integer [x]", nullptr},
       {{m, s, aPar, o + "m", o + "s", o + "i", "1", "0", "NotOK"}, CTLRX_ERR_ARGUMENTS,

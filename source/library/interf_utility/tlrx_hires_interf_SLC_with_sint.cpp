@@ -354,8 +354,12 @@ std::string resampledName(const SInterfArguments &theArgs, const std::string &th
 }
 
 // The table of the interpolation kernel, one row per fraction.
+std::string kernelName(const SInterfArguments &theArgs) {
+  return folderOf(theArgs.mInterferogram) + "interf_interpolator.dat";
+}
+
 void writeKernelFile(const SInterfArguments &theArgs, CPendingFiles &thePending) {
-  const std::string aName = folderOf(theArgs.mInterferogram) + "interf_interpolator.dat";
+  const std::string aName = kernelName(theArgs);
   const std::string aPart = fdfPartName(aName);
   thePending.addFile(aPart);
   FILE *aFile = std::fopen(aPart.c_str(), "w");
@@ -572,24 +576,30 @@ private:
                    const SRangeBand *theSlaveBand) {
     mMasterOversampler.process(theMaster.data(), theMasterBand, mMasterOver.data());
     mSlaveOversampler.process(theSlave.data(), theSlaveBand, mSlaveOver.data());
+    // Parts spelled out: the library's complex product checks for NaN on
+    // every call, and this loop runs on every oversampled sample.
     const size_t aCount = mMasterOver.size();
     mProduct.resize(aCount);
-    for (size_t i = 0; i < aCount; ++i)
-      mProduct[i] = mMasterOver[i] * std::conj(mSlaveOver[i]);
+    const float *m = reinterpret_cast<const float *>(mMasterOver.data());
+    const float *s = reinterpret_cast<const float *>(mSlaveOver.data());
+    float *z = reinterpret_cast<float *>(mProduct.data());
+    for (size_t i = 0; i < 2 * aCount; i += 2) {
+      z[i] = m[i] * s[i] + m[i + 1] * s[i + 1];
+      z[i + 1] = m[i + 1] * s[i] - m[i] * s[i + 1];
+    }
     dropNoData(theMaster, theSlave);
     if (mPhase != nullptr)
       removePhase(theLine);
-    const int32_t aGroup = mLooks.mGroup;
-    for (int32_t p = 0; p < mOutPixels; ++p) {
-      std::complex<double> aProduct;
-      double aMaster = 0.0, aSlave = 0.0;
-      for (int32_t k = 0; k < aGroup; ++k) {
-        const size_t i = static_cast<size_t>(p) * aGroup + k;
-        aProduct += std::complex<double>(mProduct[i]);
-        aMaster += std::norm(mMasterOver[i]);
-        aSlave += std::norm(mSlaveOver[i]);
+    const size_t aGroup = static_cast<size_t>(mLooks.mGroup);
+    for (size_t p = 0; p < static_cast<size_t>(mOutPixels); ++p) {
+      double aRe = 0.0, aIm = 0.0, aMaster = 0.0, aSlave = 0.0;
+      for (size_t i = 2 * p * aGroup; i < 2 * (p + 1) * aGroup; i += 2) {
+        aRe += z[i];
+        aIm += z[i + 1];
+        aMaster += double(m[i]) * m[i] + double(m[i + 1]) * m[i + 1];
+        aSlave += double(s[i]) * s[i] + double(s[i + 1]) * s[i + 1];
       }
-      mSumProduct[p] += aProduct;
+      mSumProduct[p] += std::complex<double>(aRe, aIm);
       mSumMaster[p] += aMaster;
       mSumSlave[p] += aSlave;
     }
@@ -627,9 +637,9 @@ private:
       if (aD > CTLRX_INTERF_EPSILON || aD < -CTLRX_INTERF_EPSILON) {
         // Rounding of the sums can take |z| a hair above 1; coherence never is.
         std::complex<double> aZ = mSumProduct[p] / aD;
-        const double aMagnitude = std::abs(aZ);
-        if (aMagnitude > 1.0)
-          aZ /= aMagnitude;
+        const double aNorm = std::norm(aZ);
+        if (aNorm > 1.0)
+          aZ /= std::sqrt(aNorm);
         mOutInterferogram[p] = TCell(static_cast<float>(aZ.real()), static_cast<float>(aZ.imag()));
         ++mProcessed;
       } else {
@@ -689,6 +699,8 @@ void refuseClashes(const SInterfArguments &theArgs) {
   if (theArgs.mWriteResampled)
     for (const char *aInput : {theArgs.mMaster, theArgs.mSlave})
       aFiles.addResult(resampledName(theArgs, aInput), false);
+  if (theArgs.mWriteKernel)
+    aFiles.addResult(kernelName(theArgs), false);
   aFiles.refuseClashes(CTLRX_ERR_PARAMETER_FILE);
 }
 

@@ -11,12 +11,6 @@ namespace {
 
 constexpr double CTLRX_SINC_PI = 3.14159265358979323846;
 
-// Row of a fraction in [0, 1], clamped (a NaN gives row 0).
-int32_t rowOf(double theFraction) {
-  const double aRow = std::nearbyint(theFraction * CTLRX_SINC_STEPS);
-  return aRow >= 0.0 ? static_cast<int32_t>(std::min(aRow, double(CTLRX_SINC_STEPS))) : 0;
-}
-
 } // namespace
 
 double CSincTable::knab(double theX, double theV) {
@@ -46,21 +40,6 @@ CSincTable::CSincTable(double theOversampling)
     for (int32_t k = 0; k < CTLRX_SINC_TAPS; ++k)
       mRows[static_cast<size_t>(r) * CTLRX_SINC_TAPS + k] = static_cast<float>(aWeights[k] / aSum);
   }
-}
-
-const float *CSincTable::weights(double theFraction) const {
-  return mRows.data() + static_cast<size_t>(rowOf(theFraction)) * CTLRX_SINC_TAPS;
-}
-
-void fdfSplitPosition(double thePosition, int64_t &theFirst, double &theFraction) {
-  const double aFloor = std::floor(thePosition);
-  int32_t aRow = rowOf(thePosition - aFloor);
-  theFirst = static_cast<int64_t>(aFloor);
-  if (aRow == CTLRX_SINC_STEPS) {
-    ++theFirst;
-    aRow = 0;
-  }
-  theFraction = double(aRow) / CTLRX_SINC_STEPS;
 }
 
 void fdfSincResampleLine(const CSincTable &theTable, const std::complex<float> *theIn, int32_t theCount,

@@ -9,6 +9,8 @@
 // fractional shift.
 #pragma once
 
+#include <algorithm>
+#include <cmath>
 #include <complex>
 #include <cstdint>
 #include <vector>
@@ -26,9 +28,18 @@ public:
   // The CTLRX_SINC_TAPS weights for a fraction in [0, 1): row
   // round(fraction x CTLRX_SINC_STEPS); the row at 1 is the row of 0 moved by
   // one sample, so callers pass floor and fraction from fdfSplitPosition.
-  const float *weights(double theFraction) const;
+  const float *weights(double theFraction) const {
+    return mRows.data() + static_cast<size_t>(rowOf(theFraction)) * CTLRX_SINC_TAPS;
+  }
   // Unit-test access to the kernel itself.
   static double knab(double theX, double theV);
+
+  // Row of a fraction in [0, 1] (nearest, halves up), clamped; a NaN gives
+  // row 0.
+  static int32_t rowOf(double theFraction) {
+    const double aRow = theFraction * CTLRX_SINC_STEPS + 0.5;
+    return aRow >= 1.0 ? static_cast<int32_t>(std::min(aRow, double(CTLRX_SINC_STEPS))) : 0;
+  }
 
 private:
   std::vector<float> mRows; // (CTLRX_SINC_STEPS + 1) x CTLRX_SINC_TAPS
@@ -36,7 +47,17 @@ private:
 
 // p = first + fraction with fraction in [0, 1) after rounding to the table's
 // step (a fraction that rounds to 1 moves to the next sample).
-void fdfSplitPosition(double thePosition, int64_t &theFirst, double &theFraction);
+// Inline: it runs once per resampled value.
+inline void fdfSplitPosition(double thePosition, int64_t &theFirst, double &theFraction) {
+  const double aFloor = std::floor(thePosition);
+  int32_t aRow = CSincTable::rowOf(thePosition - aFloor);
+  theFirst = static_cast<int64_t>(aFloor);
+  if (aRow == CTLRX_SINC_STEPS) {
+    ++theFirst;
+    aRow = 0;
+  }
+  theFraction = double(aRow) / CTLRX_SINC_STEPS;
+}
 
 // Interpolates theIn (theCount samples, sample j at j) at thePositions
 // (theOutCount of them) into theOut. Taps outside 0 .. theCount - 1 count as

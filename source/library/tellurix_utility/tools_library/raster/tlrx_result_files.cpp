@@ -19,6 +19,19 @@ void fdfAddRasterFiles(std::vector<std::string> &theFiles, const std::string &th
     theFiles.push_back(aHeader);
 }
 
+// Whether two names, of files that may not exist yet, are one entry: the
+// same name in the same folder however the folder is spelled.
+bool sameEntry(const std::string &theFirst, const std::string &theSecond) {
+  const auto aSplit = [](const std::string &theName) {
+    const size_t aSlash = theName.find_last_of('/');
+    return aSlash == std::string::npos ? std::make_pair(std::string("."), theName)
+                                       : std::make_pair(theName.substr(0, aSlash + 1), theName.substr(aSlash + 1));
+  };
+  const auto aFirst = aSplit(theFirst), aSecond = aSplit(theSecond);
+  return theFirst == theSecond || fdfSameFile(theFirst, theSecond) ||
+         (aFirst.second == aSecond.second && fdfSameFile(aFirst.first, aSecond.first));
+}
+
 } // namespace
 
 void CRunFiles::addInput(const std::string &theName) { fdfAddRasterFiles(mReads, theName); }
@@ -36,6 +49,13 @@ void CRunFiles::refuseClashes(int32_t theCode) const {
       fdfTraceMessage("Error: the result %s is named like a header file\n", aResult.c_str());
       TLRX_RAISE(theCode, aResult.c_str());
     }
+  // Two results under one name would write into one temporary file.
+  for (size_t i = 0; i < mResults.size(); ++i)
+    for (size_t j = i + 1; j < mResults.size(); ++j)
+      if (sameEntry(mResults[i], mResults[j])) {
+        fdfTraceMessage("Error: two results are named %s\n", mResults[j].c_str());
+        TLRX_RAISE(theCode, mResults[j].c_str());
+      }
   for (const std::string &aWrite : mWrites)
     for (const std::string &aRead : mReads)
       if (fdfSameFile(aWrite, aRead)) {

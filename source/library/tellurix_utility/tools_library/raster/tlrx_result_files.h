@@ -26,8 +26,9 @@ public:
   void addResult(const std::string &theName, bool theTiff);
 
   // Raises theCode naming the first file to be written that is one of the
-  // files read (the same file however it is spelled), or a result named like
-  // a header file (its header would be written over it).
+  // files read (the same file however it is spelled), a result named like a
+  // header file (its header would be written over it), or a result named
+  // like another.
   void refuseClashes(int32_t theCode) const;
 
 private:
