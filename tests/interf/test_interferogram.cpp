@@ -19,6 +19,7 @@
 #include <cmath>
 #include <complex>
 #include <functional>
+#include <numeric>
 #include <sstream>
 
 namespace {
@@ -211,6 +212,15 @@ TEST_F(Interferogram, CommonBandFiltersRecoverTheCoherence) {
   run(aRoot, "filtered", {"-2", "1", "NotOK", "-", "OK", "NotOK"});
   EXPECT_GE(coherence("filtered", aRamp), 0.97);
   EXPECT_NE(log().find("mean spectral shift: 0.166"), std::string::npos);
+  // A master header without the range bandwidth skips the filter, saying so.
+  CDescription aHeader;
+  fdfReadStandardHeader((aRoot + "_1").c_str(), aHeader);
+  aHeader.getField("ChannelInfo.RangeBandwidth").clear();
+  ASSERT_TRUE(fdfWriteStandardHeader((aRoot + "_1").c_str(), aHeader));
+  run(aRoot, "skipped", {"-2", "1", "NotOK", "-", "OK", "NotOK"});
+  EXPECT_EQ(tlrxReadFile(mDir.file("skipped_int")), tlrxReadFile(mDir.file("plain_int")));
+  EXPECT_NE(log().find("\nSpectral shift filter skipped: " + aRoot + "_1 has no RangeBandwidth or RangeSamplingRate\n"),
+            std::string::npos);
 
   const std::string aDoppler =
       simulate("dop", {"--lines", "192", "--pixels", "128", "--coherence", "1", "--doppler", "0.1,-0.05"});
@@ -275,17 +285,21 @@ TEST_F(Interferogram, LooksRulesAndResultHeaders) {
             << aName << " " << aKey;
     }
   // The powers are multilook means: the mean over the image is kept.
-  const std::vector<double> aOne = tlrxReadTestRaster(mDir.file("one_mpwr")),
-                            aThree = tlrxReadTestRaster(mDir.file("three_mpwr"));
-  double aMeanOne = 0, aMeanThree = 0;
-  for (double v : aOne)
-    aMeanOne += v / aOne.size();
-  for (double v : aThree)
-    aMeanThree += v / aThree.size();
-  EXPECT_NEAR(aMeanThree / aMeanOne, 1.0, 0.05);
+  const auto aMean = [&](const char *theName) {
+    const std::vector<double> aValues = tlrxReadTestRaster(mDir.file(theName));
+    return std::accumulate(aValues.begin(), aValues.end(), 0.0) / aValues.size();
+  };
+  EXPECT_NEAR(aMean("three_mpwr") / aMean("one_mpwr"), 1.0, 0.05);
   CDescription aParameters;
   fdfReadStandardHeader(mDir.file("pair_par").c_str(), aParameters);
   EXPECT_EQ(aParameters.getField("interferometric_processing.ProcessedPixels").getInteger(), 26 * 13);
+  // Second-order polynomials on an image this small draw the advice.
+  const std::string aAdvice = "In case of images with dimension smaller than [600]. Is suggest the usage of a linear "
+                              "co-registration polynomial instead a second order degree\n";
+  EXPECT_EQ(log().find(aAdvice), std::string::npos);
+  parameters(aRoot + "_1", 0, 0, 6);
+  run(aRoot, "six", {"1", "5", "NotOK"});
+  EXPECT_NE(log().find(aAdvice), std::string::npos);
 }
 
 // Blocks of 5000 and of 250 lines give the same bytes, filters off and on;
