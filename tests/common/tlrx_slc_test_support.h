@@ -32,10 +32,10 @@ inline void tlrxSpeckle(int theLines, int thePixels, double theCentre, double th
   fdfFftPlan(theLines, thePixels, ETLRXFftDirection::FORWARD).execute(aA.data());
   for (int r = 0; r < theLines; ++r)
     for (int c = 0; c < thePixels; ++c) {
-      const double aFr = theLines == 1 ? 0.0 : aWrap(double(r) / theLines - theCentre) + theCentre;
+      const double aFr = aWrap(double(r) / theLines - theCentre) + theCentre;
       const double aFc = aWrap(double(c) / thePixels);
       const size_t i = size_t(r) * size_t(thePixels) + size_t(c);
-      const bool aIn = std::fabs(aFr - (theLines == 1 ? 0.0 : theCentre)) <= 0.5 / 1.2 && std::fabs(aFc) <= 0.5 / 1.2;
+      const bool aIn = std::fabs(aFr - theCentre) <= 0.5 / 1.2 && std::fabs(aFc) <= 0.5 / 1.2;
       aA[i] = aIn ? aA[i] / float(std::sqrt(double(aCount))) : TLRXComplex(0, 0);
       aB[i] = aA[i] * TLRXComplex(std::polar(1.0, 2 * M_PI * (aFc * theDx + aFr * theDy)));
     }
@@ -48,10 +48,10 @@ inline void tlrxSpeckle(int theLines, int thePixels, double theCentre, double th
 // |sum a conj(b)| / sqrt(sum |a|^2 sum |b|^2) over lines and pixels [theFrom,
 // theTo) of two images of thePixels per line.
 inline double tlrxCoherence(const TLRXTestImage &theA, const TLRXTestImage &theB, int thePixels, int theFrom,
-                            int theTo, int theFirstLine = -1, int theEndLine = -1) {
+                            int theTo) {
   std::complex<double> aCross = 0;
   double aA = 0, aB = 0;
-  for (int r = theFirstLine < 0 ? theFrom : theFirstLine; r < (theEndLine < 0 ? theTo : theEndLine); ++r)
+  for (int r = theFrom; r < theTo; ++r)
     for (int c = theFrom; c < theTo; ++c) {
       const std::complex<double> a = theA[size_t(r) * size_t(thePixels) + size_t(c)],
                                  b = theB[size_t(r) * size_t(thePixels) + size_t(c)];

@@ -5,8 +5,6 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 
-#include <chrono>
-#include <csignal>
 #include <cstdlib>
 #include <fstream>
 #include <sstream>
@@ -125,32 +123,6 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
     aRun.mOutput.append(aBuffer, aRead);
   aRun.mExitStatus = tlrxExitStatus(pclose(aPipe));
   return aRun;
-}
-
-int tlrxStart(const std::string &theProgram, const std::vector<std::string> &theArgs, const std::string &theWorkDir,
-              const std::map<std::string, std::string> &theEnv) {
-  const std::string aCommand =
-      tlrxShellCommand(theProgram, theArgs, theWorkDir, theEnv) + " </dev/null >/dev/null 2>&1";
-  const pid_t aPid = fork();
-  if (aPid == 0) {
-    execl("/bin/sh", "sh", "-c", aCommand.c_str(), static_cast<char *>(nullptr));
-    _exit(127);
-  }
-  return static_cast<int>(aPid);
-}
-
-int tlrxWait(int thePid, double theSeconds) {
-  const auto aDeadline = std::chrono::steady_clock::now() + std::chrono::duration<double>(theSeconds);
-  int aStatus = 0;
-  while (waitpid(thePid, &aStatus, WNOHANG) == 0) {
-    if (std::chrono::steady_clock::now() > aDeadline) {
-      kill(thePid, SIGKILL);
-      waitpid(thePid, &aStatus, 0);
-      return -1;
-    }
-    usleep(20000);
-  }
-  return tlrxExitStatus(aStatus);
 }
 
 STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,

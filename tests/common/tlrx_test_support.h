@@ -52,14 +52,6 @@ STLRXRun tlrxRun(const std::string &theProgram, const std::vector<std::string> &
 STLRXRun tlrxRunMain(const std::string &theCommandLine, const std::string &theWorkDir,
                      const std::map<std::string, std::string> &theEnv = {});
 
-// Starts bin/theProgram as tlrxRun does, in the background with its output
-// discarded, for tests that act on a run while it works; its process id.
-int tlrxStart(const std::string &theProgram, const std::vector<std::string> &theArgs, const std::string &theWorkDir,
-              const std::map<std::string, std::string> &theEnv = {});
-// Waits at most theSeconds for a started run: its exit status as tlrxRun
-// gives it, or -1 when it was still running (it is then killed).
-int tlrxWait(int thePid, double theSeconds);
-
 // A small raster with its standard header, written through the program's own
 // raster file and header writer (the runtime must be started).
 struct STLRXTestRaster {

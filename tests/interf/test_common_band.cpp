@@ -30,29 +30,10 @@ TLine tone(double theFrequency, int theCount, double theStart = 0) {
   return aLine;
 }
 
-double maxAbs(const TLine &theLine) {
-  double aMax = 0;
-  for (const TLRXComplex &aValue : theLine)
-    aMax = std::max(aMax, double(std::abs(aValue)));
-  return aMax;
-}
-
 class CommonBand : public ::testing::Test {
 protected:
   CTempDir mDir;
   void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
-  // The lines of ROOT_1 and ROOT_2 of tlrx_simulate slc.
-  void simulate(std::vector<std::string> theOptions, int thePixels, std::vector<TLine> &theM, std::vector<TLine> &theS) {
-    theOptions.insert(theOptions.end(), {"--pixels", std::to_string(thePixels)});
-    const std::string aRoot = tlrxSimulateSlc(mDir, "p", theOptions);
-    for (int k = 0; k < 2; ++k) {
-      const STLRXTestSlc aImage = tlrxReadSlc(aRoot + (k == 0 ? "_1" : "_2"));
-      std::vector<TLine> &aLines = k == 0 ? theM : theS;
-      aLines.assign(size_t(aImage.mLines), TLine(size_t(thePixels)));
-      for (size_t l = 0; l < aLines.size(); ++l)
-        std::copy_n(aImage.mCells.begin() + ptrdiff_t(l) * thePixels, thePixels, aLines[l].begin());
-    }
-  }
 };
 
 } // namespace
@@ -108,13 +89,9 @@ TEST(RangeOversampler, KeepsTheSamplesInterpolatesTonesAndCutsOutsideTheBand) {
     const double f = std::round(aTone.mFrequency * 64) / 64;
     TLine aOut(128);
     aOversampler.process(tone(f, 64).data(), aTone.mBand, aOut.data());
-    if (aTone.mPasses) {
-      const TLine aExpected = tone(f / 2, 128);
-      for (size_t i = 0; i < aOut.size(); ++i)
-        EXPECT_LT(std::abs(aOut[i] - aExpected[i]), 1e-5f) << i;
-    } else {
-      EXPECT_LT(maxAbs(aOut), 1e-5);
-    }
+    const TLine aExpected = aTone.mPasses ? tone(f / 2, 128) : TLine(128);
+    for (size_t i = 0; i < aOut.size(); ++i)
+      EXPECT_LT(std::abs(aOut[i] - aExpected[i]), 1e-5f) << i;
   }
   EXPECT_EQ(tlrxRaisedCode([] { CRangeOversampler(0, 2); }), CTLRX_ERR_IMAGE_SIZES);
   EXPECT_EQ(tlrxRaisedCode([] { CRangeOversampler(64, 0); }), CTLRX_ERR_IMAGE_SIZES);
@@ -140,15 +117,16 @@ TEST(FringeFromPhase, MeanWrappedStepSkippingNullCellsAndTheirNeighbours) {
 // an empty estimator are rejected.
 TEST_F(CommonBand, FringeEstimatorFindsKnownFringesOnSpeckleAndRejectsNoise) {
   for (const double aFringe : {0.077, -0.12}) {
-    std::vector<TLine> aM, aS;
-    simulate({"--lines", "64", "--coherence", "0.8", "--phase-ramp", "0," + std::to_string(aFringe)}, 512, aM, aS);
-    for (size_t x = 100; x < 300; ++x)
-      aM[5][x] = 0; // null cells add nothing
+    const std::string aRoot = tlrxSimulateSlc(mDir, "p", {"--lines", "64", "--pixels", "512", "--coherence", "0.8",
+                                                          "--phase-ramp", "0," + std::to_string(aFringe)});
+    STLRXTestSlc aM = tlrxReadSlc(aRoot + "_1");
+    const STLRXTestSlc aS = tlrxReadSlc(aRoot + "_2");
+    std::fill_n(aM.mCells.begin() + 5 * 512 + 100, 200, TLRXComplex(0, 0)); // null cells add nothing
     CFringeEstimator aEstimator(512);
-    for (size_t l0 = 0; l0 < aM.size(); l0 += 16) {
+    for (int l0 = 0; l0 < 64; l0 += 16) {
       aEstimator.reset();
-      for (size_t l = l0; l < l0 + 16; ++l)
-        aEstimator.add(aM[l].data(), aS[l].data());
+      for (int l = l0; l < l0 + 16; ++l)
+        aEstimator.add(&aM.mCells[size_t(l) * 512], &aS.mCells[size_t(l) * 512]);
       double aFound = 0, aSnr = 0;
       EXPECT_TRUE(aEstimator.result(aFound, aSnr));
       EXPECT_NEAR(aFound, aFringe, 0.002) << l0;

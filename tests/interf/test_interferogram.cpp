@@ -103,6 +103,14 @@ protected:
   std::string log() const { return tlrxReadFile(mDir.file("Process.log")); }
 };
 
+// Rewrites the header of theRaster after theEdit.
+void editHeader(const std::string &theRaster, const std::function<void(CDescription &)> &theEdit) {
+  CDescription aHeader;
+  fdfReadStandardHeader(theRaster.c_str(), aHeader);
+  theEdit(aHeader);
+  ASSERT_TRUE(fdfWriteStandardHeader(theRaster.c_str(), aHeader));
+}
+
 const auto sNoPhase = [](int, int) { return 0.0; };
 
 } // namespace
@@ -184,12 +192,8 @@ TEST_F(Interferogram, DopplerCentroidIsRemovedBeforeInterpolating) {
   run(aRoot, "header", {"1", "1", "NotOK"});
   EXPECT_GE(coherence("header", sNoPhase), 0.99);
   EXPECT_NE(log().find("slave Doppler centroid from the header: 0.3"), std::string::npos);
-  for (const char *aImage : {"_1", "_2"}) {
-    CDescription aHeader;
-    fdfReadStandardHeader((aRoot + aImage).c_str(), aHeader);
-    aHeader.getField("ChannelInfo.DopplerCentroidCoeff").setNumberOfElements(0);
-    ASSERT_TRUE(fdfWriteStandardHeader((aRoot + aImage).c_str(), aHeader));
-  }
+  for (const char *aImage : {"_1", "_2"})
+    editHeader(aRoot + aImage, [](CDescription &theHeader) { theHeader.getField("ChannelInfo.DopplerCentroidCoeff").clear(); });
   run(aRoot, "data", {"1", "1", "NotOK"});
   EXPECT_GE(coherence("data", sNoPhase), 0.99);
   const std::string aLog = log(), aKey = "slave Doppler centroid estimated from the data: ";
@@ -213,10 +217,7 @@ TEST_F(Interferogram, CommonBandFiltersRecoverTheCoherence) {
   EXPECT_GE(coherence("filtered", aRamp), 0.97);
   EXPECT_NE(log().find("mean spectral shift: 0.166"), std::string::npos);
   // A master header without the range bandwidth skips the filter, saying so.
-  CDescription aHeader;
-  fdfReadStandardHeader((aRoot + "_1").c_str(), aHeader);
-  aHeader.getField("ChannelInfo.RangeBandwidth").clear();
-  ASSERT_TRUE(fdfWriteStandardHeader((aRoot + "_1").c_str(), aHeader));
+  editHeader(aRoot + "_1", [](CDescription &theHeader) { theHeader.getField("ChannelInfo.RangeBandwidth").clear(); });
   run(aRoot, "skipped", {"-2", "1", "NotOK", "-", "OK", "NotOK"});
   EXPECT_EQ(tlrxReadFile(mDir.file("skipped_int")), tlrxReadFile(mDir.file("plain_int")));
   EXPECT_NE(log().find("\nSpectral shift filter skipped: " + aRoot + "_1 has no RangeBandwidth or RangeSamplingRate\n"),
@@ -403,12 +404,7 @@ TEST_F(Interferogram, ShiftRastersSyntheticPhaseAndIncidence) {
 TEST_F(Interferogram, FailuresRaiseTheirCodes) {
   const std::string aRoot = simulate("bad", {"--lines", "32", "--pixels", "32"});
   const std::string aFloat = simulate("float", {"--lines", "32", "--pixels", "32"});
-  {
-    CDescription aHeader; // a slave of real cells
-    fdfReadStandardHeader((aFloat + "_2").c_str(), aHeader);
-    aHeader.getField("RasterInfo.CellType").setString("FLOAT");
-    ASSERT_TRUE(fdfWriteStandardHeader((aFloat + "_2").c_str(), aHeader));
-  }
+  editHeader(aFloat + "_2", [](CDescription &theHeader) { theHeader.getField("RasterInfo.CellType").setString("FLOAT"); });
   const std::string aPar = parameters(aRoot + "_1", 0, 0), aNoInverse = parameters(aRoot + "_1", 0, 0, 3, false, "noinv"),
                     aSeven = parameters(aRoot + "_1", 0, 0, 7, true, "seven");
   const std::string m = aRoot + "_1", s = aRoot + "_2", o = mDir.file("o");
