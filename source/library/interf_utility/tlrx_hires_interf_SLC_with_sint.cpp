@@ -7,6 +7,7 @@
 #include "tlrx_hires_interf_SLC_with_sint.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <complex>
 #include <cstdio>
@@ -159,6 +160,16 @@ void openSlc(SSlcInput &theInput, const char *theName, int theNumber) {
   theInput.mRaster.open_read(theName, theInput.mHeader);
   theInput.mLines = theInput.mRaster.getNrOfLinesPerImage();
   theInput.mPixels = theInput.mRaster.getNrOfPixelsPerLine();
+}
+
+// An image too small for its looks gives no result line or pixel: refused
+// before anything is read.
+void checkOutputSize(const SSlcInput &theMaster, const SLooks &theLooks) {
+  if (theMaster.mPixels * theLooks.mFactor / theLooks.mGroup >= 1 && theMaster.mLines / theLooks.mAzimuth >= 1)
+    return;
+  fdfTraceMessage("Error: %d x %d pixels give no result line with %d range and %d azimuth looks\n", theMaster.mLines,
+                  theMaster.mPixels, theLooks.mRange, theLooks.mAzimuth);
+  TLRX_RAISE_F(CTLRX_ERR_OUTPUT_SIZE, "%.200s: %d x %d", theMaster.mName.c_str(), theMaster.mLines, theMaster.mPixels);
 }
 
 // Complex line with no-data cells as 0 + 0i, the value the chain treats as
@@ -367,7 +378,7 @@ void writeKernelFile(const SInterfArguments &theArgs, CPendingFiles &thePending)
   const CSincTable aTable;
   for (int32_t r = 0; aOk && r <= CTLRX_SINC_STEPS; ++r) {
     const double aFraction = static_cast<double>(r) / CTLRX_SINC_STEPS;
-    const float *aWeights = aTable.weights(std::min(aFraction, 1.0 - 0.5 / CTLRX_SINC_STEPS));
+    const float *aWeights = aTable.weights(aFraction);
     aOk = std::fprintf(aFile, "%.6f", aFraction) > 0;
     for (int32_t k = 0; aOk && k < CTLRX_SINC_TAPS; ++k)
       aOk = std::fprintf(aFile, " %.9g", aWeights[k]) > 0;
@@ -397,13 +408,7 @@ public:
                      readSlcLine(mSlave.mRaster, theLine, theCells, mSlaveValid);
                    }),
         mFringe(theMaster.mPixels), mMasterOversampler(theMaster.mPixels, theLooks.mFactor),
-        mSlaveOversampler(theMaster.mPixels, theLooks.mFactor) {
-    if (mOutPixels < 1 || mOutLines < 1) {
-      fdfTraceMessage("Error: %d x %d pixels give no result line with %d range and %d azimuth looks\n", mLines,
-                      mPixels, mLooks.mRange, mLooks.mAzimuth);
-      TLRX_RAISE_F(CTLRX_ERR_OUTPUT_SIZE, "%.200s: %d x %d", mMaster.mName.c_str(), mLines, mPixels);
-    }
-  }
+        mSlaveOversampler(theMaster.mPixels, theLooks.mFactor) {}
 
   int32_t outLines() const { return mOutLines; }
   int32_t outPixels() const { return mOutPixels; }
@@ -440,8 +445,6 @@ public:
       if (aReady >= 0)
         filteredLine(aReady);
     }
-    if (!mGroupMaster.empty())
-      finishGroup();
   }
 
 private:
@@ -476,7 +479,7 @@ private:
     TLine aMaster = takeLine(), aSlave = takeLine();
     if (mAzimuth) {
       const int32_t aHalf = CTLRX_AZIMUTH_FILTER_TAPS / 2;
-      std::vector<const TCell *> aMasters(CTLRX_AZIMUTH_FILTER_TAPS), aSlaves(CTLRX_AZIMUTH_FILTER_TAPS);
+      std::array<const TCell *, CTLRX_AZIMUTH_FILTER_TAPS> aMasters, aSlaves;
       for (int32_t k = 0; k < CTLRX_AZIMUTH_FILTER_TAPS; ++k) {
         const int32_t aLine = theLine - aHalf + k;
         const bool aInside = aLine >= 0 && aLine < mLines;
@@ -735,6 +738,7 @@ int tlrx_hires_interf_SLC_with_sint(int argc, char **argv) {
   }
   adviseSmallImage(aMaster.mLines, aMaster.mPixels, aPoly);
   const SLooks aLooks = looksOf(aArgs.mRangeLooks, aArgs.mAzimuthLooks);
+  checkOutputSize(aMaster, aLooks);
 
   CInterferogramRun aRun(aMaster, aSlave, *aField, aLooks);
   double aRangeRate = 0.0;
@@ -781,10 +785,6 @@ int tlrx_hires_interf_SLC_with_sint(int argc, char **argv) {
           std::make_unique<CResultRaster>(resampledName(aArgs, aInputs[i]->mName), aResults.mResampledHeader[i]);
     }
   }
-  CPendingFiles aKernelPending;
-  if (aArgs.mWriteKernel)
-    writeKernelFile(aArgs, aKernelPending);
-
   aRun.run(aResults);
   aMaster.mRaster.close();
   aSlave.mRaster.close();
@@ -798,6 +798,10 @@ int tlrx_hires_interf_SLC_with_sint(int argc, char **argv) {
   for (int i = 0; i < 2; ++i)
     if (aResults.mResampled[i])
       aResults.mResampled[i]->commit(aResults.mResampledHeader[i], CTLRX_ERR_FILE_COPY);
+  if (aArgs.mWriteKernel) {
+    CPendingFiles aKernelPending;
+    writeKernelFile(aArgs, aKernelPending);
+  }
   fdfLogMessage("\nprocessed pixels: %lld, mean spectral shift: %g cycles per pixel\n",
                 static_cast<long long>(aRun.processedPixels()), aRun.meanFringe());
   writeParameters(aArgs.mParameters, aParameters, aRun.processedPixels(), aRun.meanFringe() * aRangeRate);
