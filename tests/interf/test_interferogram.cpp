@@ -406,7 +406,9 @@ TEST_F(Interferogram, FailuresRaiseTheirCodes) {
   const std::string aFloat = simulate("float", {"--lines", "32", "--pixels", "32"});
   editHeader(aFloat + "_2", [](CDescription &theHeader) { theHeader.getField("RasterInfo.CellType").setString("FLOAT"); });
   const std::string aPar = parameters(aRoot + "_1", 0, 0), aNoInverse = parameters(aRoot + "_1", 0, 0, 3, false, "noinv"),
-                    aSeven = parameters(aRoot + "_1", 0, 0, 7, true, "seven");
+                    aSeven = parameters(aRoot + "_1", 0, 0, 7, true, "seven"), aWide = parameters(aRoot + "_1", 0, 0, 3, true, "wide");
+  // Azimuth shifts growing by 2 lines a pixel: one master line reaches over the whole slave.
+  editHeader(aWide, [](CDescription &theHeader) { theHeader.getField("interferometric_processing.DAzimuthPoly").setDouble(1, 2.0); });
   const std::string m = aRoot + "_1", s = aRoot + "_2", o = mDir.file("o");
   const struct {
     std::vector<std::string> mArgs;
@@ -425,6 +427,8 @@ TEST_F(Interferogram, FailuresRaiseTheirCodes) {
        "Error: missing parameter field DRangePolyInv, or DAzimuthPolyInv"},
       {{m, s, aSeven, o + "m", o + "s", o + "i", "1", "1", "NotOK"}, CTLRX_ERR_DS_TYPE,
        "interferometric_processing.DRangePoly: 7 terms in " + aSeven, nullptr},
+      {{m, s, aWide, o + "m", o + "s", o + "i", "1", "1", "NotOK", "-", "NotOK", "NotOK", "20"}, CTLRX_ERR_ARGUMENTS,
+       "the azimuth shifts of master line 0 reach over 38 slave lines, more than the 20 lines a block holds", nullptr},
       {{m, s, aPar, o + "m", o + "s", s, "1", "1", "NotOK"}, CTLRX_ERR_PARAMETER_FILE, s, nullptr},
       {{m, s, aPar, o + "m", mDir.path() + "./om", o + "i", "1", "1", "NotOK"}, CTLRX_ERR_PARAMETER_FILE,
        mDir.path() + "./om", nullptr}, // one result spelled two ways

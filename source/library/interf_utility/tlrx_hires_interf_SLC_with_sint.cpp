@@ -396,8 +396,9 @@ void writeKernelFile(const SInterfArguments &theArgs, CPendingFiles &thePending)
 
 class CInterferogramRun {
 public:
-  CInterferogramRun(SSlcInput &theMaster, SSlcInput &theSlave, CShiftField &theField,
-                    const SLooks &theLooks)
+  // theBlockSize bounds the slave lines held for the resampling.
+  CInterferogramRun(SSlcInput &theMaster, SSlcInput &theSlave, CShiftField &theField, const SLooks &theLooks,
+                    int32_t theBlockSize)
       : mMaster(theMaster), mSlave(theSlave), mLooks(theLooks),
         mPixels(theMaster.mPixels), mLines(theMaster.mLines),
         mOutPixels(theMaster.mPixels * theLooks.mFactor / theLooks.mGroup),
@@ -408,7 +409,9 @@ public:
                      readSlcLine(mSlave.mRaster, theLine, theCells, mSlaveValid);
                    }),
         mFringe(theMaster.mPixels), mMasterOversampler(theMaster.mPixels, theLooks.mFactor),
-        mSlaveOversampler(theMaster.mPixels, theLooks.mFactor) {}
+        mSlaveOversampler(theMaster.mPixels, theLooks.mFactor) {
+    mResampler.setMaxHeld(theBlockSize);
+  }
 
   int32_t outLines() const { return mOutLines; }
   int32_t outPixels() const { return mOutPixels; }
@@ -740,7 +743,7 @@ int tlrx_hires_interf_SLC_with_sint(int argc, char **argv) {
   const SLooks aLooks = looksOf(aArgs.mRangeLooks, aArgs.mAzimuthLooks);
   checkOutputSize(aMaster, aLooks);
 
-  CInterferogramRun aRun(aMaster, aSlave, *aField, aLooks);
+  CInterferogramRun aRun(aMaster, aSlave, *aField, aLooks, aArgs.mBlockSize);
   double aRangeRate = 0.0;
   const double aBandwidth = aArgs.mSpectralShift ? rangeBandwidth(aMaster, aRangeRate) : 0.0;
   std::unique_ptr<CAzimuthBandFilter> aAzimuth;

@@ -249,6 +249,10 @@ void CSlaveResampler::resampleLine(int32_t theLine, std::complex<float> *theOut)
   }
   const int64_t aWindowFirst = aLow - CTLRX_SINC_BEFORE;
   const int64_t aWindowLast = aHigh + CTLRX_SINC_TAPS - CTLRX_SINC_BEFORE - 1;
+  if (aWindowLast - aWindowFirst + 1 > mMaxHeld)
+    TLRX_RAISE_F(CTLRX_ERR_ARGUMENTS,
+                 "the azimuth shifts of master line %d reach over %lld slave lines, more than the %d lines a block holds",
+                 theLine, static_cast<long long>(aWindowLast - aWindowFirst + 1), mMaxHeld);
   hold(static_cast<int32_t>(std::max<int64_t>(0, aWindowFirst)),
        static_cast<int32_t>(std::min<int64_t>(mSlaveLines - 1, aWindowLast)));
   // Lines outside the slave are a line of zeros: taps there count as 0.

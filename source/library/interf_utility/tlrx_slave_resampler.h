@@ -94,6 +94,11 @@ public:
   // is 0 + 0i; kernel taps outside it count as 0.
   void resampleLine(int32_t theLine, std::complex<float> *theOut);
 
+  // At most theLines slave lines are held: a master line whose shifts reach
+  // over more (a field that is no co-registration) raises 456962 instead of
+  // holding a large part of the image.
+  void setMaxHeld(int32_t theLines) { mMaxHeld = theLines; }
+
   int64_t linesRead() const { return mLinesRead; }
   size_t linesHeld() const { return mHeld.size(); }
 
@@ -113,6 +118,7 @@ private:
   std::vector<std::complex<float>> mRaw;
   std::vector<double> mColumns, mLines;
   int64_t mLinesRead = 0;
+  int32_t mMaxHeld = INT32_MAX;
   // Range pass of one slave line into theOut (master pixels), demodulated.
   void rangePass(int32_t theLine, std::vector<std::complex<float>> &theOut);
   bool mDoppler = false;                       // some centroid is not zero
