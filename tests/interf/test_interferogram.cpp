@@ -329,7 +329,9 @@ TEST_F(Interferogram, BlockSizeDoesNotChangeTheResult) {
 // co-registered pair named folder + input name + "_rsp" (the master as read,
 // the slave on the master grid).
 TEST_F(Interferogram, KernelFileAndCoregisteredPair) {
-  const std::string aRoot = simulate("rsp", {"--lines", "40", "--pixels", "32", "--shift", "1,0"});
+  // SHORT_COMPLEX cells (amplitudes about 100) are read as well.
+  const std::string aRoot = simulate(
+      "rsp", {"--lines", "40", "--pixels", "32", "--shift", "1,0", "--cell-type", "SHORT_COMPLEX", "--reflectivity", "1e4"});
   parameters(aRoot + "_1", 1, 0);
   run(aRoot, "out", {"1", "1", "NotOK", "-", "NotOK", "NotOK", "100", "10", "NotOK", "NotOK", "NotOK", "NotOK",
                      "-", "OK", "OK"});
@@ -403,7 +405,8 @@ TEST_F(Interferogram, ShiftRastersSyntheticPhaseAndIncidence) {
 // looks like a result.
 TEST_F(Interferogram, FailuresRaiseTheirCodes) {
   const std::string aRoot = simulate("bad", {"--lines", "32", "--pixels", "32"});
-  const std::string aFloat = simulate("float", {"--lines", "32", "--pixels", "32"});
+  // A SHORT_COMPLEX master passes the cell-type check; a FLOAT slave does not.
+  const std::string aFloat = simulate("float", {"--lines", "32", "--pixels", "32", "--cell-type", "SHORT_COMPLEX"});
   editHeader(aFloat + "_2", [](CDescription &theHeader) { theHeader.getField("RasterInfo.CellType").setString("FLOAT"); });
   const std::string aPar = parameters(aRoot + "_1", 0, 0), aNoInverse = parameters(aRoot + "_1", 0, 0, 3, false, "noinv"),
                     aSeven = parameters(aRoot + "_1", 0, 0, 7, true, "seven"), aWide = parameters(aRoot + "_1", 0, 0, 3, true, "wide");
