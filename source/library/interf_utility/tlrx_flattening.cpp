@@ -1,0 +1,122 @@
+// Flattening (see tlrx_flattening.h): one line of each input at a time.
+#include "tlrx_flattening.h"
+
+#include <cmath>
+#include <complex>
+#include <string>
+#include <vector>
+
+#include "tlrx_description_section.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_generic_utility.h"
+#include "tlrx_no_data.h"
+#include "tlrx_raster_file.h"
+#include "tlrx_result_files.h"
+#include "tlrx_step_common.h"
+
+namespace {
+
+constexpr int CTLRX_FLATTENING_CLOSE_ARGUMENTS = 7;
+
+std::string cellType(const CDescription &theHeader) {
+  const CDescriptionField *aField = theHeader.findField("RasterInfo.CellType");
+  return aField != nullptr && aField->holdsValue() ? aField->getString() : "";
+}
+
+// The phase's no-data rule: its declared null value, and NaN. A header
+// without one declares none (a phase of exactly 0 is a phase).
+SNoData phaseNoData(const CDescription &theHeader) {
+  const CDescriptionField *aField = theHeader.findField("RasterInfo.NullCellValue");
+  return aField != nullptr && aField->holdsValue() ? SNoData(aField->getDouble()) : SNoData(std::nan(""));
+}
+
+} // namespace
+
+int tlrx_flattening(int argc, char **argv) {
+  fdfTraceMessage("*** flattening of the interferogram by the synthetic phase ***\n");
+  if (argc < 4) {
+    fdfTraceMessage("Usage: %s <interferogram> <synthetic phase> <output root> [NotOK NotOK NotOK]\n",
+                    argc > 0 ? argv[0] : "tlrx_flattening");
+    TLRX_RAISE(CTLRX_ERR_ARGUMENTS, nullptr);
+  }
+  const std::string aInterferogram = argv[1], aPhase = argv[2], aOutput = std::string(argv[3]) + "_dint";
+  fdfTraceMessage("  interferogram : %s\n  synthetic phase : %s\n  flattened interferogram : %s\n",
+                  aInterferogram.c_str(), aPhase.c_str(), aOutput.c_str());
+  CRunFiles aFiles;
+  aFiles.addInput(aInterferogram);
+  aFiles.addInput(aPhase);
+  aFiles.addResult(aOutput, false);
+  aFiles.refuseClashes(CTLRX_ERR_PARAMETER_FILE);
+
+  CDescription aZHeader, aPhaseHeader;
+  fdfLoadInputHeader(aInterferogram, aZHeader);
+  fdfLoadInputHeader(aPhase, aPhaseHeader);
+  if (cellType(aZHeader) != "FLOAT_COMPLEX") {
+    fdfTraceMessage("Error: unsupported data type: %s for the interferogram %s\n", cellType(aZHeader).c_str(),
+                    aInterferogram.c_str());
+    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (interferogram %.200s)", cellType(aZHeader).c_str(),
+                 aInterferogram.c_str());
+  }
+  if (cellType(aPhaseHeader).find("COMPLEX") != std::string::npos) {
+    fdfTraceMessage("Error: unsupported data type: %s for the synthetic phase %s\n", cellType(aPhaseHeader).c_str(),
+                    aPhase.c_str());
+    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (synthetic phase %.200s)", cellType(aPhaseHeader).c_str(),
+                 aPhase.c_str());
+  }
+  CRasterFile aZ, aPhi;
+  aZ.open_read(aInterferogram.c_str(), aZHeader);
+  aPhi.open_read(aPhase.c_str(), aPhaseHeader);
+  const int32_t aLines = aZ.getNrOfLinesPerImage(), aPixels = aZ.getNrOfPixelsPerLine();
+  if (aPhi.getNrOfLinesPerImage() != aLines || aPhi.getNrOfPixelsPerLine() != aPixels) {
+    fdfTraceMessage("Error: the synthetic phase %s has %d x %d cells, the interferogram %d x %d\n", aPhase.c_str(),
+                    aPhi.getNrOfLinesPerImage(), aPhi.getNrOfPixelsPerLine(), aLines, aPixels);
+    TLRX_RAISE_F(CTLRX_ERR_SIZE_MISMATCH, "%.200s: %d x %d, the interferogram %d x %d", aPhase.c_str(),
+                 aPhi.getNrOfLinesPerImage(), aPhi.getNrOfPixelsPerLine(), aLines, aPixels);
+  }
+
+  CDescription aHeader;
+  fdfMakeResultHeader(aHeader, aZHeader, "FLOAT_COMPLEX", "FLATTENED INTERFEROGRAMME", 0.0);
+  CResultRaster aOut(aOutput, aHeader);
+  const SNoData aPhaseNull = phaseNoData(aPhaseHeader);
+  std::vector<std::complex<float>> aCells(static_cast<size_t>(aPixels));
+  std::vector<uint8_t> aValid(static_cast<size_t>(aPixels));
+  std::vector<double> aPhases(static_cast<size_t>(aPixels));
+  CLineProgress aProgress(99.0);
+  int64_t aFlattened = 0;
+  for (int32_t l = 0; l < aLines; ++l) {
+    aProgress.update(l, aLines);
+    aZ.getComplexLine(aCells.data(), l, 0, -1, aValid.data());
+    aPhi.getLine(aPhases.data(), l);
+    for (int32_t j = 0; j < aPixels; ++j) {
+      std::complex<float> &z = aCells[static_cast<size_t>(j)];
+      const double aAngle = aPhases[static_cast<size_t>(j)];
+      if (aValid[static_cast<size_t>(j)] == 0 || z == std::complex<float>() || aPhaseNull.isNullOrNaN(aAngle)) {
+        z = std::complex<float>();
+        continue;
+      }
+      // Turned in double: the magnitude is kept to float rounding.
+      const std::complex<double> aTurned = std::complex<double>(z) * std::polar(1.0, -aAngle);
+      z = std::complex<float>(static_cast<float>(aTurned.real()), static_cast<float>(aTurned.imag()));
+      ++aFlattened;
+    }
+    aOut.file().putComplexLine(l, aCells.data());
+  }
+  aZ.close();
+  aPhi.close();
+  aOut.commit(aHeader, CTLRX_ERR_FILE_COPY);
+  fdfLogMessage("\nflattened pixels: %lld of %lld\n", static_cast<long long>(aFlattened),
+                static_cast<long long>(aLines) * aPixels);
+  return 0;
+}
+
+int tlrx_flattening_close(int argc, char **argv) {
+  if (argc < CTLRX_FLATTENING_CLOSE_ARGUMENTS) {
+    fdfTraceMessage("\nSHUT: %d arguments, %d wanted: nothing removed\n", argc, CTLRX_FLATTENING_CLOSE_ARGUMENTS);
+    return 0;
+  }
+  fdfTraceMessage("\nSHUT\n");
+  fdfDeleteRaster(argv[1], true, true);
+  fdfDeleteRaster(argv[2], true, true);
+  return 0;
+}
