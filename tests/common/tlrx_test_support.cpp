@@ -151,6 +151,13 @@ void tlrxWriteTestRaster(const std::string &theName, const STLRXTestRaster &theR
   CRasterFile aFile;
   aFile.open_write(theName.c_str(), aHeader);
   const int32_t aCellType = aFile.getCellType();
+  if (!theRaster.mCells.empty()) {
+    for (int l = 0; l < theRaster.mLines; ++l)
+      aFile.putComplexLine(l, theRaster.mCells.data() + static_cast<size_t>(l) * theRaster.mPixels);
+    aFile.close();
+    fdfWriteStandardHeader(theName.c_str(), aHeader, true);
+    return;
+  }
   std::vector<uint8_t> aLine(static_cast<size_t>(fdfCellLineBytes(aCellType, theRaster.mPixels)));
   for (int l = 0; l < theRaster.mLines; ++l) {
     for (int p = 0; p < theRaster.mPixels; ++p) {

@@ -2,6 +2,7 @@
 // environment in throw mode, and running the built executables.
 #pragma once
 
+#include <complex>
 #include <map>
 #include <string>
 #include <vector>
@@ -58,6 +59,7 @@ struct STLRXTestRaster {
   int mLines = 4;
   int mPixels = 5;
   std::vector<double> mValues; // lines x pixels, line after line
+  std::vector<std::complex<float>> mCells; // the same for complex cell types
   std::string mCellType = "FLOAT";
   std::string mDataUnits = "POWER";
   bool mHasNull = false;

@@ -1,0 +1,324 @@
+// Coherence estimation: the measure through the window ring against Touzi's
+// expectation on white single-look speckle and against direct sums; the step
+// in throw mode with local-frequency removal, its switches, processing
+// window, header, failures and closing operation.
+#include "tlrx_cc_ave.h"
+#include "tlrx_coherence_measure.h"
+#include "tlrx_description_section.h"
+#include "tlrx_description_test_support.h"
+#include "tlrx_description_xml.h"
+#include "tlrx_standard_header.h"
+#include "tlrx_enviroment.h"
+#include "tlrx_errors.h"
+#include "tlrx_flattening.h"
+#include "tlrx_header_expect.h"
+#include "tlrx_test_support.h"
+#include "tlrx_trace_test_support.h"
+#include "tlrx_window_sums.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <complex>
+#include <functional>
+#include <random>
+
+namespace {
+
+using TCell = std::complex<float>;
+constexpr double sPi = 3.14159265358979323846;
+
+// A pair of white circular Gaussian images of coherence theCoherence as the
+// chain hands them over: the normalised product z = m conj(s) / |m s| with
+// the phase theFringe (radians, of line and pixel) added, and the powers.
+struct SPair {
+  int mLines, mPixels;
+  std::vector<TCell> mZ;
+  std::vector<float> mM, mS;
+};
+SPair whitePair(int theLines, int thePixels, double theCoherence, unsigned theSeed,
+                const std::function<double(int, int)> &theFringe = nullptr) {
+  std::mt19937 aRandom(theSeed);
+  std::normal_distribution<double> aNormal(0.0, std::sqrt(0.5));
+  SPair aPair{theLines, thePixels, {}, {}, {}};
+  for (int l = 0; l < theLines; ++l)
+    for (int p = 0; p < thePixels; ++p) {
+      const std::complex<double> a(aNormal(aRandom), aNormal(aRandom)), n(aNormal(aRandom), aNormal(aRandom));
+      const std::complex<double> m = a, s = theCoherence * a + std::sqrt(1 - theCoherence * theCoherence) * n;
+      const std::complex<double> z = m * std::conj(s) * std::polar(1.0, theFringe ? theFringe(l, p) : 0.0);
+      aPair.mZ.push_back(TCell(z / std::abs(z)));
+      aPair.mM.push_back(float(std::norm(m)));
+      aPair.mS.push_back(float(std::norm(s)));
+    }
+  return aPair;
+}
+
+// The measure over the whole pair through the window ring (Wr columns, Wa
+// lines), pixels with theInvalid[i] set made invalid.
+std::vector<float> ringCoherence(SPair thePair, int theWr, int theWa, const std::vector<uint8_t> &theBad = {}) {
+  const int n = thePair.mPixels;
+  CWindowRing aRing({theWa, theWr, ETLRXWindowBorder::kNull}, thePair.mLines, n, CTLRX_COHERENCE_CHANNELS);
+  const std::vector<double *> aTerms = aRing.termArrays();
+  const std::vector<const double *> aSums = aRing.columnArrays();
+  std::vector<float> aOut(size_t(thePair.mLines) * n);
+  std::vector<uint8_t> aInvalid(static_cast<size_t>(n)), aOk(static_cast<size_t>(n), 1);
+  fdfRunWindowSchedule(
+      aRing,
+      [&](int32_t l) {
+        const size_t o = size_t(l) * n;
+        std::vector<uint8_t> aMaster(aOk);
+        for (int j = 0; j < n && !theBad.empty(); ++j)
+          aMaster[size_t(j)] = theBad[o + size_t(j)] ? 0 : 1;
+        fdfCoherencePrepare(&thePair.mZ[o], aOk.data(), &thePair.mM[o], aMaster.data(), &thePair.mS[o], aOk.data(), n,
+                            {}, aInvalid.data());
+        fdfCoherenceTerms(&thePair.mZ[o], &thePair.mM[o], &thePair.mS[o], aInvalid.data(), n, aTerms.data(),
+                          aRing.centre(l));
+      },
+      [&](int32_t l) { fdfCoherenceLine(aSums.data(), aRing.centre(l), n, -1.0f, &aOut[size_t(l) * n]); });
+  return aOut;
+}
+
+// Mean of the values at the centres of disjoint windows (computed pixels:
+// ha .. L - ha - 1, hr .. P - hr - 1).
+double disjointMean(const std::vector<float> &theValues, int theLines, int thePixels, int theWr, int theWa) {
+  double aSum = 0;
+  int aCount = 0;
+  for (int l = theWa / 2; l < theLines - theWa / 2; l += theWa)
+    for (int p = theWr / 2; p < thePixels - theWr / 2; p += theWr, ++aCount)
+      aSum += theValues[size_t(l) * thePixels + p];
+  return aSum / aCount;
+}
+
+class CoherenceStep : public ::testing::Test {
+protected:
+  CTempDir mDir;
+  void SetUp() override { tlrxStartLibraryEnvironment(mDir.path()); }
+
+  // The pair as rasters: NAME_int, NAME_mpwr and NAME_spwr (theUnits of the
+  // power images; amplitudes are written as their square roots).
+  std::string write(const std::string &theName, const SPair &thePair, const char *theUnits = "POWER") {
+    STLRXTestRaster aZ, aM, aS;
+    for (STLRXTestRaster *aRaster : {&aZ, &aM, &aS}) {
+      aRaster->mLines = thePair.mLines;
+      aRaster->mPixels = thePair.mPixels;
+      aRaster->mDataUnits = theUnits;
+      aRaster->mHasNull = true;
+      aRaster->mNull = -9999;
+    }
+    aZ.mCellType = "FLOAT_COMPLEX";
+    aZ.mDataUnits = "FLATTENED INTERFEROGRAMME";
+    aZ.mCells = thePair.mZ;
+    const bool aAmplitude = std::string(theUnits) == "AMPLITUDE";
+    for (size_t i = 0; i < thePair.mM.size(); ++i) {
+      aM.mValues.push_back(aAmplitude ? std::sqrt(thePair.mM[i]) : thePair.mM[i]);
+      aS.mValues.push_back(aAmplitude ? std::sqrt(thePair.mS[i]) : thePair.mS[i]);
+    }
+    tlrxWriteTestRaster(mDir.file(theName + "_int"), aZ);
+    tlrxWriteTestRaster(mDir.file(theName + "_mpwr"), aM);
+    tlrxWriteTestRaster(mDir.file(theName + "_spwr"), aS);
+    return mDir.file(theName);
+  }
+
+  // The step on NAME_int, NAME_mpwr, NAME_spwr into OUT with arguments 5 on.
+  std::vector<double> run(const std::string &theName, const std::string &theOut, std::vector<std::string> theRest,
+                          int (*theProgram)(int, char **) = tlrx_cc_ave) {
+    std::vector<std::string> aArgs = {"tlrx_cc_ave", theName + "_int", theName + "_mpwr", theName + "_spwr",
+                                      mDir.file(theOut)};
+    aArgs.insert(aArgs.end(), theRest.begin(), theRest.end());
+    std::vector<char *> aArgv;
+    for (std::string &aArg : aArgs)
+      aArgv.push_back(aArg.data());
+    EXPECT_EQ(theProgram(int(aArgv.size()), aArgv.data()), 0);
+    return theProgram == tlrx_cc_ave ? tlrxReadTestRaster(mDir.file(theOut)) : std::vector<double>();
+  }
+
+  // Mean of the computed (not null) values.
+  static double computedMean(const std::vector<double> &theValues) {
+    double aSum = 0;
+    int aCount = 0;
+    for (double v : theValues)
+      if (v != fdfGetDummyValue()) {
+        aSum += v;
+        ++aCount;
+      }
+    return aCount > 0 ? aSum / aCount : -1;
+  }
+};
+
+} // namespace
+
+// Touzi's expectation of the sample coherence on white single-look speckle:
+// 5 x 5 windows give 0.607 for a true 0.6 and 0.178 for a true 0, 10 x 10
+// windows 0.900 for a true 0.9 (disjoint windows, within 0.01).
+TEST(CoherenceMeasure, SampleCoherenceFollowsTouzisExpectation) {
+  const struct {
+    double mTrue;
+    int mWindow;
+    double mExpected;
+  } aCases[] = {{0.6, 5, 0.607}, {0.0, 5, 0.178}, {0.9, 10, 0.900}};
+  for (const auto &aCase : aCases) {
+    const SPair aPair = whitePair(500, 500, aCase.mTrue, 11);
+    const std::vector<float> aG = ringCoherence(aPair, aCase.mWindow, aCase.mWindow);
+    EXPECT_NEAR(disjointMean(aG, 500, 500, aCase.mWindow, aCase.mWindow), aCase.mExpected, 0.01) << aCase.mTrue;
+  }
+}
+
+// The running sums against direct sums of the restored products on windows
+// odd and even, with invalid pixels (each invalidates its windows); the
+// border is null; one image with itself is 0.999 (never above 1); a phase
+// alternating by pi cancels to 0 in an even window.
+TEST(CoherenceMeasure, RunningSumsMatchDirectSumsAndTheEdgeRulesHold) {
+  const int L = 23, P = 19;
+  SPair aPair = whitePair(L, P, 0.5, 3);
+  std::vector<uint8_t> aBad(size_t(L * P), 0);
+  aBad[size_t(7 * P + 4)] = aBad[size_t(15 * P + 12)] = 1;
+  for (const auto &aWindow : {std::pair<int, int>{5, 5}, {4, 3}, {2, 6}}) {
+    const int Wr = aWindow.first, Wa = aWindow.second;
+    const std::vector<float> aG = ringCoherence(aPair, Wr, Wa, aBad);
+    for (int l = 0; l < L; ++l)
+      for (int j = 0; j < P; ++j) {
+        const float aGot = aG[size_t(l * P + j)];
+        // Computed columns run from hr to, not including, P - hr; lines likewise.
+        if (l < Wa / 2 || l >= L - Wa / 2 || j < Wr / 2 || j >= P - Wr / 2) {
+          EXPECT_EQ(aGot, -1.0f) << Wr << "x" << Wa << " border " << l << "," << j;
+          continue;
+        }
+        std::complex<double> aZ;
+        double aM = 0, aS = 0;
+        bool aInvalid = false;
+        for (int k = l - Wa / 2; k < l - Wa / 2 + Wa; ++k)
+          for (int c = j - Wr / 2; c < j - Wr / 2 + Wr; ++c) {
+            const size_t i = size_t(k * P + c);
+            aInvalid = aInvalid || aBad[i];
+            aZ += std::complex<double>(aPair.mZ[i]) * std::sqrt(double(aPair.mM[i]) * aPair.mS[i]);
+            aM += aPair.mM[i];
+            aS += aPair.mS[i];
+          }
+        const double aWant = aInvalid ? -1.0 : std::min(std::abs(aZ) / std::sqrt(aM * aS), 0.999);
+        EXPECT_NEAR(aGot, aWant, 2e-6) << Wr << "x" << Wa << " at " << l << "," << j;
+      }
+  }
+  SPair aSame = whitePair(9, 12, 1.0, 5); // an image with itself: constant phase, equal powers
+  std::fill(aSame.mZ.begin(), aSame.mZ.end(), TCell(0.6f, 0.8f));
+  aSame.mS = aSame.mM;
+  for (float v : ringCoherence(aSame, 5, 3))
+    EXPECT_TRUE(v == -1.0f || v == CTLRX_COHERENCE_MAX) << v;
+  std::fill(aSame.mM.begin(), aSame.mM.end(), 1.0f);
+  aSame.mS = aSame.mM;
+  for (size_t i = 0; i < aSame.mZ.size(); ++i)
+    aSame.mZ[i] = TCell(i % 2 == 0 ? 1.0f : -1.0f, 0.0f); // pi from pixel to pixel
+  for (float v : ringCoherence(aSame, 4, 3))
+    EXPECT_TRUE(v == -1.0f || std::fabs(v) < 1e-6) << v;
+}
+
+// A fringe of 0.1 cycles per pixel in range under 10 x 10 windows at a true
+// coherence of 0.9: the plain estimate falls to the bias floor; removing the
+// local frequency (outer windows 15 x 15) or flattening by the true phase
+// first brings it back to the expectation, 0.900.
+TEST_F(CoherenceStep, LocalFrequencyRemovalAndFlatteningUndoAFringe) {
+  const auto aFringe = [](int, int p) { return 2 * sPi * 0.1 * p; };
+  const std::string aPair = write("f", whitePair(120, 120, 0.9, 21, aFringe));
+  STLRXTestRaster aAux; // the auxiliary raster argument 9 names
+  aAux.mValues.assign(20, 0.0);
+  tlrxWriteTestRaster(mDir.file("aux"), aAux);
+  EXPECT_LT(computedMean(run(aPair, "plain", {"10", "10"})), 0.15);
+  ASSERT_TRUE(tlrxStartTrace());
+  EXPECT_NEAR(computedMean(run(aPair, "local", {"10", "10", "15", "15", mDir.file("aux")})), 0.900, 0.02);
+  EXPECT_NE(tlrxStopTrace(mDir.path()).find("Removel local frequency : 1\n"), std::string::npos);
+  STLRXTestRaster aPhase;
+  aPhase.mLines = aPhase.mPixels = 120;
+  for (int l = 0; l < 120; ++l)
+    for (int p = 0; p < 120; ++p)
+      aPhase.mValues.push_back(aFringe(l, p));
+  tlrxWriteTestRaster(mDir.file("sint"), aPhase);
+  std::vector<std::string> aArgs = {"tlrx_flattening", aPair + "_int", mDir.file("sint"), mDir.file("flat")};
+  std::vector<char *> aArgv;
+  for (std::string &aArg : aArgs)
+    aArgv.push_back(aArg.data());
+  ASSERT_EQ(tlrx_flattening(int(aArgv.size()), aArgv.data()), 0);
+  ASSERT_EQ(std::rename((mDir.file("flat_dint")).c_str(), (aPair + "_int").c_str()), 0);
+  ASSERT_EQ(std::rename((mDir.file("flat_dint.sml")).c_str(), (aPair + "_int.sml").c_str()), 0);
+  EXPECT_NEAR(computedMean(run(aPair, "flat", {"10", "10"})), 0.900, 0.01);
+}
+
+// Amplitude power images give what power images give; the wide-swath switch
+// uses the interferogram as it is (unit magnitudes: every computed pixel
+// reflects the power sums through D only); local windows smaller than the
+// coherence window are enlarged with the message; the processing window
+// crops the inputs; the header names the "_slc" images.
+TEST_F(CoherenceStep, SwitchesWindowsAndHeader) {
+  const SPair aPair = whitePair(30, 40, 0.7, 5);
+  const std::vector<double> aPower = run(write("p", aPair), "power", {"5"});
+  const std::vector<double> aAmplitude = run(write("a", aPair, "AMPLITUDE"), "amplitude", {"5", "5"});
+  for (size_t i = 0; i < aPower.size(); ++i)
+    EXPECT_NEAR(aAmplitude[i], aPower[i], 1e-5) << i;
+  tlrxExpectHeader(mDir.file("power"), "CellType=FLOAT;DataUnits=COHERENCE;NrOfLinesPerImage=30;NrOfPixelsPerLine=40;"
+                                       "FilesList=" + mDir.file("p_slc") + "," + mDir.file("p_slc"));
+  const std::vector<double> aCrop = run(mDir.file("p"), "crop", {"5", "5", "0", "0", "-", "10", "29", "4", "20"});
+  tlrxExpectHeader(mDir.file("crop"), "NrOfLinesPerImage=17;NrOfPixelsPerLine=20");
+  const std::vector<double> aWhole = tlrxReadTestRaster(mDir.file("power"));
+  for (int l = 2; l < 15; ++l) // inside the crop's own border, the values of the whole image
+    for (int p = 2; p < 18; ++p)
+      EXPECT_NEAR(aCrop[size_t(l * 20 + p)], aWhole[size_t((l + 4) * 40 + p + 10)], 1e-6) << l << "," << p;
+  STLRXTestRaster aAux;
+  aAux.mValues.assign(20, 0.0);
+  tlrxWriteTestRaster(mDir.file("aux"), aAux);
+  run(mDir.file("p"), "small", {"5", "5", "3", "3", mDir.file("aux")});
+  EXPECT_NE(tlrxReadFile(mDir.file("Process.log"))
+                .find("\nInsert a Window Size to estimate the Local Frequency: Rg [3] Az [3] bigger than coherence "
+                      "window size: Rg [5] Az [5]"),
+            std::string::npos);
+  // Wide swath: ORIGIN DATA of the master power; the magnitudes are not restored.
+  const std::string aWide = write("w", aPair);
+  CDescription aHeader;
+  fdfReadStandardHeader((aWide + "_mpwr").c_str(), aHeader);
+  fdfStampOtherInfo(aHeader, "ORIGIN DATA", "ENVISAT_WS_SR");
+  ASSERT_TRUE(fdfWriteStandardHeader((aWide + "_mpwr").c_str(), aHeader));
+  const std::vector<double> aWideG = run(aWide, "wide", {"5"});
+  double aZr = 0, aZi = 0, aM = 0, aS = 0;
+  for (int l = 0; l < 5; ++l)
+    for (int p = 0; p < 5; ++p) {
+      const size_t i = size_t(l * 40 + p);
+      aZr += aPair.mZ[i].real();
+      aZi += aPair.mZ[i].imag();
+      aM += aPair.mM[i];
+      aS += aPair.mS[i];
+    }
+  EXPECT_NEAR(aWideG[size_t(2 * 40 + 2)], std::hypot(aZr, aZi) / std::sqrt(aM * aS), 1e-6);
+}
+
+TEST_F(CoherenceStep, FailuresRaiseTheirCodesAndTheClosingRemovesTheInputs) {
+  const std::string p = write("p", whitePair(12, 12, 0.5, 1));
+  const std::string o = mDir.file("o");
+  const struct {
+    std::vector<std::string> mArgs;
+    int32_t mCode;
+    std::string mMessage;
+  } aCases[] = {
+      {{p + "_int", p + "_mpwr", p + "_spwr"}, CTLRX_ERR_ARGUMENTS, ""},
+      {{p + "_int", p + "_mpwr", p + "_spwr", o, "1"}, CTLRX_ERR_ARGUMENTS, ""},
+      {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "1"}, CTLRX_ERR_ARGUMENTS, ""},
+      {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "5", "7", "7"}, CTLRX_ERR_ARGUMENTS, ""},
+      {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "5", "7", "7", mDir.file("none")}, CTLRX_ERR_FILE_OPEN,
+       mDir.file("none") + "_hdr"},
+      {{p + "_int", mDir.file("none"), p + "_spwr", o, "5"}, CTLRX_ERR_FILE_OPEN, mDir.file("none") + "_hdr"},
+      {{p + "_int", p + "_mpwr", p + "_spwr", p + "_mpwr", "5"}, CTLRX_ERR_PARAMETER_FILE, p + "_mpwr"},
+      {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "5", "0", "0", "-", "8", "3"}, CTLRX_ERR_ARGUMENTS,
+       "processing window 8 3 0 11 of an image of 12 x 12"},
+  };
+  for (const auto &aCase : aCases) {
+    std::vector<std::string> aArgs = aCase.mArgs;
+    aArgs.insert(aArgs.begin(), "tlrx_cc_ave");
+    SCOPED_TRACE(aArgs.back());
+    std::vector<char *> aArgv;
+    for (std::string &aArg : aArgs)
+      aArgv.push_back(aArg.data());
+    std::string aMessage;
+    EXPECT_EQ(tlrxCodeOf([&] { tlrx_cc_ave(int(aArgv.size()), aArgv.data()); }, &aMessage), aCase.mCode);
+    EXPECT_EQ(aMessage, aCase.mMessage);
+    EXPECT_FALSE(tlrxFileExists(o));
+  }
+  run(p, "o", {"5"}, tlrx_cc_ave_close);
+  for (const char *aSuffix : {"_int", "_int.sml", "_mpwr", "_mpwr.sml", "_spwr", "_spwr.sml"})
+    EXPECT_FALSE(tlrxFileExists(p + aSuffix)) << aSuffix;
+}
