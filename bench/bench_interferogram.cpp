@@ -4,7 +4,9 @@
 //     as polynomials, the Doppler centroid from the header) and prints the
 //     wall and CPU seconds and the output pixels per CPU second;
 //   bench_interferogram run <argument>...
-//     runs the step with these arguments (argv[1] onwards), as the chain does.
+//     runs the interferogram step with these arguments, as the chain does;
+//   bench_interferogram coherence <argument>...
+//     runs the coherence step likewise.
 // The runtime is started from TELLURIX_INIT_DIR like the main program.
 #include <chrono>
 #include <complex>
@@ -14,6 +16,7 @@
 #include <string>
 #include <vector>
 
+#include "tlrx_cc_ave.h"
 #include "tlrx_description_section.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
@@ -61,13 +64,19 @@ int resample(const std::string &theRoot, double theRange, double theAzimuth) {
 
 int main(int argc, char **argv) {
   if (argc < 3 || (std::strcmp(argv[1], "resample") == 0 && argc < 5)) {
-    std::fprintf(stderr, "usage: %s resample <pair root> <range> <azimuth> | run <argument>...\n", argv[0]);
+    std::fprintf(stderr, "usage: %s resample <pair root> <range> <azimuth> | run <argument>... | coherence "
+                         "<argument>...\n",
+                 argv[0]);
     return 2;
   }
   try {
     fdfInitEnvironment(true, "bench_interferogram");
     if (std::strcmp(argv[1], "resample") == 0)
       return resample(argv[2], std::stod(argv[3]), std::stod(argv[4]));
+    if (std::strcmp(argv[1], "coherence") == 0) {
+      argv[1] = const_cast<char *>("tlrx_cc_ave");
+      return tlrx_cc_ave(argc - 1, argv + 1);
+    }
     argv[1] = const_cast<char *>("tlrx_hires_interf_SLC_with_sint");
     return tlrx_hires_interf_SLC_with_sint(argc - 1, argv + 1);
   } catch (const CErrorExceptionManager &aError) {
