@@ -88,3 +88,12 @@ inline STLRXTestSlc tlrxReadSlc(const std::string &theName) {
   aRaster.close();
   return aImage;
 }
+
+// Calls a step program with theArgs as its argv (theArgs[0] the program's
+// name); what it returns.
+inline int tlrxCallStep(int (*theProgram)(int, char **), std::vector<std::string> theArgs) {
+  std::vector<char *> aArgv;
+  for (std::string &aArg : theArgs)
+    aArgv.push_back(aArg.data());
+  return theProgram(static_cast<int>(aArgv.size()), aArgv.data());
+}

@@ -12,6 +12,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_flattening.h"
 #include "tlrx_header_expect.h"
+#include "tlrx_slc_test_support.h"
 #include "tlrx_test_support.h"
 #include "tlrx_trace_test_support.h"
 #include "tlrx_window_sums.h"
@@ -125,10 +126,7 @@ protected:
     std::vector<std::string> aArgs = {"tlrx_cc_ave", theName + "_int", theName + "_mpwr", theName + "_spwr",
                                       mDir.file(theOut)};
     aArgs.insert(aArgs.end(), theRest.begin(), theRest.end());
-    std::vector<char *> aArgv;
-    for (std::string &aArg : aArgs)
-      aArgv.push_back(aArg.data());
-    EXPECT_EQ(theProgram(int(aArgv.size()), aArgv.data()), 0);
+    EXPECT_EQ(tlrxCallStep(theProgram, aArgs), 0);
     return theProgram == tlrx_cc_ave ? tlrxReadTestRaster(mDir.file(theOut)) : std::vector<double>();
   }
 
@@ -231,11 +229,7 @@ TEST_F(CoherenceStep, LocalFrequencyRemovalAndFlatteningUndoAFringe) {
     for (int p = 0; p < 120; ++p)
       aPhase.mValues.push_back(aFringe(l, p));
   tlrxWriteTestRaster(mDir.file("sint"), aPhase);
-  std::vector<std::string> aArgs = {"tlrx_flattening", aPair + "_int", mDir.file("sint"), mDir.file("flat")};
-  std::vector<char *> aArgv;
-  for (std::string &aArg : aArgs)
-    aArgv.push_back(aArg.data());
-  ASSERT_EQ(tlrx_flattening(int(aArgv.size()), aArgv.data()), 0);
+  ASSERT_EQ(tlrxCallStep(tlrx_flattening, {"tlrx_flattening", aPair + "_int", mDir.file("sint"), mDir.file("flat")}), 0);
   ASSERT_EQ(std::rename((mDir.file("flat_dint")).c_str(), (aPair + "_int").c_str()), 0);
   ASSERT_EQ(std::rename((mDir.file("flat_dint.sml")).c_str(), (aPair + "_int.sml").c_str()), 0);
   EXPECT_NEAR(computedMean(run(aPair, "flat", {"10", "10"})), 0.900, 0.01);
@@ -310,11 +304,8 @@ TEST_F(CoherenceStep, FailuresRaiseTheirCodesAndTheClosingRemovesTheInputs) {
     std::vector<std::string> aArgs = aCase.mArgs;
     aArgs.insert(aArgs.begin(), "tlrx_cc_ave");
     SCOPED_TRACE(aArgs.back());
-    std::vector<char *> aArgv;
-    for (std::string &aArg : aArgs)
-      aArgv.push_back(aArg.data());
     std::string aMessage;
-    EXPECT_EQ(tlrxCodeOf([&] { tlrx_cc_ave(int(aArgv.size()), aArgv.data()); }, &aMessage), aCase.mCode);
+    EXPECT_EQ(tlrxCodeOf([&] { tlrxCallStep(tlrx_cc_ave, aArgs); }, &aMessage), aCase.mCode);
     EXPECT_EQ(aMessage, aCase.mMessage);
     EXPECT_FALSE(tlrxFileExists(o));
   }

@@ -40,10 +40,7 @@ protected:
 
   int run(std::vector<std::string> theArgs, int (*theProgram)(int, char **) = tlrx_flattening) {
     theArgs.insert(theArgs.begin(), "tlrx_flattening");
-    std::vector<char *> aArgv;
-    for (std::string &aArg : theArgs)
-      aArgv.push_back(aArg.data());
-    return theProgram(static_cast<int>(aArgv.size()), aArgv.data());
+    return tlrxCallStep(theProgram, theArgs);
   }
 };
 
