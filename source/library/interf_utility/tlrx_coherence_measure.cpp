@@ -39,14 +39,6 @@ void fdfCoherenceTerms(const std::complex<float> *theZ, const float *theM, const
   }
 }
 
-float fdfCoherenceValue(double theMaster, double theSlave, double theRe, double theIm, float theNull) {
-  const double aD = std::sqrt(theMaster * theSlave);
-  if (!(aD > 0.0))
-    return theNull;
-  const double g = std::sqrt(theRe * theRe + theIm * theIm) / aD;
-  return g >= CTLRX_COHERENCE_MAX ? CTLRX_COHERENCE_MAX : static_cast<float>(g);
-}
-
 void fdfCoherenceLine(const double *const *theSums, const uint8_t *theCentre, int32_t thePixels, float theNull,
                       float *theOut) {
   for (int32_t j = 0; j < thePixels; ++j)

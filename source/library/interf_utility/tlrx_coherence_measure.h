@@ -13,6 +13,7 @@
 // image with itself is told apart from rounding above it.
 #pragma once
 
+#include <cmath>
 #include <complex>
 #include <cstdint>
 
@@ -45,8 +46,16 @@ void fdfCoherenceTerms(const std::complex<float> *theZ, const float *theM, const
 // window holds an invalid pixel, or where sum m x sum s is not positive.
 void fdfCoherenceLine(const double *const *theSums, const uint8_t *theCentre, int32_t thePixels, float theNull,
                       float *theOut);
-// The same from sums given directly (the local-frequency path).
-float fdfCoherenceValue(double theMaster, double theSlave, double theRe, double theIm, float theNull);
+// The same from sums given directly (the local-frequency path): one square
+// root, g^2 = |Z|^2 / (Pm Ps) compared with the cap squared.
+inline float fdfCoherenceValue(double theMaster, double theSlave, double theRe, double theIm, float theNull) {
+  const double aPowers = theMaster * theSlave;
+  if (!(aPowers > 0.0))
+    return theNull;
+  const double aSquare = (theRe * theRe + theIm * theIm) / aPowers;
+  const double aCap = CTLRX_COHERENCE_MAX;
+  return aSquare >= aCap * aCap ? CTLRX_COHERENCE_MAX : static_cast<float>(std::sqrt(aSquare));
+}
 
 // Local fringe frequencies of a window from the unit-phasor differences of
 // its pixels (range: neighbouring columns, azimuth: neighbouring lines) and
