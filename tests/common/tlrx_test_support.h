@@ -59,12 +59,12 @@ struct STLRXTestRaster {
   int mLines = 4;
   int mPixels = 5;
   std::vector<double> mValues; // lines x pixels, line after line
-  std::vector<std::complex<float>> mCells; // the same for complex cell types
   std::string mCellType = "FLOAT";
   std::string mDataUnits = "POWER";
   bool mHasNull = false;
   double mNull = 0.0;
   std::string mAcquisitionTime; // "" for none
+  std::vector<std::complex<float>> mCells; // the values of complex cell types
 };
 void tlrxWriteTestRaster(const std::string &theName, const STLRXTestRaster &theRaster);
 // All cells of a raster as double, through the raster file.
