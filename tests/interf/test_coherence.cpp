@@ -250,6 +250,8 @@ TEST_F(CoherenceStep, SwitchesWindowsAndHeader) {
                                        "FilesList=" + mDir.file("p_slc") + "," + mDir.file("p_slc"));
   const std::vector<double> aCrop = run(mDir.file("p"), "crop", {"5", "5", "0", "0", "-", "10", "29", "4", "20"});
   tlrxExpectHeader(mDir.file("crop"), "NrOfLinesPerImage=17;NrOfPixelsPerLine=20");
+  run(mDir.file("p"), "clamped", {"5", "5", "0", "0", "-", "10", "40", "4", "30"}); // limited to the image
+  tlrxExpectHeader(mDir.file("clamped"), "NrOfLinesPerImage=26;NrOfPixelsPerLine=30");
   const std::vector<double> aWhole = tlrxReadTestRaster(mDir.file("power"));
   for (int l = 2; l < 15; ++l) // inside the crop's own border, the values of the whole image
     for (int p = 2; p < 18; ++p)
