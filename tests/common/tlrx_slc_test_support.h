@@ -6,6 +6,7 @@
 // band-limited data: truth(y, x) = scene(y + dy, x + dx).
 #pragma once
 
+#include "tlrx_errors.h"
 #include "tlrx_fft.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_test_support.h"
@@ -96,4 +97,32 @@ inline int tlrxCallStep(int (*theProgram)(int, char **), std::vector<std::string
   for (std::string &aArg : theArgs)
     aArgv.push_back(aArg.data());
   return theProgram(static_cast<int>(aArgv.size()), aArgv.data());
+}
+
+// A call of a step that must fail: its arguments after the program's name,
+// the code and the message it raises.
+struct STLRXStepFailure {
+  std::vector<std::string> mArgs;
+  int32_t mCode;
+  std::string mMessage;
+};
+// Each call raises its code and message and leaves no file theResult.
+inline void tlrxExpectStepFailures(int (*theProgram)(int, char **), const std::vector<STLRXStepFailure> &theCases,
+                                   const std::string &theResult) {
+  for (const STLRXStepFailure &aCase : theCases) {
+    std::vector<std::string> aArgs = aCase.mArgs;
+    aArgs.insert(aArgs.begin(), "step");
+    SCOPED_TRACE(aArgs.back());
+    int32_t aCode = 0;
+    std::string aMessage;
+    try {
+      tlrxCallStep(theProgram, aArgs);
+    } catch (const CErrorExceptionManager &aError) {
+      aCode = aError.mCode;
+      aMessage = aError.mMessage;
+    }
+    EXPECT_EQ(aCode, aCase.mCode);
+    EXPECT_EQ(aMessage, aCase.mMessage);
+    EXPECT_FALSE(tlrxFileExists(theResult));
+  }
 }

@@ -286,11 +286,8 @@ TEST_F(CoherenceStep, SwitchesWindowsAndHeader) {
 TEST_F(CoherenceStep, FailuresRaiseTheirCodesAndTheClosingRemovesTheInputs) {
   const std::string p = write("p", whitePair(12, 12, 0.5, 1));
   const std::string o = mDir.file("o");
-  const struct {
-    std::vector<std::string> mArgs;
-    int32_t mCode;
-    std::string mMessage;
-  } aCases[] = {
+  tlrxExpectStepFailures(
+      tlrx_cc_ave, {
       {{p + "_int", p + "_mpwr", p + "_spwr"}, CTLRX_ERR_ARGUMENTS, ""},
       {{p + "_int", p + "_mpwr", p + "_spwr", o, "1"}, CTLRX_ERR_ARGUMENTS, ""},
       {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "1"}, CTLRX_ERR_ARGUMENTS, ""},
@@ -301,16 +298,9 @@ TEST_F(CoherenceStep, FailuresRaiseTheirCodesAndTheClosingRemovesTheInputs) {
       {{p + "_int", p + "_mpwr", p + "_spwr", p + "_mpwr", "5"}, CTLRX_ERR_PARAMETER_FILE, p + "_mpwr"},
       {{p + "_int", p + "_mpwr", p + "_spwr", o, "5", "5", "0", "0", "-", "8", "3"}, CTLRX_ERR_ARGUMENTS,
        "processing window 8 3 0 11 of an image of 12 x 12"},
-  };
-  for (const auto &aCase : aCases) {
-    std::vector<std::string> aArgs = aCase.mArgs;
-    aArgs.insert(aArgs.begin(), "tlrx_cc_ave");
-    SCOPED_TRACE(aArgs.back());
-    std::string aMessage;
-    EXPECT_EQ(tlrxCodeOf([&] { tlrxCallStep(tlrx_cc_ave, aArgs); }, &aMessage), aCase.mCode);
-    EXPECT_EQ(aMessage, aCase.mMessage);
-    EXPECT_FALSE(tlrxFileExists(o));
-  }
+      },
+      o);
+
   run(p, "o", {"5"}, tlrx_cc_ave_close);
   for (const char *aSuffix : {"_int", "_int.sml", "_mpwr", "_mpwr.sml", "_spwr", "_spwr.sml"})
     EXPECT_FALSE(tlrxFileExists(p + aSuffix)) << aSuffix;
