@@ -333,7 +333,7 @@ const SSimOptionSpec sOptionTable[] = {
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        o.mCoherence0 = o.mCoherence1 = parseReal(n, v, 0.0, 1.0, "a number in 0..1");
      }},
-    {"--coherence-ramp", "G0,G1", CTLRX_SIM_PAIR, "coherence rising linearly from G0 at pixel 0 to G1 at the last pixel",
+    {"--coherence-ramp", "G0,G1", CTLRX_SIM_PAIR | CTLRX_SIM_SLC, "coherence rising linearly from G0 at pixel 0 to G1 at the last pixel",
      [](SSimOptions &o, const std::string &n, const std::string &v) {
        const std::vector<std::string> aItems = splitFields(n, v, 2, "G0,G1");
        o.mCoherence0 = parseReal(n, aItems[0], 0.0, 1.0, "a number in 0..1");
@@ -384,6 +384,16 @@ const SSimOptionSpec sOptionTable[] = {
      }},
     {"--topography", "RAD", CTLRX_SIM_SLC, "adds hills of peak phase RAD radians to the interferometric phase",
      [](SSimOptions &o, const std::string &n, const std::string &v) { o.mTopography = parseAnyReal(n, v); }},
+    {"--dem", "H", CTLRX_SIM_SLC,
+     "also writes ROOT_dem (FLOAT, metres, on the master grid): the hills of --topography as heights of peak H "
+     "metres, so the topographic phase is RAD / H radians per metre of height",
+     [](SSimOptions &o, const std::string &n, const std::string &v) {
+       o.mDemHeight = parseReal(n, v, 1e-3, 1e5, "a height in 0.001..100000 metres");
+     }},
+    {"--command-file", "FILE", CTLRX_SIM_SLC,
+     "also writes a parameter file of the coherence command for the pair: output root ROOT_cc, one look, a "
+     "5 x 5 window, co-registration estimated, ROOT_dem as elevation model with --dem, a GeoTIFF copy",
+     [](SSimOptions &o, const std::string &, const std::string &v) { o.mCommandFile = v; }},
     {"--doppler", "F1,F2", CTLRX_SIM_SLC,
      "Doppler centroids of master and slave as fractions of the PRF, -0.5..0.5: both see one reflectivity, each "
      "through the azimuth band of width PRF / OSR_AZ centred at its own centroid, the same content at the same "
@@ -799,6 +809,9 @@ std::string fdfSimHelpText() {
       "  # an SLC pair at coherence 0.8 whose slave is moved by an affine field, with a decorrelated box\n"
       "  tlrx_simulate slc --out s/pair --lines 1024 --pixels 1024 --shift-field 0.3,4e-4,-2e-4,-0.7,2e-4,4e-4 \\\n"
       "      --coherence-box 0,0,256,410,0 --cell-type SHORT_COMPLEX --reflectivity 10000\n"
+      "  # a pair for the coherence command: shift, fringes over hills with their elevation model\n"
+      "  tlrx_simulate slc --out c/pair --lines 512 --pixels 512 --shift-field 0.4,2e-4,0,-0.3,0,1e-4 \\\n"
+      "      --coherence-ramp 0.2,0.95 --phase-ramp 0.01,0.05 --topography 20 --dem 400 --command-file c/cc.xml\n"
       "  # a constant image of 4 with NaN as no-data value\n"
       "  tlrx_simulate constant --out c/four --value 4 --null NaN --nodata-box 0,0,2,2\n";
   return aText;

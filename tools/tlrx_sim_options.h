@@ -141,6 +141,8 @@ struct SSimOptions {
   double mDoppler[2] = {0.0, 0.0};          // centroid of master and slave, fraction of the PRF
   double mRangeBandShift = 0.0;             // range band offset of the slave, fraction of the bandwidth
   std::vector<std::pair<SSimBox, double>> mCoherenceBoxes;
+  double mDemHeight = 0.0;                  // peak height of the hills in ROOT_dem, metres (0: none)
+  std::string mCommandFile;                 // coherence command parameter file to write ("": none)
   // constant
   bool mValueGiven = false;
   double mValueRe = 0.0;

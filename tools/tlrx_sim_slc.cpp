@@ -32,6 +32,7 @@
 
 #include "tlrx_description_section.h"
 #include "tlrx_errors.h"
+#include "tlrx_sim_coherence_file.h"
 #include "tlrx_sim_random.h"
 #include "tlrx_sim_writer.h"
 
@@ -208,19 +209,53 @@ void affineShift(const SSimOptions &theOptions, TImage &theImage) {
   }
 }
 
+// Three Gaussian hills over the image, peak 1 (where they do not overlap).
+double hillsAt(const SSimOptions &theOptions, int32_t theLine, int32_t thePixel) {
+  const double aX = thePixel / std::max(1.0, theOptions.mPixels - 1.0);
+  const double aY = theLine / std::max(1.0, theOptions.mLines - 1.0);
+  const double aHills[3][3] = {{0.3, 0.3, 0.15}, {0.7, 0.4, 0.2}, {0.45, 0.75, 0.12}};
+  double aSum = 0.0;
+  for (const auto &aHill : aHills)
+    aSum += std::exp(-((aX - aHill[0]) * (aX - aHill[0]) + (aY - aHill[1]) * (aY - aHill[1])) /
+                     (2.0 * aHill[2] * aHill[2]));
+  return aSum;
+}
+
 // Interferometric phase of master x conj(slave): the ramp and the hills.
 double phaseAt(const SSimOptions &theOptions, int32_t theLine, int32_t thePixel) {
   double aPhase = 2.0 * CTLRX_SIM_PI * (theOptions.mFringesPerLine * theLine + theOptions.mFringesPerPixel * thePixel);
-  if (theOptions.mTopography != 0.0) {
-    const double aX = thePixel / std::max(1.0, theOptions.mPixels - 1.0);
-    const double aY = theLine / std::max(1.0, theOptions.mLines - 1.0);
-    const double aHills[3][3] = {{0.3, 0.3, 0.15}, {0.7, 0.4, 0.2}, {0.45, 0.75, 0.12}};
-    for (const auto &aHill : aHills)
-      aPhase += theOptions.mTopography *
-                std::exp(-((aX - aHill[0]) * (aX - aHill[0]) + (aY - aHill[1]) * (aY - aHill[1])) /
-                         (2.0 * aHill[2] * aHill[2]));
-  }
+  if (theOptions.mTopography != 0.0)
+    aPhase += theOptions.mTopography * hillsAt(theOptions, theLine, thePixel);
   return aPhase;
+}
+
+// The elevation model that made the hills' phase, on the master grid.
+void writeElevation(const SSimOptions &theOptions) {
+  SSimOptions aOptions = theOptions;
+  aOptions.mCellType = CTLRX_CELL_FLOAT;
+  aOptions.mScaleFactor = 1.0;
+  aOptions.mNull = -9999.0; // sea level is a height
+  SSimImageSpec aSpec;
+  aSpec.mName = theOptions.mOut + "_dem";
+  aSpec.mGrid = fdfSimImageGrid(theOptions, 1);
+  aSpec.mCellType = CTLRX_CELL_FLOAT;
+  aSpec.mUnits = "METERS";
+  aSpec.mDate = theOptions.mDates.at(0);
+  char aNote[160];
+  std::snprintf(aNote, sizeof aNote, "tlrx_simulate elevation model: hills of %g m, %g rad of phase at the peak",
+                theOptions.mDemHeight, theOptions.mTopography);
+  aSpec.mNote = aNote;
+  CSimRasterWriter aWriter(aOptions, aSpec);
+  const size_t aPixels = static_cast<size_t>(theOptions.mPixels);
+  std::vector<double> aHeights(aPixels);
+  const std::vector<uint8_t> aValid(aPixels, 1);
+  for (int32_t l = 0; l < theOptions.mLines; ++l) {
+    for (size_t p = 0; p < aPixels; ++p)
+      aHeights[p] = theOptions.mDemHeight * hillsAt(theOptions, l, static_cast<int32_t>(p));
+    aWriter.putLine(l, aHeights.data(), nullptr, aValid.data());
+  }
+  aWriter.finish();
+  std::printf("wrote %s: %d x %d FLOAT elevation model\n", aSpec.mName.c_str(), theOptions.mLines, theOptions.mPixels);
 }
 
 // What the interferometric steps read: a C-band geometry whose bandwidths
@@ -359,6 +394,10 @@ void fdfSimWriteSlcPair(const SSimOptions &theOptions) {
   writeImage(theOptions, 1, aMaster, aGrid.mPixels, theOptions.mDoppler[0]);
   aMaster = TImage();
   writeImage(theOptions, 2, aSlave, aGrid.mPixels, theOptions.mDoppler[1]);
+  if (theOptions.mDemHeight > 0.0)
+    writeElevation(theOptions);
+  if (!theOptions.mCommandFile.empty())
+    fdfSimWriteCoherenceParameters(theOptions);
   if (!theOptions.mList.empty()) {
     FILE *aList = std::fopen(theOptions.mList.c_str(), "w");
     if (aList == nullptr || std::fprintf(aList, "%s\n%s\n", fdfSimImageName(theOptions, 1).c_str(),
