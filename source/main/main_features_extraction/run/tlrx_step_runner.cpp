@@ -13,21 +13,20 @@ int fdfStepNothingToClose(int, char **) { return 1; }
 CStepRunner::CStepRunner(const std::vector<STLRXStep> &theTable, const char *theTotalLabel)
     : mTable(theTable), mTotalLabel(theTotalLabel), mStartClock(fdfProcessClock()) {}
 
-int32_t CStepRunner::run(const std::vector<int> &thePlan, const TLRXStepArguments &theArguments) const {
+int32_t CStepRunner::run(const std::vector<int> &thePlan, const TLRXStepArguments &theArguments,
+                         bool theClose) const {
   int32_t aStatus = 0;
   for (size_t aPosition = 0; aPosition < thePlan.size() && aStatus == 0; ++aPosition) {
     const STLRXStep &aStep = mTable.at(static_cast<size_t>(thePlan[aPosition]));
     fdfTraceMessage("\nStep (%d) %s\n", static_cast<int>(aPosition), aStep.mName);
-    aStatus = runStep(static_cast<int>(aPosition), aStep,
-                      theArguments(static_cast<int>(aPosition), thePlan[aPosition]));
+    aStatus = runStep(aStep, theArguments(static_cast<int>(aPosition), thePlan[aPosition]), theClose);
   }
   fdfTraceMessage("%s TOTAL TIME (s): %f\n", mTotalLabel.c_str(),
                   static_cast<double>(fdfProcessClock() - mStartClock) / CTLRX_CLOCKS_PER_SEC);
   return aStatus;
 }
 
-int32_t CStepRunner::runStep(int thePosition, const STLRXStep &theStep, std::vector<std::string> theArguments) const {
-  (void)thePosition;
+int32_t CStepRunner::runStep(const STLRXStep &theStep, std::vector<std::string> theArguments, bool theClose) const {
   fdfSetProcessName(theStep.mName);
   getAndSetPerc(-1, 0, nullptr);
   theArguments.insert(theArguments.begin(), fdfGetProcessName());
@@ -47,8 +46,7 @@ int32_t CStepRunner::runStep(int thePosition, const STLRXStep &theStep, std::vec
   const int aStatus = theStep.mMain(aArgc, aArgv.data());
   fdfTraceMessage("\nDURATION [%s]  (s) = %f\n\n%s  END  \n", fdfGetProcessName(),
                   static_cast<double>(fdfProcessClock() - aStart) / CTLRX_CLOCKS_PER_SEC, theStep.mName);
-  if (aStatus != 0)
-    return aStatus;
-  theStep.mClose(aArgc, aArgv.data());
-  return 0;
+  if (aStatus == 0 && theClose)
+    theStep.mClose(aArgc, aArgv.data());
+  return aStatus;
 }

@@ -29,11 +29,12 @@ public:
   CStepRunner(const std::vector<STLRXStep> &theTable, const char *theTotalLabel);
 
   // Runs the plan in order and stops at the first step whose main operation
-  // fails; returns that status, or 0 when every step succeeded.
-  int32_t run(const std::vector<int> &thePlan, const TLRXStepArguments &theArguments) const;
+  // fails; returns that status, or 0 when every step succeeded. Each step's
+  // closing operation follows its success when theClose.
+  int32_t run(const std::vector<int> &thePlan, const TLRXStepArguments &theArguments, bool theClose = true) const;
 
 private:
-  int32_t runStep(int thePosition, const STLRXStep &theStep, std::vector<std::string> theArguments) const;
+  int32_t runStep(const STLRXStep &theStep, std::vector<std::string> theArguments, bool theClose) const;
 
   std::vector<STLRXStep> mTable;
   std::string mTotalLabel;

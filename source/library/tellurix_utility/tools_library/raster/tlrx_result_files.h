@@ -21,6 +21,8 @@ public:
   void addRead(const std::string &theName) { mReads.push_back(theName); }
   // An input raster with its header files ("_hdr", ".sml", ".hdr").
   void addInput(const std::string &theName);
+  // A plain file written (a parameter file the run updates).
+  void addWrite(const std::string &theName) { mWrites.push_back(theName); }
   // A result raster with its header files and, when theTiff, its GeoTIFF
   // copy with the copy's header files.
   void addResult(const std::string &theName, bool theTiff);
