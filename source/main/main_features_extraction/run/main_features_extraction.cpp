@@ -1,6 +1,7 @@
 // Program entry: start-up, command dispatch and the closing of the run.
 #include "main_features_extraction.h"
 
+#include "main_coherence.h"
 #include "main_correlation.h"
 #include "main_mean_std_range.h"
 #include "main_ratio.h"
@@ -22,7 +23,7 @@ const STLRXCommand sCommands[CTLRX_COMMAND_COUNT] = {
     {"main_texture#", main_texture},
     {"main_ratio#", main_ratio},
     {"main_correlation#", main_correlation},
-    {"main_coherence#", nullptr},
+    {"main_coherence#", main_coherence},
     {"main_temporal_feature_extraction#", main_mean_std_range},
     {"main_principal_component_analysis#", nullptr},
     {"main_min_and_max#", main_search_min_max_value},
