@@ -96,8 +96,10 @@ int tlrx_flattening(int argc, char **argv) {
         continue;
       }
       // Turned in double: the magnitude is kept to float rounding.
-      const std::complex<double> aTurned = std::complex<double>(z) * std::polar(1.0, -aAngle);
-      z = std::complex<float>(static_cast<float>(aTurned.real()), static_cast<float>(aTurned.imag()));
+      double aSin = 0.0, aCos = 1.0;
+      ::sincos(-aAngle, &aSin, &aCos);
+      const double a = z.real(), b = z.imag();
+      z = std::complex<float>(static_cast<float>(a * aCos - b * aSin), static_cast<float>(a * aSin + b * aCos));
       ++aFlattened;
     }
     aOut.file().putComplexLine(l, aCells.data());

@@ -39,6 +39,20 @@ bool isValid(const TCell &theCell) {
   return theCell != TCell() && std::isfinite(theCell.real()) && std::isfinite(theCell.imag());
 }
 
+// sum of theCells[j] thePhasors[j] over [theFrom, theTo), written out so the
+// compiler need not guard a complex product against infinities.
+std::complex<double> demodulatedSum(const TCell *theCells, const std::complex<double> *thePhasors, int32_t theFrom,
+                                   int32_t theTo) {
+  double aRe = 0.0, aIm = 0.0;
+  for (int32_t j = theFrom; j < theTo; ++j) {
+    const double a = theCells[j].real(), b = theCells[j].imag();
+    const double c = thePhasors[j].real(), d = thePhasors[j].imag();
+    aRe += a * c - b * d;
+    aIm += a * d + b * c;
+  }
+  return {aRe, aIm};
+}
+
 int32_t signedBin(int32_t theBin, int32_t theSize) { return theBin < (theSize + 1) / 2 ? theBin : theBin - theSize; }
 
 // Weighted least squares min |A x - b| by Householder QR with column
@@ -130,10 +144,11 @@ std::vector<double> leastSquares(std::vector<double> theA, std::vector<double> t
 
 double SSyntPhaseModel::polynomial(double theX, double theY) const {
   const double u = (theX - mCentreX) / mScaleX, v = (theY - mCentreY) / mScaleY;
+  // The monomials in the order of CTLRX_SYNT_POWERS.
+  const double aMonomials[CTLRX_SYNT_TERMS] = {u, v, u * u, u * v, v * v, u * u * u, u * u * v, u * v * v, v * v * v};
   double aSum = 0.0;
   for (int32_t t = 0; t < termsOfDegree(mDegree); ++t)
-    aSum += mCoefficients[static_cast<size_t>(t)] * std::pow(u, CTLRX_SYNT_POWERS[t][0]) *
-            std::pow(v, CTLRX_SYNT_POWERS[t][1]);
+    aSum += mCoefficients[static_cast<size_t>(t)] * aMonomials[t];
   return aSum;
 }
 
@@ -220,7 +235,9 @@ void CSyntBlockEstimator::pushLine(const TCell *theCells, const double *theHeigh
   if (!mActive)
     return;
   const size_t aOffset = static_cast<size_t>(mPushed - 1 - mRowStart) * static_cast<size_t>(mPixels);
-  std::copy(theCells, theCells + mPixels, mCells.begin() + static_cast<std::ptrdiff_t>(aOffset));
+  // No data is held as 0 + 0i, so the sums below need no test.
+  std::transform(theCells, theCells + mPixels, mCells.begin() + static_cast<std::ptrdiff_t>(aOffset),
+                 [](const TCell &theCell) { return isValid(theCell) ? theCell : TCell(); });
   if (mHeights) {
     std::copy(theHeights, theHeights + mPixels, mHeightCells.begin() + static_cast<std::ptrdiff_t>(aOffset));
     std::copy(theKnown, theKnown + mPixels, mKnown.begin() + static_cast<std::ptrdiff_t>(aOffset));
@@ -258,11 +275,10 @@ void CSyntBlockEstimator::measureBlock(int32_t theCol, int32_t theWidth, int32_t
   for (int32_t i = 0; i < theRows; ++i) {
     const TCell *aIn = &mCells[static_cast<size_t>(i) * static_cast<size_t>(mPixels) + static_cast<size_t>(theCol)];
     TCell *aOut = aSpectrum + static_cast<size_t>(i) * static_cast<size_t>(mBlockPixels);
-    for (int32_t j = 0; j < theWidth; ++j)
-      if (isValid(aIn[j])) {
-        aOut[j] = aIn[j];
-        ++aValid;
-      }
+    for (int32_t j = 0; j < theWidth; ++j) {
+      aOut[j] = aIn[j];
+      aValid += aIn[j] != TCell() ? 1 : 0;
+    }
   }
   if (2 * aValid < static_cast<int64_t>(theRows) * theWidth)
     return;
@@ -304,7 +320,7 @@ void CSyntBlockEstimator::measureBlock(int32_t theCol, int32_t theWidth, int32_t
   for (int32_t i = 0; i < theRows; ++i) {
     const TCell *aIn = &mCells[static_cast<size_t>(i) * static_cast<size_t>(mPixels) + static_cast<size_t>(theCol)];
     for (int32_t j = 0; j < theWidth; ++j)
-      if (isValid(aIn[j])) {
+      if (aIn[j] != TCell()) {
         const int aHx = j < aMidX ? 0 : 1, aHy = i < aMidY ? 0 : 1;
         aX[aHx] += j;
         aNx[aHx] += 1;
@@ -325,12 +341,8 @@ void CSyntBlockEstimator::measureBlock(int32_t theCol, int32_t theWidth, int32_t
     aSum = 0.0;
     for (int32_t i = 0; i < theRows; ++i) {
       const TCell *aIn = &mCells[static_cast<size_t>(i) * static_cast<size_t>(mPixels) + static_cast<size_t>(theCol)];
-      std::complex<double> aLeft, aRight;
-      for (int32_t j = 0; j < theWidth; ++j)
-        if (isValid(aIn[j])) {
-          const std::complex<double> d = std::complex<double>(aIn[j]) * mRangePhasors[static_cast<size_t>(j)];
-          (j < aMidX ? aLeft : aRight) += d;
-        }
+      const std::complex<double> aLeft = demodulatedSum(aIn, mRangePhasors.data(), 0, aMidX);
+      const std::complex<double> aRight = demodulatedSum(aIn, mRangePhasors.data(), aMidX, theWidth);
       const std::complex<double> aRow = (aLeft + aRight) * mAzimuthPhasors[static_cast<size_t>(i)];
       aHalfX[0] += aLeft * mAzimuthPhasors[static_cast<size_t>(i)];
       aHalfX[1] += aRight * mAzimuthPhasors[static_cast<size_t>(i)];
