@@ -24,7 +24,6 @@
 
 #include <cctype>
 #include <cstdio>
-#include <exception>
 #include <map>
 #include <string>
 
@@ -280,18 +279,6 @@ int32_t fdfRunCoherence(const char *theArguments) {
   }, aShut);
 }
 
-// Errors of the numeric library keep their own text.
-int32_t fdfRunCoherenceGuarded(const char *theArguments) {
-  try {
-    return fdfRunCoherence(theArguments);
-  } catch (const CErrorExceptionManager &) {
-    throw;
-  } catch (const std::exception &aException) {
-    fdfTraceMessage("Exception raised: %s\n", aException.what());
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, aException.what());
-  }
-}
-
 bool fdfEndsWith(const std::string &theName, const std::string &theSuffix, bool theIgnoreCase) {
   if (theName.size() < theSuffix.size())
     return false;
@@ -349,6 +336,5 @@ std::vector<int> fdfCoherencePlan(bool theSplit, int theOrbitMethod, bool theFil
   return aPlan;
 }
 
-int32_t main_coherence(const char *theArguments) {
-  return fdfRunGuardedDriver(fdfRunCoherenceGuarded, theArguments);
-}
+// Errors of the numeric library keep their own text.
+int32_t main_coherence(const char *theArguments) { return fdfRunGuardedDriver(fdfRunCoherence, theArguments, true); }

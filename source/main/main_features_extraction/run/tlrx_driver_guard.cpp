@@ -6,7 +6,7 @@
 
 #include <exception>
 
-int32_t fdfRunGuardedDriver(TLRXDriverBody theBody, const char *theArguments) {
+int32_t fdfRunGuardedDriver(TLRXDriverBody theBody, const char *theArguments, bool theExceptionText) {
   // The results of the run are removed should it fail, down to the last
   // GeoTIFF copy: a failed run leaves nothing that looks like its result.
   CPendingFiles aRun;
@@ -21,7 +21,7 @@ int32_t fdfRunGuardedDriver(TLRXDriverBody theBody, const char *theArguments) {
     throw;
   } catch (const std::exception &aError) {
     fdfTraceMessage("Exception raised: %s\n", aError.what());
-    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
+    TLRX_RAISE(CTLRX_ERR_UNEXPECTED, theExceptionText ? aError.what() : fdfGetProcessName());
   } catch (...) {
     TLRX_RAISE(CTLRX_ERR_UNEXPECTED, fdfGetProcessName());
   }
