@@ -32,7 +32,7 @@ namespace {
 constexpr const char *CTLRX_CC_SCHEMA = "PARAMETERS_INFO_MAIN_FE_COHERENCE_CMD";
 constexpr const char *CTLRX_CC_TITLE = "Coherence Generation";
 constexpr int CTLRX_CC_STARS = 160;
-const char *const CTLRX_CC_NO_FILE = "NotOK";
+const char *const CTLRX_CC_NOT_OK = "NotOK";
 
 // The orbit and phase-slope programs need orbit data this system does not
 // hold; the plan of this command never names them.
@@ -125,11 +125,11 @@ void fdfReadKey(const CDescription &theParameters, const SCoherenceKey &theKey, 
   const std::string aKey = theKey.mKey, aName = aKey.substr(aKey.find('.') + 1);
   if (theKey.mHeading != nullptr)
     fdfLogMessage("%s%s\n\n", theKey.mHeading, std::string(CTLRX_CC_STARS, '*').c_str());
-  char aText[64];
+  char aText[512]; // a double in "%lf" needs up to 317 characters
   switch (theKey.mKind) {
   case CTLRX_CC_FLAG_WHEN_SET:
     if (!fdfHoldsValue(theParameters, theKey.mKey)) {
-      theSettings[aName] = CTLRX_CC_NO_FILE;
+      theSettings[aName] = CTLRX_CC_NOT_OK;
       return;
     }
     // fall through
@@ -200,8 +200,8 @@ std::vector<std::string> fdfStepArguments(int theStep, const TCoherenceSettings 
   switch (theStep) {
   case CTLRX_CC_INTERFEROGRAM:
     return {s.at("in_master_file_name"), s.at("in_slave_file_name"), theParameterFile, theNames.mMasterPower,
-            theNames.mSlavePower, r + "_int", s.at("rg_looks"), s.at("az_looks"), CTLRX_CC_NO_FILE,
-            CTLRX_CC_NO_FILE, s.at("int_spectral_shift_filter_flag"), s.at("int_doppler_filter_flag"),
+            theNames.mSlavePower, r + "_int", s.at("rg_looks"), s.at("az_looks"), CTLRX_CC_NOT_OK,
+            CTLRX_CC_NOT_OK, s.at("int_spectral_shift_filter_flag"), s.at("int_doppler_filter_flag"),
             s.at("int_blocksize"), s.at("int_block_overlap")};
   case CTLRX_CC_SYNTHETIC:
     return {theNames.mMasterPower, theNames.mSlavePower, "NotOK", s.at("in_dem_file_name"),
@@ -238,7 +238,7 @@ int32_t fdfRunCoherence(const char *theArguments) {
     fdfLogMessage("\nEmpty out_root_file_name: [%s]", aFile);
     TLRX_RAISE(CTLRX_ERR_PARAMETER_FILE, "MAIN_CMD.out_root_file_name");
   }
-  const std::string aParameterFile = aSettings.at("input_param_file_name") == CTLRX_CC_NO_FILE
+  const std::string aParameterFile = aSettings.at("input_param_file_name") == CTLRX_CC_NOT_OK
                                          ? aSettings.at("out_root_file_name") + "_par"
                                          : aSettings.at("input_param_file_name");
   const bool aCompute = fdfIsSwitchOn(aSettings.at("compute_param_flag")) ||
