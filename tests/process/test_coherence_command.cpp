@@ -17,14 +17,14 @@ namespace {
 // Touzi's expectation of the sample coherence of N independent samples at
 // true coherence g: Gamma(N) Gamma(3/2) / Gamma(N + 1/2) (1 - g^2)^N
 // 3F2(3/2, N, N; N + 1/2, 1; g^2), the series summed term by term.
-double touzi(double g, int N) {
-  const double x = g * g;
+double touzi(double theG, int theN) {
+  const double x = theG * theG, n = theN;
   double aTerm = 1.0, aSum = 1.0;
   for (int k = 0; k < 20000 && aTerm > 1e-16 * aSum; ++k) {
-    aTerm *= (1.5 + k) * (N + k) * (N + k) / ((N + 0.5 + k) * (1.0 + k) * (1.0 + k)) * x;
+    aTerm *= (1.5 + k) * (n + k) * (n + k) / ((n + 0.5 + k) * (1.0 + k) * (1.0 + k)) * x;
     aSum += aTerm;
   }
-  const double aLog = std::lgamma(N) + std::lgamma(1.5) - std::lgamma(N + 0.5) + N * std::log1p(-x);
+  const double aLog = std::lgamma(n) + std::lgamma(1.5) - std::lgamma(n + 0.5) + n * std::log1p(-x);
   return std::exp(aLog + std::log(aSum));
 }
 
@@ -167,11 +167,11 @@ TEST_F(CoherenceCommand, FlatteningRestoresTheCoherenceUnderAFringe) {
 TEST_F(CoherenceCommand, PlanArgumentsAndClosingOperationsFollowTheSwitches) {
   pair({"--lines", "256", "--pixels", "256", "--coherence", "0.7"});
   const std::string r = file("pair"), m = file("pair_1"), s = file("pair_2"), mp = file("pair_1_pwr"),
-                    sp = file("pair_2_pwr"), par = file("pair_cc_par");
-  const std::vector<std::string> aInterferogram = {m, s, par, mp, sp, r + "_int", "1", "1", "NotOK", "NotOK",
+                    sp = file("pair_2_pwr"), aPar = file("pair_cc_par");
+  const std::vector<std::string> aInterferogram = {m, s, aPar, mp, sp, r + "_int", "1", "1", "NotOK", "NotOK",
                                                    "OK", "OK", "1024", "50"};
   const std::vector<std::string> aSynthetic = {mp, sp, "NotOK", "NotOK", "NotOK", "10", "10", "0", r, "NotOK",
-                                               "NotOK", "NotOK", "NotOK", "1.000000", "NotOK", "NotOK", par, "1",
+                                               "NotOK", "NotOK", "NotOK", "1.000000", "NotOK", "NotOK", aPar, "1",
                                                "1", "OK", "NotOK", "NotOK", "NotOK"};
   const std::vector<std::string> aFlattening = {r + "_int", r + "_sint", r, "NotOK", "NotOK", "NotOK"};
   const std::vector<std::string> aFilter = {r + "_dint", r + "_fint", "0.25", "2"};
