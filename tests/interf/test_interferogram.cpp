@@ -383,6 +383,10 @@ TEST_F(Interferogram, ShiftRastersSyntheticPhaseAndIncidence) {
   run(aRoot, "poly", {"1", "1", "NotOK"});
   run(aRoot, "rasters", {"1", "1", "NotOK", "-", "NotOK", "NotOK", "5000", "50", "NotOK", "NotOK", aRange, aAzimuth});
   EXPECT_EQ(tlrxReadFile(mDir.file("rasters_int")), tlrxReadFile(mDir.file("poly_int")));
+  // One shift raster alone does not stand for the polynomials.
+  const std::string aWrong = aRaster("shw", [](int, int) { return 0.0; });
+  run(aRoot, "alone", {"1", "1", "NotOK", "-", "NotOK", "NotOK", "5000", "50", "NotOK", "NotOK", aWrong, "NotOK"});
+  EXPECT_EQ(tlrxReadFile(mDir.file("alone_int")), tlrxReadFile(mDir.file("poly_int")));
   run(aRoot, "flat", {"-2", "1", aPhase, "-", "NotOK", "NotOK", "5000", "50", aIncidence, aIncidence});
   const SImage aZ = tlrxReadSlc(mDir.file("flat_int"));
   // Single-look phases are noisy where the speckle is dark: lines are compared.
