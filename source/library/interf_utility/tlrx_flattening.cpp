@@ -10,6 +10,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_no_data.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
@@ -18,11 +19,6 @@
 namespace {
 
 constexpr int CTLRX_FLATTENING_CLOSE_ARGUMENTS = 7;
-
-std::string cellType(const CDescription &theHeader) {
-  const CDescriptionField *aField = theHeader.findField("RasterInfo.CellType");
-  return aField != nullptr && aField->holdsValue() ? aField->getString() : "";
-}
 
 // The phase's no-data rule: its declared null value, and NaN. A header
 // without one declares none (a phase of exactly 0 is a phase).
@@ -52,16 +48,18 @@ int tlrx_flattening(int argc, char **argv) {
   CDescription aZHeader, aPhaseHeader;
   fdfLoadInputHeader(aInterferogram, aZHeader);
   fdfLoadInputHeader(aPhase, aPhaseHeader);
-  if (cellType(aZHeader) != "FLOAT_COMPLEX") {
-    fdfTraceMessage("Error: unsupported data type: %s for the interferogram %s\n", cellType(aZHeader).c_str(),
+  const std::string aZType = fdfHeaderText(aZHeader, "RasterInfo.CellType");
+  const std::string aPhaseType = fdfHeaderText(aPhaseHeader, "RasterInfo.CellType");
+  if (aZType != "FLOAT_COMPLEX") {
+    fdfTraceMessage("Error: unsupported data type: %s for the interferogram %s\n", aZType.c_str(),
                     aInterferogram.c_str());
-    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (interferogram %.200s)", cellType(aZHeader).c_str(),
+    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (interferogram %.200s)", aZType.c_str(),
                  aInterferogram.c_str());
   }
-  if (cellType(aPhaseHeader).find("COMPLEX") != std::string::npos) {
-    fdfTraceMessage("Error: unsupported data type: %s for the synthetic phase %s\n", cellType(aPhaseHeader).c_str(),
+  if (aPhaseType.find("COMPLEX") != std::string::npos) {
+    fdfTraceMessage("Error: unsupported data type: %s for the synthetic phase %s\n", aPhaseType.c_str(),
                     aPhase.c_str());
-    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (synthetic phase %.200s)", cellType(aPhaseHeader).c_str(),
+    TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (synthetic phase %.200s)", aPhaseType.c_str(),
                  aPhase.c_str());
   }
   CRasterFile aZ, aPhi;

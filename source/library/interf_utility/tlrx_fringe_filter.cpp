@@ -248,11 +248,6 @@ SFringeArguments readArguments(int argc, char **argv) {
   return a;
 }
 
-std::string headerText(const CDescription &theHeader, const char *theKey) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  return aField != nullptr && aField->holdsValue() ? aField->getString() : "";
-}
-
 } // namespace
 
 int tlrx_fringe_filter(int argc, char **argv) {
@@ -265,7 +260,7 @@ int tlrx_fringe_filter(int argc, char **argv) {
 
   CDescription aHeader;
   fdfLoadInputHeader(aArgs.mInput, aHeader);
-  const std::string aCellType = headerText(aHeader, "RasterInfo.CellType");
+  const std::string aCellType = fdfHeaderText(aHeader, "RasterInfo.CellType");
   if (aCellType != "FLOAT_COMPLEX") {
     fdfTraceMessage("Error: unsupported data type: %s for input file 1\n", aCellType.c_str());
     fdfLogMessage("Error: unsupported data type: %s for input file 1\n", aCellType.c_str());
@@ -277,7 +272,7 @@ int tlrx_fringe_filter(int argc, char **argv) {
   fdfTraceMessage("image size: %d lines x %d pixels\n", aLines, aPixels);
 
   CDescription aResultHeader;
-  const bool aFlattened = headerText(aHeader, "RasterInfo.DataUnits") == CTLRX_FRINGE_FLATTENED;
+  const bool aFlattened = fdfHeaderText(aHeader, "RasterInfo.DataUnits") == CTLRX_FRINGE_FLATTENED;
   fdfMakeResultHeader(aResultHeader, aHeader, "FLOAT_COMPLEX", aFlattened ? nullptr : "INTERFEROGRAMME", 0.0);
   fdfSetHeaderList(aResultHeader, "RasterInfo.FilesList", {aArgs.mInput});
   CResultRaster aResult(aArgs.mOutput, aResultHeader);

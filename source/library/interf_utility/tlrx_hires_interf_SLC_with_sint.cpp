@@ -149,8 +149,7 @@ struct SSlcInput {
 void openSlc(SSlcInput &theInput, const char *theName, int theNumber) {
   theInput.mName = theName;
   fdfLoadInputHeader(theInput.mName, theInput.mHeader);
-  const CDescriptionField *aType = theInput.mHeader.findField("RasterInfo.CellType");
-  const std::string aCellType = aType != nullptr && aType->holdsValue() ? aType->getString() : "";
+  const std::string aCellType = fdfHeaderText(theInput.mHeader, "RasterInfo.CellType");
   if (aCellType != "SHORT_COMPLEX" && aCellType != "FLOAT_COMPLEX") {
     fdfTraceMessage("Error: unsupported data type: %s for input file %d\n", aCellType.c_str(), theNumber);
     fdfLogMessage("Error: unsupported data type: %s for input file %d\n", aCellType.c_str(), theNumber);

@@ -537,17 +537,6 @@ void fdfMultilookHeights(const double *theRows, int32_t theDemPixels, const SHei
 
 namespace {
 
-std::string headerText(const CDescription &theHeader, const char *theKey) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  return aField != nullptr && aField->holdsValue() ? aField->getString() : "";
-}
-
-// An integer of the header, theDefault when absent.
-int32_t headerInteger(const CDescription &theHeader, const char *theKey, int32_t theDefault) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  return aField != nullptr && aField->holdsValue() ? aField->getInteger() : theDefault;
-}
-
 // The same line to the log and the trace.
 void note(const char *theFormat, ...) __attribute__((format(printf, 1, 2)));
 void note(const char *theFormat, ...) {
@@ -688,13 +677,13 @@ int tlrx_split_synt_phase(int argc, char **argv) {
   fdfLoadInputHeader(aMaster, aMasterHeader);
   if (aWithHeight)
     fdfLoadInputHeader(aDem, aDemHeader);
-  const std::string aZType = headerText(aZHeader, "RasterInfo.CellType");
+  const std::string aZType = fdfHeaderText(aZHeader, "RasterInfo.CellType");
   if (aZType.find("COMPLEX") == std::string::npos) {
     fdfTraceMessage("Error: unsupported data type: %s for the interferogram %s\n", aZType.c_str(),
                     aInterferogram.c_str());
     TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (interferogram %.200s)", aZType.c_str(), aInterferogram.c_str());
   }
-  const std::string aDemType = headerText(aDemHeader, "RasterInfo.CellType");
+  const std::string aDemType = fdfHeaderText(aDemHeader, "RasterInfo.CellType");
   if (aWithHeight && aDemType.find("COMPLEX") != std::string::npos) {
     fdfTraceMessage("Error: unsupported data type: %s for the elevation model %s\n", aDemType.c_str(), aDem.c_str());
     TLRX_RAISE_F(CTLRX_ERR_IMAGES_INCOMPATIBLE, "%.64s (elevation model %.200s)", aDemType.c_str(), aDem.c_str());
@@ -714,8 +703,8 @@ int tlrx_split_synt_phase(int argc, char **argv) {
   SNoData aNull(std::nan(""));
   if (aWithHeight) {
     aHeights.open_read(aDem.c_str(), aDemHeader);
-    const int32_t aAzimuthLooks = headerInteger(aZHeader, "Processing.NAzimuthLooks", 1);
-    const int32_t aRangeLooks = headerInteger(aZHeader, "Processing.NRangeLooks", 1);
+    const int32_t aAzimuthLooks = fdfHeaderIntegerOr(aZHeader, "Processing.NAzimuthLooks", 1);
+    const int32_t aRangeLooks = fdfHeaderIntegerOr(aZHeader, "Processing.NRangeLooks", 1);
     if (!fdfHeightLooks(aLines, aPixels, aHeights.getNrOfLinesPerImage(), aHeights.getNrOfPixelsPerLine(),
                         aAzimuthLooks, aRangeLooks, aLooks)) {
       fdfTraceMessage("Error: the elevation model %s has %d x %d cells, the interferogram %d x %d at %d x %d looks\n",

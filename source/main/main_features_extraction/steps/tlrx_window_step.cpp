@@ -4,22 +4,16 @@
 #include "tlrx_description_xml.h"
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
+#include "tlrx_header_numbers.h"
 #include "tlrx_step_common.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 
-#include <cstring>
 
 namespace {
 
-const char *fdfHeaderText(const CDescription &theHeader, const char *theKey) {
-  const CDescriptionField *aField = theHeader.findField(theKey);
-  return aField != nullptr && aField->holdsValue() && aField->getValueType() == CTLRX_DS_STRING ? aField->getString()
-                                                                                                : "";
-}
-
 bool fdfIsComplexHeader(const CDescription &theHeader) {
-  return fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType")));
+  return fdfIsComplexCellType(fdfCellTypeFromName(fdfHeaderText(theHeader, "RasterInfo.CellType").c_str()));
 }
 
 } // namespace
@@ -31,7 +25,7 @@ void fdfCheckWindowSize(int32_t theRows, int32_t theCols, const SWindowRule &the
 }
 
 bool fdfDeliversIntensity(const CDescription &theHeader) {
-  return std::strcmp(fdfHeaderText(theHeader, "RasterInfo.DataUnits"), "POWER") == 0 || fdfIsComplexHeader(theHeader);
+  return fdfHeaderText(theHeader, "RasterInfo.DataUnits") == "POWER" || fdfIsComplexHeader(theHeader);
 }
 
 CWindowInput::CWindowInput(const char *theName) : mName(theName) {

@@ -55,6 +55,12 @@ bool fdfHeaderHolds(const CDescription &theHeader, const char *theKey) {
   return aField != nullptr && aField->getShape() == CTLRX_DS_SCALAR;
 }
 
+std::string fdfHeaderText(const CDescription &theHeader, const char *theKey) {
+  const CDescriptionField *aField = theHeader.findField(theKey);
+  return aField != nullptr && aField->holdsValue() && aField->getValueType() == CTLRX_DS_STRING ? aField->getString()
+                                                                                                : "";
+}
+
 std::string fdfReadHeaderInteger(const CDescription &theHeader, const char *theKey, int32_t &theValue) {
   const CDescriptionField *aField = scalarField(theHeader, theKey);
   std::string aProblem = shapeProblem(aField);

@@ -22,6 +22,9 @@ struct SHeaderReader {
 
 // Whether theKey names a scalar field that holds a value.
 bool fdfHeaderHolds(const CDescription &theHeader, const char *theKey);
+// The text of string field theKey ("RasterInfo.CellType"), empty when it
+// holds none or is not a string.
+std::string fdfHeaderText(const CDescription &theHeader, const char *theKey);
 
 // Non-raising forms: an empty text when theValue was read, otherwise what is
 // wrong with the field ("holds no value", "is not an integer [7.5]").
