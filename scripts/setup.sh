@@ -7,7 +7,7 @@ build=${1:-$top/build}
 shift || true
 
 packages=(cmake g++ make pkg-config libexpat1-dev libtiff-dev libgeotiff-dev libfftw3-dev libgtest-dev
-          libbenchmark-dev gdal-bin geotiff-bin libtiff-tools libxml2-utils clang clang-tidy libclang-rt-14-dev
+          libbenchmark-dev gdal-bin geotiff-bin libtiff-tools libxml2-utils clang clang-tidy libclang-rt-14-dev libomp-dev
           python3-numpy python3-scipy time)
 missing=()
 for p in "${packages[@]}"; do

@@ -11,6 +11,7 @@
 #include "tlrx_enviroment.h"
 #include "tlrx_errors.h"
 #include "tlrx_platform.h"
+#include "tlrx_threads.h"
 
 #include <cstring>
 #include <exception>
@@ -71,6 +72,8 @@ int main_features_extraction(const char *theLine) {
     if (aTrailer != std::string::npos)
       sCommandLine.erase(aTrailer);
     fdfTraceMessage("\nlpCmdLine =%s\n", sCommandLine.c_str());
+    // A bad thread count is refused here, before any command opens a file.
+    fdfTraceMessage("threads = %d\n", fdfThreadCount());
     const char *aArguments = nullptr;
     const int aCommand = fdfMatchCommand(sCommandLine.c_str(), &aArguments);
     fdfTraceMessage("aCommand =%d\n", aCommand);

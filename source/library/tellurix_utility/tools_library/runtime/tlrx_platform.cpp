@@ -3,7 +3,9 @@
 
 #include "tlrx_errors.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <cmath>
 #include <chrono>
 #include <climits>
 #include <csignal>
@@ -12,6 +14,7 @@
 #include <cstring>
 #include <fcntl.h>
 #include <fstream>
+#include <sched.h>
 #include <iostream>
 #include <spawn.h>
 #include <sys/stat.h>
@@ -221,6 +224,52 @@ bool fdfSameFile(const std::string &theFirst, const std::string &theSecond) {
 }
 
 int fdfProcessId() { return static_cast<int>(getpid()); }
+
+namespace {
+
+// Quota over period of a control-group file, or 0 when unlimited or absent.
+// cgroup v2 holds both in one file ("max 100000" when unlimited).
+double fdfCgroupCpuLimit(const std::string &theQuotaFile, const std::string &thePeriodFile) {
+  std::ifstream aQuota(theQuotaFile);
+  std::string aQuotaText;
+  double aPeriod = 0.0;
+  if (!(aQuota >> aQuotaText) || aQuotaText == "max")
+    return 0.0;
+  if (thePeriodFile.empty())
+    aQuota >> aPeriod;
+  else
+    std::ifstream(thePeriodFile) >> aPeriod;
+  const double aValue = std::strtod(aQuotaText.c_str(), nullptr);
+  return aValue > 0.0 && aPeriod > 0.0 ? aValue / aPeriod : 0.0;
+}
+
+// The process's own cgroup v2 folder ("0::/path" in /proc/self/cgroup).
+std::string fdfOwnCgroupDir() {
+  std::ifstream aList("/proc/self/cgroup");
+  std::string aLine;
+  while (std::getline(aList, aLine))
+    if (aLine.compare(0, 3, "0::") == 0)
+      return "/sys/fs/cgroup" + aLine.substr(3);
+  return "/sys/fs/cgroup";
+}
+
+} // namespace
+
+int fdfUsableCpuCount() {
+  cpu_set_t aSet;
+  CPU_ZERO(&aSet);
+  int aCount = sched_getaffinity(0, sizeof(aSet), &aSet) == 0 ? CPU_COUNT(&aSet) : 0;
+  if (aCount < 1)
+    aCount = std::max(1L, sysconf(_SC_NPROCESSORS_ONLN));
+  double aLimit = fdfCgroupCpuLimit(fdfOwnCgroupDir() + "/cpu.max", "");
+  if (aLimit <= 0.0)
+    aLimit = fdfCgroupCpuLimit("/sys/fs/cgroup/cpu.max", "");
+  if (aLimit <= 0.0)
+    aLimit = fdfCgroupCpuLimit("/sys/fs/cgroup/cpu/cpu.cfs_quota_us", "/sys/fs/cgroup/cpu/cpu.cfs_period_us");
+  if (aLimit > 0.0)
+    aCount = std::min(aCount, std::max(1, static_cast<int>(std::ceil(aLimit))));
+  return aCount;
+}
 
 namespace {
 

@@ -52,6 +52,11 @@ constexpr char CTLRX_PATH_SEPARATOR = '/';
 bool fdfSameFile(const std::string &theFirst, const std::string &theSecond);
 int fdfProcessId();
 
+// CPUs this process may run on: its affinity mask, capped by the CPU quota of
+// its control group (cgroup v2 "cpu.max" or v1 "cpu.cfs_quota_us", rounded
+// up); at least 1.
+int fdfUsableCpuCount();
+
 // SIGTERM and SIGINT only record that the operator asked to stop; the next
 // progress check raises the interruption. Installing clears a request.
 void fdfInstallInterruptionHandlers();

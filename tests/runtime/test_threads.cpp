@@ -1,0 +1,134 @@
+// Threads within a run: the thread count from TELLURIX_THREADS or the CPUs,
+// the parallel loop's coverage and failure rule, and the band schedule.
+#include "tlrx_description_test_support.h"
+#include "tlrx_errors.h"
+#include "tlrx_platform.h"
+#include "tlrx_threads.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <cstdlib>
+#include <mutex>
+#include <set>
+#include <unistd.h>
+#include <vector>
+
+namespace {
+
+// Sets TELLURIX_THREADS for one test ("" unsets it) and forgets the count.
+class CThreadsSetting {
+public:
+  explicit CThreadsSetting(const char *theValue) {
+    if (theValue[0] == '\0')
+      unsetenv("TELLURIX_THREADS");
+    else
+      setenv("TELLURIX_THREADS", theValue, 1);
+    fdfResetThreadCount();
+  }
+  ~CThreadsSetting() {
+    unsetenv("TELLURIX_THREADS");
+    fdfResetThreadCount();
+  }
+};
+
+} // namespace
+
+TEST(Threads, CountFromTheVariableOrTheCpus) {
+  {
+    CThreadsSetting aSetting("");
+    EXPECT_EQ(fdfThreadCount(), fdfUsableCpuCount());
+    EXPECT_GE(fdfUsableCpuCount(), 1);
+    EXPECT_LE(fdfUsableCpuCount(), sysconf(_SC_NPROCESSORS_CONF));
+  }
+  for (const char *aValue : {"1", "3", "256"}) {
+    CThreadsSetting aSetting(aValue);
+    EXPECT_EQ(fdfThreadCount(), std::atoi(aValue));
+  }
+  for (const char *aValue : {"0", "-2", "257", "abc", "2x", " ", "99999999999999999999"}) {
+    CThreadsSetting aSetting(aValue);
+    std::string aMessage;
+    EXPECT_EQ(tlrxCodeOf([] { fdfThreadCount(); }, &aMessage), CTLRX_ERR_SETTING_MISSING) << aValue;
+    EXPECT_NE(aMessage.find("TELLURIX_THREADS = \"" + std::string(aValue) + "\""), std::string::npos) << aMessage;
+  }
+}
+
+TEST(Threads, ParallelForCallsEachIndexOnceOnTheRunsThreads) {
+  for (const char *aThreads : {"1", "3"}) {
+    CThreadsSetting aSetting(aThreads);
+    for (int64_t aCount : {0, 1, 2, 97}) {
+      std::vector<std::atomic<int>> aCalls(static_cast<size_t>(aCount));
+      std::atomic<int> aBadThread{0};
+      fdfParallelFor(aCount, [&](int64_t i, int theThread) {
+        ++aCalls[static_cast<size_t>(i)];
+        aBadThread += theThread < 0 || theThread >= fdfThreadCount() ? 1 : 0;
+      });
+      for (const auto &aCall : aCalls)
+        EXPECT_EQ(aCall.load(), 1) << aThreads << " threads, " << aCount << " pieces";
+      EXPECT_EQ(aBadThread.load(), 0);
+    }
+  }
+}
+
+// Pieces 40 and 70 fail: whatever the threads, the caller sees piece 40's
+// error, and every piece below it has run.
+TEST(Threads, ParallelForRethrowsTheFailureOfTheLowestIndex) {
+  for (const char *aThreads : {"1", "2", "3"}) {
+    CThreadsSetting aSetting(aThreads);
+    std::vector<std::atomic<int>> aCalls(100);
+    std::string aMessage;
+    const int32_t aCode = tlrxCodeOf(
+        [&] {
+          fdfParallelFor(100, [&](int64_t i, int) {
+            ++aCalls[static_cast<size_t>(i)];
+            if (i == 70)
+              TLRX_RAISE(CTLRX_ERR_FILE_READ, "piece 70");
+            if (i == 40)
+              TLRX_RAISE(CTLRX_ERR_FILE_WRITE, "piece 40");
+          });
+        },
+        &aMessage);
+    EXPECT_EQ(aCode, CTLRX_ERR_FILE_WRITE) << aThreads;
+    EXPECT_EQ(aMessage, "piece 40");
+    for (int i = 0; i <= 40; ++i)
+      EXPECT_EQ(aCalls[static_cast<size_t>(i)].load(), 1) << i;
+  }
+}
+
+// Reads and writes come in band order on the calling thread; every block
+// starts at a multiple of the block size, lies inside its band and runs
+// between the band's read and its write.
+TEST(Threads, BandsReadComputeAndWriteInOrder) {
+  struct SCase {
+    const char *mThreads;
+    int32_t mLines, mBlock, mBand;
+  };
+  for (const SCase &aCase : {SCase{"3", 37, 4, 24}, SCase{"1", 37, 4, 8}, SCase{"3", 5, 4, 8}, SCase{"2", 0, 4, 4},
+                             SCase{"2", 9, 1, 4}}) {
+    CThreadsSetting aSetting(aCase.mThreads);
+    const SLineBands aBands = fdfLineBands(aCase.mLines, aCase.mBlock);
+    EXPECT_EQ(aBands.mBand, aCase.mBand) << aCase.mThreads << " " << aCase.mLines;
+    std::vector<std::pair<int32_t, int32_t>> aReads, aWrites;
+    std::vector<int> aCovered(static_cast<size_t>(aCase.mLines), 0);
+    std::mutex aMutex;
+    bool aInsideBand = true;
+    fdfRunLineBands(
+        aBands, [&](int32_t theFirst, int32_t theCount) { aReads.emplace_back(theFirst, theCount); },
+        [&](int32_t theFirst, int32_t theCount, int) {
+          const std::lock_guard<std::mutex> aLock(aMutex);
+          aInsideBand &= theFirst % aCase.mBlock == 0 && aReads.size() == aWrites.size() + 1 &&
+                         theFirst >= aReads.back().first &&
+                         theFirst + theCount <= aReads.back().first + aReads.back().second &&
+                         theCount == std::min(aCase.mBlock, aCase.mLines - theFirst);
+          for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+            ++aCovered[static_cast<size_t>(l)];
+        },
+        [&](int32_t theFirst, int32_t theCount) { aWrites.emplace_back(theFirst, theCount); });
+    EXPECT_TRUE(aInsideBand);
+    EXPECT_EQ(aReads, aWrites);
+    for (size_t i = 0; i < aReads.size(); ++i)
+      EXPECT_EQ(aReads[i], std::make_pair(static_cast<int32_t>(i) * aCase.mBand,
+                                          std::min(aCase.mBand, aCase.mLines - static_cast<int32_t>(i) * aCase.mBand)));
+    EXPECT_EQ(std::set<int>(aCovered.begin(), aCovered.end()), aCase.mLines ? std::set<int>{1} : std::set<int>{});
+  }
+}
