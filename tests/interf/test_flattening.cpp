@@ -80,6 +80,55 @@ TEST_F(Flattening, RemovesThePhaseAndKeepsTheMagnitude) {
   }
 }
 
+// Any thread count gives the bytes and count of one: 101 lines are several
+// bands with a last block cut short. A file cut short mid-image fails with
+// the same code and leaves no result.
+TEST_F(Flattening, ThreadCountDoesNotChangeTheResult) {
+  const int aLines = 101, aPixels = 53;
+  const std::string aRoot = tlrxSimulateSlc(mDir, "pair", {"--lines", "101", "--pixels", "53"});
+  STLRXTestRaster aPhase;
+  aPhase.mLines = aLines;
+  aPhase.mPixels = aPixels;
+  aPhase.mHasNull = true;
+  aPhase.mNull = -9999;
+  int aFlattened = 0;
+  for (int i = 0; i < aLines * aPixels; ++i) {
+    aPhase.mValues.push_back(i % 11 == 4 ? -9999.0 : 0.01 * i);
+    aFlattened += i % 11 == 4 ? 0 : 1;
+  }
+  tlrxWriteTestRaster(mDir.file("sint"), aPhase);
+  std::string aFirst;
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    SCOPED_TRACE(aThreads);
+    const CTestThreads aSetting(aThreads);
+    const std::string aOut = mDir.file("t" + std::to_string(aThreads));
+    ASSERT_EQ(run({aRoot + "_1", mDir.file("sint"), aOut}), 0);
+    const std::string aBytes = tlrxReadFile(aOut + "_dint");
+    ASSERT_EQ(aBytes.size(), size_t(aLines) * aPixels * 8);
+    if (aThreads == 1)
+      aFirst = aBytes;
+    EXPECT_TRUE(aBytes == aFirst);
+  }
+  const std::string aLog = tlrxReadFile(mDir.file("Process.log")), aCount = "flattened pixels: " +
+                           std::to_string(aFlattened) + " of " + std::to_string(aLines * aPixels) + "\n";
+  size_t aSeen = 0;
+  for (size_t i = aLog.find(aCount); i != std::string::npos; i = aLog.find(aCount, i + 1))
+    ++aSeen;
+  EXPECT_EQ(aSeen, 3u);
+  // Lines 70 on are missing from the interferogram's file.
+  tlrxWriteFile(aRoot + "_1", tlrxReadFile(aRoot + "_1").substr(0, size_t(70) * aPixels * 8));
+  std::vector<std::pair<int32_t, std::string>> aFailures;
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    const CTestThreads aSetting(aThreads);
+    std::string aMessage;
+    const int32_t aCode = tlrxCodeOf([&] { run({aRoot + "_1", mDir.file("sint"), mDir.file("cut")}); }, &aMessage);
+    aFailures.emplace_back(aCode, aMessage);
+    EXPECT_FALSE(tlrxFileExists(mDir.file("cut_dint"))) << aThreads;
+  }
+  EXPECT_NE(aFailures[0].first, 0);
+  EXPECT_EQ(aFailures, decltype(aFailures)(aFailures.size(), aFailures[0]));
+}
+
 TEST_F(Flattening, FailuresRaiseTheirCodes) {
   const std::string aRoot = tlrxSimulateSlc(mDir, "pair", {"--lines", "12", "--pixels", "16"});
   const std::string z = aRoot + "_1", aPhase = phase("sint", true), aShort = phase("short", true, 10),

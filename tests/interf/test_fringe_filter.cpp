@@ -17,6 +17,7 @@
 #include <algorithm>
 #include <cmath>
 #include <complex>
+#include <cstring>
 #include <random>
 #include <stdexcept>
 
@@ -26,11 +27,11 @@ using TCell = std::complex<float>;
 using TImage = std::vector<TCell>;
 constexpr double sPi = 3.14159265358979323846;
 
-// theImage (theLines x thePixels) through the kernel, lines taken as soon as
-// they are ready.
+// theImage (theLines x thePixels) through the kernel, theRows rows of patches
+// at a time, lines taken as soon as they are ready.
 TImage filtered(const TImage &theImage, int theLines, int thePixels, double theLowSnr, double theWidth,
-                SFringeFilterStats *theStats = nullptr) {
-  CFringeFilter aFilter(thePixels, theLowSnr, theWidth);
+                SFringeFilterStats *theStats = nullptr, int theRows = 1) {
+  CFringeFilter aFilter(thePixels, theLowSnr, theWidth, theRows);
   TImage aOut(theImage.size() + size_t(thePixels)); // a spare line takes any extra one
   size_t aTaken = 0;
   const auto aTake = [&](int32_t theReady) {
@@ -184,6 +185,40 @@ TEST(FringeFilter, OverlapWeightsSumToOneAndZerosStayZero) {
   }
 }
 
+// Any thread count and any number of patch rows filtered together give the
+// bytes and patch statistics of one: sizes whose last patch row and column
+// are cut short, several bands, no-data cells.
+TEST(FringeFilter, ThreadCountDoesNotChangeTheResult) {
+  const struct {
+    int mLines, mPixels;
+    double mWidth;
+  } aCases[] = {{37, 53, 2.0}, {141, 333, 3.0}, {1, 40, 2.0}, {50, 5, 0.0}};
+  for (const auto &aCase : aCases) {
+    SCOPED_TRACE(std::to_string(aCase.mLines) + " x " + std::to_string(aCase.mPixels));
+    const size_t aCount = size_t(aCase.mLines) * size_t(aCase.mPixels);
+    TImage aIn = fringe(aCase.mLines, aCase.mPixels, 0.07, -0.15);
+    const TImage aNoise = noise(aCount, 11);
+    for (size_t i = 0; i < aCount; ++i)
+      aIn[i] = (i % 7 == 3 ? TCell() : aIn[i] + 0.8F * aNoise[i]);
+    std::vector<TImage> aOuts;
+    std::vector<SFringeFilterStats> aStats;
+    for (const int aThreads : CTLRX_TEST_THREADS)
+      for (const int aRows : {1, 3, 8}) {
+        const CTestThreads aSetting(aThreads);
+        aStats.emplace_back();
+        aOuts.push_back(filtered(aIn, aCase.mLines, aCase.mPixels, 0.25, aCase.mWidth, &aStats.back(), aRows));
+      }
+    for (size_t t = 1; t < aOuts.size(); ++t) {
+      EXPECT_EQ(0, std::memcmp(aOuts[t].data(), aOuts[0].data(), aCount * sizeof(TCell))) << "run " << t;
+      EXPECT_EQ(aStats[t].mPatches, aStats[0].mPatches);
+      EXPECT_EQ(aStats[t].mAboveThreshold, aStats[0].mAboveThreshold);
+      EXPECT_EQ(aStats[t].mSnrSum, aStats[0].mSnrSum);
+    }
+    // Patches start every 16 lines and columns from -16.
+    EXPECT_EQ(aStats[0].mPatches, int64_t((aCase.mLines + 31) / 16) * ((aCase.mPixels + 31) / 16));
+  }
+}
+
 // Lines come out band by band, and must be taken before more go in.
 TEST(FringeFilter, ReadyLinesMustBeTakenFirst) {
   CFringeFilter aFilter(8, 0.25, 2.0);
@@ -198,6 +233,19 @@ TEST(FringeFilter, ReadyLinesMustBeTakenFirst) {
   EXPECT_THROW(aFilter.popLine(aLine.data()), std::logic_error);
   EXPECT_EQ(aFilter.finish(), 16);
   EXPECT_THROW(CFringeFilter(0, 0.25, 2.0), std::invalid_argument);
+  EXPECT_THROW(CFringeFilter(8, 0.25, 2.0, 0), std::invalid_argument);
+  EXPECT_THROW(CFringeFilter(8, 0.25, 2.0, 65), std::invalid_argument);
+  // Three rows at a time: lines 0..31 wait for the rows from -16, 0 and 16,
+  // the next 48 for the three rows after.
+  CFringeFilter aRows(8, 0.25, 2.0, 3);
+  for (int l = 0; l < 47; ++l)
+    ASSERT_EQ(aRows.pushLine(aLine.data()), 0) << l;
+  EXPECT_EQ(aRows.pushLine(aLine.data()), 32);
+  for (int l = 0; l < 32; ++l)
+    aRows.popLine(aLine.data());
+  for (int l = 0; l < 47; ++l)
+    ASSERT_EQ(aRows.pushLine(aLine.data()), 0) << l;
+  EXPECT_EQ(aRows.pushLine(aLine.data()), 48);
 }
 
 // ------------------------------------------------------------ step program

@@ -323,6 +323,81 @@ TEST_F(Interferogram, BlockSizeDoesNotChangeTheResult) {
   EXPECT_EQ(tlrxReadSlc(mDir.file("msbf_int")).mCells, tlrxReadSlc(mDir.file("small_int")).mCells);
 }
 
+// Any thread count gives the bytes of one: 203 lines are several bands with a
+// last block cut short, for azimuth looks 1 and 3, filters off and on, a
+// synthetic phase, the co-registered pair, and the parameters written back.
+// A field whose shifts reach too far mid-image fails as with one thread.
+TEST_F(Interferogram, ThreadCountDoesNotChangeTheResult) {
+  const int aLines = 203, aPixels = 53;
+  const std::string aRoot = simulate("thr", {"--lines", "203", "--pixels", "53", "--coherence", "0.8", "--shift",
+                                             "0.3,-0.45", "--doppler", "0.05,-0.05", "--range-band-shift", "0.1"});
+  STLRXTestRaster aPhase;
+  aPhase.mLines = aLines;
+  aPhase.mPixels = aPixels;
+  aPhase.mDataUnits = "NUMBER";
+  for (int l = 0; l < aLines; ++l)
+    for (int p = 0; p < aPixels; ++p)
+      aPhase.mValues.push_back(0.3 * p - 0.02 * l);
+  tlrxWriteTestRaster(mDir.file("sint"), aPhase);
+  const std::string aSint = mDir.file("sint");
+  // Arguments 7 on, and the result's pixels: 53 x 2 oversampled, in groups
+  // of 2 x range looks (1 for -2).
+  const struct {
+    std::vector<std::string> mArgs;
+    int mOutPixels;
+  } aCases[] = {
+      {{"1", "1", "NotOK", "-", "NotOK", "NotOK"}, 53},
+      {{"1", "3", "NotOK", "-", "OK", "OK"}, 53},
+      {{"2", "1", aSint, "-", "OK", "NotOK"}, 26},
+      {{"-2", "3", "NotOK", "-", "OK", "OK", "100", "10", "NotOK", "NotOK", "NotOK", "NotOK", "-", "NotOK", "OK"}, 106},
+  };
+  for (const auto &aTable : aCases) {
+    const std::vector<std::string> &aCase = aTable.mArgs;
+    SCOPED_TRACE(aCase[0] + " " + aCase[1] + " " + aCase[2] + " " + aCase[4]);
+    std::vector<std::string> aFirst;
+    for (const int aThreads : CTLRX_TEST_THREADS) {
+      const CTestThreads aSetting(aThreads);
+      parameters(aRoot + "_1", 0.3, -0.45);
+      run(aRoot, "t", aCase);
+      std::vector<std::string> aBytes;
+      for (const char *aFile : {"t_int", "t_mpwr", "t_spwr", "pair_par.sml", "thr_1_rsp", "thr_2_rsp"})
+        aBytes.push_back(tlrxFileExists(mDir.file(aFile)) ? tlrxReadFile(mDir.file(aFile)) : "");
+      if (aThreads == 1)
+        aFirst = aBytes;
+      for (size_t i = 0; i < aBytes.size(); ++i)
+        EXPECT_TRUE(aBytes[i] == aFirst[i]) << aThreads << " threads, file " << i;
+    }
+    EXPECT_EQ(aFirst[0].size(), size_t(aLines / std::stoi(aCase[1])) * aTable.mOutPixels * 8);
+    EXPECT_EQ(aFirst[4].empty(), aCase.size() < 15);
+  }
+  // Azimuth shifts 0.0017 x y lines at pixel x: master line y reaches over
+  // floor(0.0017 x 52 y) + 8 slave lines, more than 20 from the line below.
+  const std::string aPar = parameters(aRoot + "_1", 0, 0, 6);
+  editHeader(aPar, [](CDescription &theHeader) {
+    theHeader.getField("interferometric_processing.DAzimuthPoly").setDouble(4, 0.0017);
+  });
+  int aLine = 0;
+  while (std::floor(0.0017 * 52 * aLine) + 8 <= 20)
+    ++aLine;
+  const std::string aWant = "the azimuth shifts of master line " + std::to_string(aLine) +
+                            " reach over 21 slave lines, more than the 20 lines a block holds";
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    SCOPED_TRACE(aThreads);
+    const CTestThreads aSetting(aThreads);
+    std::string aMessage;
+    EXPECT_EQ(tlrxCodeOf(
+                  [&] {
+                    tlrxCallStep(tlrx_hires_interf_SLC_with_sint,
+                                 {"step", aRoot + "_1", aRoot + "_2", aPar, mDir.file("w_mpwr"), mDir.file("w_spwr"),
+                                  mDir.file("w_int"), "1", "1", "NotOK", "-", "OK", "OK", "20"});
+                  },
+                  &aMessage),
+              CTLRX_ERR_ARGUMENTS);
+    EXPECT_EQ(aMessage, aWant);
+    EXPECT_FALSE(tlrxFileExists(mDir.file("w_int")));
+  }
+}
+
 // Positions 20 and 21: the kernel table beside the interferogram, and the
 // co-registered pair named folder + input name + "_rsp" (the master as read,
 // the slave on the master grid).

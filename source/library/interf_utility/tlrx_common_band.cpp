@@ -104,7 +104,8 @@ CFringeEstimator::CFringeEstimator(int32_t thePixels) : mPixels(thePixels) {
     TLRX_RAISE_F(CTLRX_ERR_IMAGE_SIZES, "fringe estimation over %d pixels (4 or more)", thePixels);
   mLine.resize(static_cast<size_t>(thePixels));
   mPower.assign(static_cast<size_t>(thePixels), 0.0);
-  if (!fdfFftPlan(1, thePixels, ETLRXFftDirection::FORWARD).isValid())
+  mPlan = &fdfFftPlan(1, thePixels, ETLRXFftDirection::FORWARD);
+  if (!mPlan->isValid())
     TLRX_RAISE_F(CTLRX_ERR_ALLOCATION, "FFT plan of %d points", thePixels);
 }
 
@@ -121,7 +122,7 @@ void CFringeEstimator::add(const TLRXComplex *theMaster, const TLRXComplex *theS
     const bool aNull = (mr == 0.0f && mi == 0.0f) || (sr == 0.0f && si == 0.0f);
     aLine[i] = aNull ? TLRXComplex(0.0f, 0.0f) : TLRXComplex(mr * sr + mi * si, mi * sr - mr * si);
   }
-  fdfFftPlan(1, mPixels, ETLRXFftDirection::FORWARD).execute(aLine);
+  mPlan->execute(aLine);
   for (int32_t i = 0; i < mPixels; ++i)
     mPower[static_cast<size_t>(i)] += std::norm(std::complex<double>(aLine[i]));
   ++mLinesAdded;

@@ -77,6 +77,7 @@ public:
 private:
   int32_t mPixels;
   int32_t mLinesAdded = 0;
+  const CFftPlan2D *mPlan = nullptr;
   CFftBuffer mLine;
   std::vector<double> mPower;
 };

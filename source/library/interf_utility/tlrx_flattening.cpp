@@ -1,4 +1,4 @@
-// Flattening (see tlrx_flattening.h): one line of each input at a time.
+// Flattening (see tlrx_flattening.h): bands of lines of both inputs.
 #include "tlrx_flattening.h"
 
 #include <cmath>
@@ -15,10 +15,13 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_step_common.h"
+#include "tlrx_threads.h"
 
 namespace {
 
 constexpr int CTLRX_FLATTENING_CLOSE_ARGUMENTS = 7;
+// Lines per block of the parallel turn (each line stands alone).
+constexpr int32_t CTLRX_FLATTENING_BLOCK = 16;
 
 // The phase's no-data rule: its declared null value, and NaN. A header
 // without one declares none (a phase of exactly 0 is a phase).
@@ -77,31 +80,55 @@ int tlrx_flattening(int argc, char **argv) {
   fdfMakeResultHeader(aHeader, aZHeader, "FLOAT_COMPLEX", "FLATTENED INTERFEROGRAMME", 0.0);
   CResultRaster aOut(aOutput, aHeader);
   const SNoData aPhaseNull = phaseNoData(aPhaseHeader);
-  std::vector<std::complex<float>> aCells(static_cast<size_t>(aPixels));
-  std::vector<uint8_t> aValid(static_cast<size_t>(aPixels));
-  std::vector<double> aPhases(static_cast<size_t>(aPixels));
+  // Bands of lines read and written in order; the cells are turned on
+  // blocks of lines in parallel, each line on its own.
+  const SLineBands aBands = fdfLineBands(aLines, CTLRX_FLATTENING_BLOCK);
+  const size_t aPixelCount = static_cast<size_t>(aPixels), aBand = static_cast<size_t>(aBands.mBand);
+  std::vector<std::complex<float>> aCells(aBand * aPixelCount);
+  std::vector<uint8_t> aValid(aBand * aPixelCount);
+  std::vector<double> aPhases(aBand * aPixelCount);
+  std::vector<int64_t> aBlockCounts(aBand / static_cast<size_t>(aBands.mBlock) + 1, 0);
   CLineProgress aProgress(99.0);
   int64_t aFlattened = 0;
-  for (int32_t l = 0; l < aLines; ++l) {
-    aProgress.update(l, aLines);
-    aZ.getComplexLine(aCells.data(), l, 0, -1, aValid.data());
-    aPhi.getLine(aPhases.data(), l);
-    for (int32_t j = 0; j < aPixels; ++j) {
-      std::complex<float> &z = aCells[static_cast<size_t>(j)];
-      const double aAngle = aPhases[static_cast<size_t>(j)];
-      if (aValid[static_cast<size_t>(j)] == 0 || z == std::complex<float>() || aPhaseNull.isNullOrNaN(aAngle)) {
-        z = std::complex<float>();
-        continue;
-      }
-      // Turned in double: the magnitude is kept to float rounding.
-      double aSin = 0.0, aCos = 1.0;
-      ::sincos(-aAngle, &aSin, &aCos);
-      const double a = z.real(), b = z.imag();
-      z = std::complex<float>(static_cast<float>(a * aCos - b * aSin), static_cast<float>(a * aSin + b * aCos));
-      ++aFlattened;
-    }
-    aOut.file().putComplexLine(l, aCells.data());
-  }
+  int32_t aBandFirst = 0;
+  fdfRunLineBands(
+      aBands,
+      [&](int32_t theFirst, int32_t theCount) {
+        aBandFirst = theFirst;
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          aProgress.update(l, aLines);
+          const size_t aAt = static_cast<size_t>(l - theFirst) * aPixelCount;
+          aZ.getComplexLine(aCells.data() + aAt, l, 0, -1, aValid.data() + aAt);
+          aPhi.getLine(aPhases.data() + aAt, l);
+        }
+      },
+      [&](int32_t theFirst, int32_t theCount, int) {
+        int64_t aCount = 0;
+        for (size_t i = static_cast<size_t>(theFirst - aBandFirst) * aPixelCount,
+                    aEnd = i + static_cast<size_t>(theCount) * aPixelCount;
+             i < aEnd; ++i) {
+          std::complex<float> &z = aCells[i];
+          const double aAngle = aPhases[i];
+          if (aValid[i] == 0 || z == std::complex<float>() || aPhaseNull.isNullOrNaN(aAngle)) {
+            z = std::complex<float>();
+            continue;
+          }
+          // Turned in double: the magnitude is kept to float rounding.
+          double aSin = 0.0, aCos = 1.0;
+          ::sincos(-aAngle, &aSin, &aCos);
+          const double a = z.real(), b = z.imag();
+          z = std::complex<float>(static_cast<float>(a * aCos - b * aSin), static_cast<float>(a * aSin + b * aCos));
+          ++aCount;
+        }
+        aBlockCounts[static_cast<size_t>((theFirst - aBandFirst) / aBands.mBlock)] = aCount;
+      },
+      [&](int32_t theFirst, int32_t theCount) {
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+          aOut.file().putComplexLine(l, aCells.data() + static_cast<size_t>(l - theFirst) * aPixelCount);
+        const int32_t aBlocks = (theCount + aBands.mBlock - 1) / aBands.mBlock;
+        for (int32_t k = 0; k < aBlocks; ++k)
+          aFlattened += aBlockCounts[static_cast<size_t>(k)];
+      });
   aZ.close();
   aPhi.close();
   aOut.commit(aHeader, CTLRX_ERR_FILE_COPY);

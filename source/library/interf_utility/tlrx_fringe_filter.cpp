@@ -13,6 +13,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_step_common.h"
+#include "tlrx_threads.h"
 
 namespace {
 
@@ -20,7 +21,6 @@ using TCell = std::complex<float>;
 
 constexpr int32_t CTLRX_FRINGE_MASK = CTLRX_FRINGE_PATCH - 1;
 constexpr int32_t CTLRX_FRINGE_CELLS = CTLRX_FRINGE_PATCH * CTLRX_FRINGE_PATCH;
-constexpr int32_t CTLRX_FRINGE_SUM_LINES = 3 * CTLRX_FRINGE_STEP;
 constexpr int32_t CTLRX_FRINGE_PEAK = 4;
 constexpr double CTLRX_FRINGE_KAISER_BETA = 2.1;
 constexpr double CTLRX_FRINGE_MAX_SNR = 1e30;
@@ -45,12 +45,14 @@ bool isNoData(const TCell &theCell) {
 
 // ------------------------------------------------------------ kernel
 
-CFringeFilter::CFringeFilter(int32_t thePixels, double theLowSnr, double theWidth)
-    : mPixels(thePixels), mLowSnr(theLowSnr),
+CFringeFilter::CFringeFilter(int32_t thePixels, double theLowSnr, double theWidth, int32_t theRows)
+    : mPixels(thePixels), mLowSnr(theLowSnr), mRows(theRows),
+      mInputLines(CTLRX_FRINGE_STEP * (theRows + 1)), mSumLines(CTLRX_FRINGE_STEP * (theRows + 2)),
       mForward(fdfFftPlan(CTLRX_FRINGE_PATCH, CTLRX_FRINGE_PATCH, ETLRXFftDirection::FORWARD)),
       mInverse(fdfFftPlan(CTLRX_FRINGE_PATCH, CTLRX_FRINGE_PATCH, ETLRXFftDirection::INVERSE)) {
-  if (thePixels < 1 || !(theWidth >= 0.0) || !std::isfinite(theWidth))
-    throw std::invalid_argument("CFringeFilter: pixels must be at least 1 and the width finite and not negative");
+  if (thePixels < 1 || !(theWidth >= 0.0) || !std::isfinite(theWidth) || theRows < 1 || theRows > 64)
+    throw std::invalid_argument("CFringeFilter: pixels must be at least 1, the width finite and not negative and "
+                                "the patch rows from 1 to 64");
   if (!mForward.isValid() || !mInverse.isValid())
     throw std::runtime_error("CFringeFilter: no FFT plan for 32 x 32 patches");
   const double aTaperNorm = besselI0(CTLRX_FRINGE_KAISER_BETA);
@@ -67,10 +69,13 @@ CFringeFilter::CFringeFilter(int32_t thePixels, double theLowSnr, double theWidt
     const double aS = std::sin(CTLRX_FRINGE_PI * (n + 0.5) / CTLRX_FRINGE_PATCH);
     mWeight[static_cast<size_t>(n)] = static_cast<float>(aS * aS);
   }
-  mInput.assign(static_cast<size_t>(CTLRX_FRINGE_PATCH) * static_cast<size_t>(thePixels), TCell());
-  mSum.assign(static_cast<size_t>(CTLRX_FRINGE_SUM_LINES) * static_cast<size_t>(thePixels), TCell());
-  mPower.resize(CTLRX_FRINGE_CELLS);
-  mPatch.resize(CTLRX_FRINGE_CELLS);
+  mInput.assign(static_cast<size_t>(mInputLines) * static_cast<size_t>(thePixels), TCell());
+  mSum.assign(static_cast<size_t>(mSumLines) * static_cast<size_t>(thePixels), TCell());
+  // Patches start every 16 columns from -16.
+  const size_t aPatches = static_cast<size_t>(thePixels + CTLRX_FRINGE_STEP - 1) / CTLRX_FRINGE_STEP + 1;
+  mColumns = static_cast<int32_t>(aPatches);
+  mPatches.resize(static_cast<size_t>(theRows) * aPatches * CTLRX_FRINGE_CELLS);
+  mPatchResults.resize(static_cast<size_t>(theRows) * aPatches);
 }
 
 double CFringeFilter::passBand(int32_t theOffset) const {
@@ -78,11 +83,15 @@ double CFringeFilter::passBand(int32_t theOffset) const {
 }
 
 TCell *CFringeFilter::inputLine(int32_t theLine) {
-  return &mInput[static_cast<size_t>(theLine % CTLRX_FRINGE_PATCH) * static_cast<size_t>(mPixels)];
+  return &mInput[static_cast<size_t>(theLine % mInputLines) * static_cast<size_t>(mPixels)];
+}
+
+const TCell *CFringeFilter::inputLine(int32_t theLine) const {
+  return &mInput[static_cast<size_t>(theLine % mInputLines) * static_cast<size_t>(mPixels)];
 }
 
 TCell *CFringeFilter::sumLine(int32_t theLine) {
-  const int32_t aSlot = ((theLine % CTLRX_FRINGE_SUM_LINES) + CTLRX_FRINGE_SUM_LINES) % CTLRX_FRINGE_SUM_LINES;
+  const int32_t aSlot = ((theLine % mSumLines) + mSumLines) % mSumLines;
   return &mSum[static_cast<size_t>(aSlot) * static_cast<size_t>(mPixels)];
 }
 
@@ -101,8 +110,8 @@ int32_t CFringeFilter::pushLine(const TCell *theLine) {
   for (int32_t j = 0; j < mPixels; ++j)
     aDest[j] = isNoData(theLine[j]) ? TCell() : theLine[j];
   ++mPushed;
-  if (mNextBand + CTLRX_FRINGE_PATCH == mPushed)
-    processBand(mNextBand);
+  if (mNextBand + CTLRX_FRINGE_STEP * (mRows + 1) == mPushed)
+    processBands(mNextBand, mRows);
   return mFinal - mNextOut;
 }
 
@@ -111,7 +120,7 @@ int32_t CFringeFilter::finish() {
   if (!mFinished) {
     mFinished = true;
     while (mNextBand < mPushed)
-      processBand(mNextBand);
+      processBands(mNextBand, std::min(mRows, (mPushed - mNextBand + CTLRX_FRINGE_STEP - 1) / CTLRX_FRINGE_STEP));
   }
   return mFinal - mNextOut;
 }
@@ -123,14 +132,54 @@ void CFringeFilter::popLine(TCell *theLine) {
   std::copy(aSum, aSum + mPixels, theLine);
 }
 
-// The patches of lines theStart..theStart + 31: lines theStart + 16 on get
-// their first contribution, lines theStart..theStart + 15 their last.
-void CFringeFilter::processBand(int32_t theStart) {
-  for (int32_t y = theStart + CTLRX_FRINGE_STEP; y < theStart + CTLRX_FRINGE_PATCH; ++y)
+// The patch rows starting at theStart + 16 k, k < theRows: lines from
+// theStart + 16 on get their first contribution, lines theStart..theStart +
+// 16 theRows - 1 their last. Patches are filtered in parallel; each line then
+// adds them row after row, each row in column order, as one patch after the
+// other would.
+void CFringeFilter::processBands(int32_t theStart, int32_t theRows) {
+  const int32_t aReach = theStart + CTLRX_FRINGE_STEP * (theRows - 1) + CTLRX_FRINGE_PATCH;
+  for (int32_t y = theStart + CTLRX_FRINGE_STEP; y < aReach; ++y)
     std::fill(sumLine(y), sumLine(y) + mPixels, TCell());
-  for (int32_t aCol = -CTLRX_FRINGE_STEP; aCol < mPixels; aCol += CTLRX_FRINGE_STEP)
-    filterPatch(theStart, aCol);
-  const int32_t aEnd = std::min(theStart + CTLRX_FRINGE_STEP, mPushed);
+  const int64_t aColumns = mColumns, aPatches = aColumns * theRows;
+  for (size_t t = mPower.size(); t < static_cast<size_t>(fdfThreadCount()); ++t)
+    mPower.emplace_back(static_cast<size_t>(CTLRX_FRINGE_CELLS));
+  fdfParallelFor(aPatches, [&](int64_t theIndex, int theThread) {
+    const size_t i = static_cast<size_t>(theIndex);
+    const int32_t aRow = static_cast<int32_t>(theIndex / aColumns), aColumn = static_cast<int32_t>(theIndex % aColumns);
+    filterPatch(theStart + aRow * CTLRX_FRINGE_STEP, aColumn * CTLRX_FRINGE_STEP - CTLRX_FRINGE_STEP,
+                mPatches.data() + i * CTLRX_FRINGE_CELLS, mPower[static_cast<size_t>(theThread)].data(),
+                mPatchResults[i]);
+  });
+  for (int64_t i = 0; i < aPatches; ++i) {
+    const SPatchResult &aResult = mPatchResults[static_cast<size_t>(i)];
+    if (aResult.mAny) {
+      ++mStats.mPatches;
+      mStats.mAboveThreshold += aResult.mAtPeak ? 1 : 0;
+      mStats.mSnrSum += aResult.mSnr;
+    }
+  }
+  const int32_t aFirst = std::max(theStart, 0), aLast = std::min(aReach, mPushed);
+  fdfParallelFor(std::max(0, aLast - aFirst), [&](int64_t theLine, int) {
+    const int32_t r = aFirst + static_cast<int32_t>(theLine);
+    TCell *aSum = sumLine(r);
+    for (int32_t aRow = 0; aRow < theRows; ++aRow) {
+      const int32_t i = r - theStart - aRow * CTLRX_FRINGE_STEP;
+      if (i < 0 || i >= CTLRX_FRINGE_PATCH)
+        continue;
+      for (int64_t c = 0; c < aColumns; ++c) {
+        const size_t p = static_cast<size_t>(aRow * aColumns + c);
+        if (!mPatchResults[p].mAny)
+          continue;
+        const int32_t aCol = static_cast<int32_t>(c) * CTLRX_FRINGE_STEP - CTLRX_FRINGE_STEP;
+        const int32_t aColFrom = std::max(0, -aCol), aColTo = std::min(CTLRX_FRINGE_PATCH, mPixels - aCol);
+        const TCell *aOut = mPatches.data() + p * CTLRX_FRINGE_CELLS + i * CTLRX_FRINGE_PATCH;
+        for (int32_t j = aColFrom; j < aColTo; ++j)
+          aSum[aCol + j] += aOut[j];
+      }
+    }
+  });
+  const int32_t aEnd = std::min(theStart + CTLRX_FRINGE_STEP * theRows, mPushed);
   for (int32_t y = std::max(theStart, 0); y < aEnd; ++y) {
     const TCell *aIn = inputLine(y);
     TCell *aSum = sumLine(y);
@@ -139,12 +188,13 @@ void CFringeFilter::processBand(int32_t theStart) {
         aSum[j] = TCell();
   }
   mFinal = std::max(mFinal, aEnd);
-  mNextBand = theStart + CTLRX_FRINGE_STEP;
+  mNextBand = theStart + CTLRX_FRINGE_STEP * theRows;
 }
 
-void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol) {
+void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol, TCell *thePatch, float *thePower,
+                                SPatchResult &theResult) const {
   const int32_t aColFrom = std::max(0, -theCol), aColTo = std::min(CTLRX_FRINGE_PATCH, mPixels - theCol);
-  TCell *aPatch = mPatch.data();
+  TCell *aPatch = thePatch;
   std::fill(aPatch, aPatch + CTLRX_FRINGE_CELLS, TCell());
   bool aAny = false;
   for (int32_t i = 0; i < CTLRX_FRINGE_PATCH; ++i) {
@@ -157,6 +207,7 @@ void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol) {
       aAny = aAny || aIn[j] != TCell();
     }
   }
+  theResult = SPatchResult();
   if (!aAny)
     return; // nothing to add, and not counted as a patch
   mForward.execute(aPatch);
@@ -164,14 +215,14 @@ void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol) {
   double aTotal = 0.0;
   int32_t aPeak = 0;
   for (int32_t k = 0; k < CTLRX_FRINGE_CELLS; ++k) {
-    mPower[static_cast<size_t>(k)] = std::norm(aPatch[k]);
-    aTotal += mPower[static_cast<size_t>(k)];
-    if (mPower[static_cast<size_t>(k)] > mPower[static_cast<size_t>(aPeak)])
+    thePower[k] = std::norm(aPatch[k]);
+    aTotal += thePower[k];
+    if (thePower[k] > thePower[aPeak])
       aPeak = k;
   }
   const int32_t aPr = aPeak / CTLRX_FRINGE_PATCH, aPc = aPeak % CTLRX_FRINGE_PATCH;
   const auto aPower = [&](int32_t theR, int32_t theC) {
-    return mPower[static_cast<size_t>((theR & CTLRX_FRINGE_MASK) * CTLRX_FRINGE_PATCH + (theC & CTLRX_FRINGE_MASK))];
+    return thePower[(theR & CTLRX_FRINGE_MASK) * CTLRX_FRINGE_PATCH + (theC & CTLRX_FRINGE_MASK)];
   };
   // The 4 x 4 window reaches two bins towards the stronger neighbour, where
   // a fringe between two bins leaks most.
@@ -188,9 +239,7 @@ void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol) {
   double aSnr = aNoise > 0.0 ? (aPeakPower - aNoise * aShare) / aNoise : CTLRX_FRINGE_MAX_SNR;
   aSnr = std::min(aSnr, CTLRX_FRINGE_MAX_SNR);
   const bool aAtPeak = aSnr >= mLowSnr;
-  ++mStats.mPatches;
-  mStats.mAboveThreshold += aAtPeak ? 1 : 0;
-  mStats.mSnrSum += aSnr;
+  theResult = SPatchResult{true, aAtPeak, aSnr};
 
   const int32_t aCr = aAtPeak ? aPr : 0, aCc = aAtPeak ? aPc : 0;
   for (int32_t kr = 0; kr < CTLRX_FRINGE_PATCH; ++kr) {
@@ -201,15 +250,13 @@ void CFringeFilter::filterPatch(int32_t theRow, int32_t theCol) {
   }
   mInverse.execute(aPatch);
 
+  // Weighted for the overlap-add; the rows and columns outside the image
+  // are never added.
   for (int32_t i = 0; i < CTLRX_FRINGE_PATCH; ++i) {
-    const int32_t r = theRow + i;
-    if (r < 0 || r >= mPushed)
-      continue;
-    TCell *aSum = sumLine(r) + theCol;
     const float aRowWeight = mWeight[static_cast<size_t>(i)];
-    const TCell *aOut = aPatch + i * CTLRX_FRINGE_PATCH;
+    TCell *aOut = aPatch + i * CTLRX_FRINGE_PATCH;
     for (int32_t j = aColFrom; j < aColTo; ++j)
-      aSum[j] += aOut[j] * (aRowWeight * mWeight[static_cast<size_t>(j)]);
+      aOut[j] = aOut[j] * (aRowWeight * mWeight[static_cast<size_t>(j)]);
   }
 }
 
@@ -219,6 +266,9 @@ namespace {
 
 constexpr const char *CTLRX_FRINGE_BANNER = "*** fringe adaptive filter of the interferogram ***\n";
 constexpr const char *CTLRX_FRINGE_FLATTENED = "FLATTENED INTERFEROGRAMME";
+// Patch rows filtered together with several threads: a parallel loop of this
+// many rows of patches is long enough to be worth starting.
+constexpr int32_t CTLRX_FRINGE_STEP_ROWS = 8;
 
 struct SFringeArguments {
   const char *mInput = nullptr;
@@ -277,7 +327,9 @@ int tlrx_fringe_filter(int argc, char **argv) {
   fdfSetHeaderList(aResultHeader, "RasterInfo.FilesList", {aArgs.mInput});
   CResultRaster aResult(aArgs.mOutput, aResultHeader);
 
-  CFringeFilter aFilter(aPixels, aArgs.mLowSnr, aArgs.mWidth);
+  // One thread gains nothing from rows filtered together, and the patches
+  // of one row stay in cache; the result is the same either way.
+  CFringeFilter aFilter(aPixels, aArgs.mLowSnr, aArgs.mWidth, fdfThreadCount() > 1 ? CTLRX_FRINGE_STEP_ROWS : 1);
   std::vector<TCell> aLine(static_cast<size_t>(aPixels)), aFiltered(static_cast<size_t>(aPixels));
   std::vector<uint8_t> aValid(static_cast<size_t>(aPixels));
   int32_t aWritten = 0;

@@ -19,8 +19,11 @@
 // weights still sum to 1. No data: a cell that is 0 + 0i (or not finite) in
 // the input counts as 0 + 0i and is exactly 0 + 0i in the output.
 //
-// Memory: 32 input lines and 48 accumulator lines, whatever the height; the
-// result depends only on absolute cell positions.
+// Memory: 16 (rows + 1) input lines, 16 (rows + 2) accumulator lines and the
+// filtered patches of the rows of patches filtered together, whatever the
+// height; the result depends only on absolute cell positions. The patches of
+// those rows are filtered in parallel and added back row after row in column
+// order, so neither the thread count nor the rows change a byte.
 #pragma once
 
 #include <array>
@@ -42,9 +45,10 @@ struct SFringeFilterStats {
 
 class CFringeFilter {
 public:
-  // thePixels per line (at least 1), the low-SNR threshold and the width w
-  // in pixels (0 or more).
-  CFringeFilter(int32_t thePixels, double theLowSnr, double theWidth);
+  // thePixels per line (at least 1), the low-SNR threshold, the width w in
+  // pixels (0 or more) and the rows of patches filtered together (1 to 64):
+  // lines come out theRows x 16 at a time.
+  CFringeFilter(int32_t thePixels, double theLowSnr, double theWidth, int32_t theRows = 1);
 
   // Line y (in order from 0) of thePixels cells; returns how many filtered
   // lines are ready. Every ready line must be taken by popLine before the
@@ -61,20 +65,35 @@ public:
   double passBand(int32_t theOffset) const;
 
 private:
-  void processBand(int32_t theStart);
-  void filterPatch(int32_t theRow, int32_t theCol);
+  // What one patch found: whether it held data, its SNR and pass band.
+  struct SPatchResult {
+    bool mAny = false;
+    bool mAtPeak = false;
+    double mSnr = 0.0;
+  };
+
+  void processBands(int32_t theStart, int32_t theRows);
+  // Patch (theRow, theCol) filtered and weighted into thePatch (32 x 32).
+  void filterPatch(int32_t theRow, int32_t theCol, std::complex<float> *thePatch, float *thePower,
+                   SPatchResult &theResult) const;
+  const std::complex<float> *inputLine(int32_t theLine) const;
   std::complex<float> *inputLine(int32_t theLine);
   std::complex<float> *sumLine(int32_t theLine);
   void requireTaken() const;
 
   int32_t mPixels;
   double mLowSnr;
+  int32_t mRows;       // patch rows filtered together
+  int32_t mInputLines; // lines of the input ring
+  int32_t mSumLines;   // lines of the accumulator ring
+  int32_t mColumns = 0; // patches per row
   std::array<float, CTLRX_FRINGE_PATCH> mPassBand; // by offset mod 32, 1 / 32 folded in
   std::array<float, CTLRX_FRINGE_PATCH> mWeight;
-  std::vector<std::complex<float>> mInput; // 32 lines, ring by line
-  std::vector<std::complex<float>> mSum;   // 48 lines, ring by line
-  std::vector<float> mPower;
-  CFftBuffer mPatch;
+  std::vector<std::complex<float>> mInput; // ring by line
+  std::vector<std::complex<float>> mSum;   // ring by line
+  std::vector<std::vector<float>> mPower;     // per thread, one patch
+  CFftBuffer mPatches;                        // the patches of the rows
+  std::vector<SPatchResult> mPatchResults;
   const CFftPlan2D &mForward;
   const CFftPlan2D &mInverse;
   int32_t mPushed = 0;    // lines received

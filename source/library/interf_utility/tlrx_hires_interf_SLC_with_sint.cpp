@@ -1,9 +1,11 @@
 // Interferogram generation (see tlrx_hires_interf_SLC_with_sint.h). A master
 // line y passes three stages: the pair line (master, resampled slave), the
 // azimuth common-band filter (which needs CTLRX_AZIMUTH_FILTER_TAPS / 2 lines
-// ahead), and the group of CTLRX_FRINGE_GROUP lines whose fringe frequency
-// sets the range common band before the range oversampling, the product and
-// the multilook.
+// either side), and the group of CTLRX_FRINGE_GROUP lines whose fringe
+// frequency sets the range common band before the range oversampling, the
+// product and the multilook. Pair lines are made when a band enters (range
+// passes, then azimuth passes, in parallel); the later stages run on blocks
+// of whole groups and whole looks in parallel.
 #include "tlrx_hires_interf_SLC_with_sint.h"
 
 #include <algorithm>
@@ -13,6 +15,7 @@
 #include <cstdio>
 #include <deque>
 #include <memory>
+#include <numeric>
 #include <string>
 #include <vector>
 
@@ -27,6 +30,7 @@
 #include "tlrx_slave_resampler.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_step_common.h"
+#include "tlrx_threads.h"
 
 namespace {
 
@@ -393,23 +397,110 @@ void writeKernelFile(const SInterfArguments &theArgs, CPendingFiles &thePending)
 
 // ------------------------------------------------------------ the run
 
+// Lines of one width for a contiguous range of absolute line numbers: lines
+// that leave the range go to a spare pool, lines that enter it are handed
+// back to be filled. Each line is a function of its number alone, so a line
+// dropped and asked again gets the same values.
+class CLineStore {
+public:
+  explicit CLineStore(size_t theWidth) : mWidth(theWidth) {}
+
+  // Keeps the held lines of [theFirst, theLast] (none when theFirst >
+  // theLast), adds the others and returns their numbers in increasing order.
+  std::vector<int32_t> keep(int32_t theFirst, int32_t theLast) {
+    while (!mLines.empty() && (mFirst < theFirst || theFirst > theLast)) {
+      mSpare.push_back(std::move(mLines.front()));
+      mLines.pop_front();
+      ++mFirst;
+    }
+    while (!mLines.empty() && last() > theLast) {
+      mSpare.push_back(std::move(mLines.back()));
+      mLines.pop_back();
+    }
+    std::vector<int32_t> aAdded;
+    if (theFirst > theLast)
+      return aAdded;
+    if (mLines.empty())
+      mFirst = theFirst;
+    for (; mFirst > theFirst; --mFirst) {
+      mLines.push_front(take());
+      aAdded.push_back(mFirst - 1);
+    }
+    std::reverse(aAdded.begin(), aAdded.end());
+    while (mLines.empty() || last() < theLast) {
+      mLines.push_back(take());
+      aAdded.push_back(last());
+    }
+    return aAdded;
+  }
+
+  TCell *line(int32_t theLine) { return mLines[static_cast<size_t>(theLine - mFirst)].data(); }
+
+private:
+  int32_t last() const { return mFirst + static_cast<int32_t>(mLines.size()) - 1; }
+  TLine take() {
+    if (mSpare.empty())
+      return TLine(mWidth);
+    TLine aLine = std::move(mSpare.back());
+    mSpare.pop_back();
+    return aLine;
+  }
+
+  size_t mWidth;
+  int32_t mFirst = 0;
+  std::deque<TLine> mLines;
+  std::vector<TLine> mSpare;
+};
+
+// Lines per block of the parallel run: whole fringe groups and whole azimuth
+// looks, so that no estimate and no multilook sum straddles two blocks; at
+// least 32 lines to keep the per-block work well above its cost.
+int32_t blockLines(int32_t theAzimuthLooks) {
+  const int32_t aBase = std::lcm(CTLRX_FRINGE_GROUP, std::max(1, theAzimuthLooks));
+  return aBase * ((32 + aBase - 1) / aBase);
+}
+
+// A block of master lines after the pair lines are made: the azimuth filter,
+// the fringe groups, the range oversampling, the product and the multilook.
+// One per thread: its buffers are its own.
+struct SBlockWorker {
+  SBlockWorker(int32_t thePixels, int32_t theFactor, int32_t theOutPixels)
+      : mFringe(thePixels), mMasterOversampler(thePixels, theFactor), mSlaveOversampler(thePixels, theFactor),
+        mGroupMaster(CTLRX_FRINGE_GROUP, TLine(static_cast<size_t>(thePixels))),
+        mGroupSlave(CTLRX_FRINGE_GROUP, TLine(static_cast<size_t>(thePixels))),
+        mMasterOver(static_cast<size_t>(thePixels) * theFactor), mSlaveOver(mMasterOver.size()),
+        mProduct(mMasterOver.size()), mSumProduct(static_cast<size_t>(theOutPixels)),
+        mSumMaster(static_cast<size_t>(theOutPixels)), mSumSlave(static_cast<size_t>(theOutPixels)) {}
+
+  CFringeEstimator mFringe;
+  CRangeOversampler mMasterOversampler, mSlaveOversampler;
+  SResampleScratch mScratch;
+  std::vector<TLine> mGroupMaster, mGroupSlave;
+  TLine mMasterOver, mSlaveOver, mProduct;
+  std::vector<std::complex<double>> mSumProduct;
+  std::vector<double> mSumMaster, mSumSlave;
+  int64_t mProcessed = 0;
+};
+
+// The fringe frequency a group found, added to the mean in group order.
+struct SGroupFringe {
+  bool mFound = false;
+  double mFringe = 0.0;
+};
+
 class CInterferogramRun {
 public:
-  // theBlockSize bounds the slave lines held for the resampling.
+  // theBlockSize bounds the slave lines a master line's shifts reach over.
   CInterferogramRun(SSlcInput &theMaster, SSlcInput &theSlave, CShiftField &theField, const SLooks &theLooks,
                     int32_t theBlockSize)
-      : mMaster(theMaster), mSlave(theSlave), mLooks(theLooks),
-        mPixels(theMaster.mPixels), mLines(theMaster.mLines),
-        mOutPixels(theMaster.mPixels * theLooks.mFactor / theLooks.mGroup),
-        mOutLines(theMaster.mLines / theLooks.mAzimuth),
+      : mMaster(theMaster), mSlave(theSlave), mField(theField), mLooks(theLooks), mPixels(theMaster.mPixels),
+        mLines(theMaster.mLines), mOutPixels(theMaster.mPixels * theLooks.mFactor / theLooks.mGroup),
+        mOutLines(theMaster.mLines / theLooks.mAzimuth), mMaxHeld(theBlockSize),
         mSlaveValid(static_cast<size_t>(theSlave.mPixels)), mMasterValid(static_cast<size_t>(theMaster.mPixels)),
-        mResampler(theSlave.mLines, theSlave.mPixels, theMaster.mPixels, theField, centroidOf(theSlave, "slave", theMaster.mPixels),
-                   [this](int32_t theLine, TCell *theCells) {
-                     readSlcLine(mSlave.mRaster, theLine, theCells, mSlaveValid);
-                   }),
-        mFringe(theMaster.mPixels), mMasterOversampler(theMaster.mPixels, theLooks.mFactor),
-        mSlaveOversampler(theMaster.mPixels, theLooks.mFactor) {
-    mResampler.setMaxHeld(theBlockSize);
+        mKernel(theSlave.mLines, theSlave.mPixels, theMaster.mPixels, centroidOf(theSlave, "slave", theMaster.mPixels)),
+        mPairMaster(static_cast<size_t>(theMaster.mPixels)), mPairSlave(static_cast<size_t>(theMaster.mPixels)),
+        mSlaveLines(static_cast<size_t>(theMaster.mPixels)) {
+    mWorkers.push_back(std::make_unique<SBlockWorker>(mPixels, mLooks.mFactor, mOutPixels));
   }
 
   int32_t outLines() const { return mOutLines; }
@@ -423,178 +514,226 @@ public:
   }
   void setSyntheticPhase(CRasterFile *thePhase) { mPhase = thePhase; }
 
+  // Bands of lines: the pair lines (master, resampled slave) of a band and
+  // its filter margin are made on entry, range passes and azimuth passes in
+  // parallel; then its blocks run in parallel into the band's result lines,
+  // written in order.
   void run(SResults &theResults) {
     mResults = &theResults;
-    const int32_t aFactor = mLooks.mFactor;
-    mMasterOver.resize(static_cast<size_t>(mPixels) * aFactor);
-    mSlaveOver.resize(mMasterOver.size());
-    mSumProduct.assign(static_cast<size_t>(mOutPixels), std::complex<double>());
-    mSumMaster.assign(static_cast<size_t>(mOutPixels), 0.0);
-    mSumSlave.assign(static_cast<size_t>(mOutPixels), 0.0);
-    mOutInterferogram.resize(static_cast<size_t>(mOutPixels));
-    mOutMaster.resize(static_cast<size_t>(mOutPixels));
-    mOutSlave.resize(static_cast<size_t>(mOutPixels));
-    mPhaseLine.resize(static_cast<size_t>(mPixels));
-    CLineProgress aProgress(99.0);
-    const int32_t aHalf = CTLRX_AZIMUTH_FILTER_TAPS / 2;
-    // Pair lines enter up to aHalf lines ahead of the line they filter.
-    for (int32_t y = 0; y < mLines + (mAzimuth ? aHalf : 0); ++y) {
-      if (y < mLines) {
-        aProgress.update(y, mLines);
-        enterPairLine(y);
-      }
-      const int32_t aReady = mAzimuth ? y - aHalf : y;
-      if (aReady >= 0)
-        filteredLine(aReady);
+    const SLineBands aBands = fdfLineBands(mLines, blockLines(mLooks.mAzimuth));
+    while (mWorkers.size() < static_cast<size_t>(fdfThreadCount()))
+      mWorkers.push_back(std::make_unique<SBlockWorker>(mPixels, mLooks.mFactor, mOutPixels));
+    const size_t aBand = static_cast<size_t>(aBands.mBand), aPixels = static_cast<size_t>(mPixels);
+    const size_t aOutBand = aBand / static_cast<size_t>(mLooks.mAzimuth), aOut = static_cast<size_t>(mOutPixels);
+    mBandInterferogram.resize(aOutBand * aOut);
+    mBandMaster.resize(aOutBand * aOut);
+    mBandSlave.resize(aOutBand * aOut);
+    mBandGroups.resize(aBand / CTLRX_FRINGE_GROUP);
+    if (mPhase != nullptr)
+      mBandPhase.resize(aBand * aPixels);
+    if (mResults->mResampled[0]) {
+      mBandResampled[0].resize(aBand * aPixels);
+      mBandResampled[1].resize(aBand * aPixels);
     }
+    CLineProgress aProgress(99.0);
+    fdfRunLineBands(
+        aBands,
+        [&](int32_t theFirst, int32_t theCount) {
+          for (int32_t y = theFirst; y < theFirst + theCount; ++y)
+            aProgress.update(y, mLines);
+          enterBand(theFirst, theCount);
+        },
+        [&](int32_t theFirst, int32_t theCount, int theThread) {
+          computeBlock(theFirst, theCount, *mWorkers[static_cast<size_t>(theThread)]);
+        },
+        [&](int32_t theFirst, int32_t theCount) { writeBand(theFirst, theCount); });
+    for (const std::unique_ptr<SBlockWorker> &aWorker : mWorkers)
+      mProcessed += aWorker->mProcessed;
   }
 
 private:
-  struct SPair {
-    TLine mMaster, mSlave;
-  };
+  int32_t halfTaps() const { return mAzimuth ? CTLRX_AZIMUTH_FILTER_TAPS / 2 : 0; }
 
-  TLine takeLine() {
-    if (mSpare.empty())
-      return TLine(static_cast<size_t>(mPixels));
-    TLine aLine = std::move(mSpare.back());
-    mSpare.pop_back();
-    return aLine;
+  // On the calling thread: progress, reads and the shift field; the new
+  // slave and pair lines are then computed in parallel.
+  void enterBand(int32_t theFirst, int32_t theCount) {
+    mBandFirst = theFirst;
+    const int32_t aFrom = std::max(0, theFirst - halfTaps());
+    const int32_t aTo = std::min(mLines, theFirst + theCount + halfTaps()) - 1;
+    const std::vector<int32_t> aPairs = mPairMaster.keep(aFrom, aTo);
+    mPairSlave.keep(aFrom, aTo);
+    const size_t aPixels = static_cast<size_t>(mPixels);
+    mColumns.resize(aPairs.size() * aPixels);
+    mPositions.resize(aPairs.size() * aPixels);
+    int64_t aLow = INT64_MAX, aHigh = INT64_MIN;
+    for (size_t k = 0; k < aPairs.size(); ++k) {
+      readSlcLine(mMaster.mRaster, aPairs[k], mPairMaster.line(aPairs[k]), mMasterValid);
+      double *aColumns = mColumns.data() + k * aPixels, *aLines = mPositions.data() + k * aPixels;
+      mField.masterLine(aPairs[k], mPixels, aColumns, aLines);
+      int64_t aFirst = 0, aLast = 0;
+      if (!mKernel.window(aColumns, aLines, aFirst, aLast))
+        continue;
+      CResampleKernel::checkReach(aPairs[k], aFirst, aLast, mMaxHeld);
+      aLow = std::min(aLow, std::max<int64_t>(0, aFirst));
+      aHigh = std::max(aHigh, std::min<int64_t>(mSlave.mLines - 1, aLast));
+    }
+    if (aLow <= aHigh) {
+      const std::vector<int32_t> aSlaveLines =
+          mSlaveLines.keep(static_cast<int32_t>(aLow), static_cast<int32_t>(aHigh));
+      const size_t aSlavePixels = static_cast<size_t>(mSlave.mPixels);
+      mRaw.resize(aSlaveLines.size() * aSlavePixels);
+      mRangeColumns.resize(aSlaveLines.size() * aPixels);
+      for (size_t k = 0; k < aSlaveLines.size(); ++k) {
+        readSlcLine(mSlave.mRaster, aSlaveLines[k], mRaw.data() + k * aSlavePixels, mSlaveValid);
+        mField.slaveLineColumns(aSlaveLines[k], mPixels, mRangeColumns.data() + k * aPixels);
+      }
+      fdfParallelFor(static_cast<int64_t>(aSlaveLines.size()), [&](int64_t k, int theThread) {
+        const int32_t j = aSlaveLines[static_cast<size_t>(k)];
+        mKernel.rangePass(j, mRaw.data() + static_cast<size_t>(k) * aSlavePixels,
+                          mRangeColumns.data() + static_cast<size_t>(k) * aPixels, mSlaveLines.line(j),
+                          mWorkers[static_cast<size_t>(theThread)]->mScratch);
+      });
+    }
+    fdfParallelFor(static_cast<int64_t>(aPairs.size()), [&](int64_t k, int theThread) {
+      const size_t i = static_cast<size_t>(k);
+      mKernel.azimuthPass(
+          mColumns.data() + i * aPixels, mPositions.data() + i * aPixels,
+          [this](int32_t theSlaveLine) -> const TCell * { return mSlaveLines.line(theSlaveLine); },
+          mPairSlave.line(aPairs[i]), mWorkers[static_cast<size_t>(theThread)]->mScratch);
+    });
+    if (mPhase != nullptr)
+      for (int32_t y = theFirst; y < theFirst + theCount; ++y)
+        mPhase->getLine(phaseLine(y), y);
   }
 
-  void enterPairLine(int32_t theLine) {
-    SPair aPair{takeLine(), takeLine()};
-    readSlcLine(mMaster.mRaster, theLine, aPair.mMaster.data(), mMasterValid);
-    mResampler.resampleLine(theLine, aPair.mSlave.data());
-    mPairs.push_back(std::move(aPair));
-    if (mPairs.size() > static_cast<size_t>(CTLRX_AZIMUTH_FILTER_TAPS)) {
-      mSpare.push_back(std::move(mPairs.front().mMaster));
-      mSpare.push_back(std::move(mPairs.front().mSlave));
-      mPairs.pop_front();
+  float *phaseLine(int32_t theLine) {
+    return mBandPhase.data() + static_cast<size_t>(theLine - mBandFirst) * static_cast<size_t>(mPixels);
+  }
+
+  // Lines theFirst .. theFirst + theCount - 1 of the band, whole groups and
+  // whole looks from an absolute block start.
+  void computeBlock(int32_t theFirst, int32_t theCount, SBlockWorker &theWorker) {
+    std::fill(theWorker.mSumProduct.begin(), theWorker.mSumProduct.end(), std::complex<double>());
+    std::fill(theWorker.mSumMaster.begin(), theWorker.mSumMaster.end(), 0.0);
+    std::fill(theWorker.mSumSlave.begin(), theWorker.mSumSlave.end(), 0.0);
+    for (int32_t y = theFirst; y < theFirst + theCount; ++y) {
+      const int32_t aSlot = y % CTLRX_FRINGE_GROUP;
+      filteredLine(y, theWorker.mGroupMaster[static_cast<size_t>(aSlot)],
+                   theWorker.mGroupSlave[static_cast<size_t>(aSlot)]);
+      if ((y + 1) % CTLRX_FRINGE_GROUP == 0 || y + 1 == mLines)
+        finishGroup(y - aSlot, aSlot + 1, theWorker);
     }
-    mFirstPair = theLine + 1 - static_cast<int32_t>(mPairs.size());
   }
 
   // Line theLine after the azimuth filter (a copy of the pair line without
-  // it) joins the current fringe group.
-  void filteredLine(int32_t theLine) {
-    TLine aMaster = takeLine(), aSlave = takeLine();
+  // it).
+  void filteredLine(int32_t theLine, TLine &theMaster, TLine &theSlave) {
+    const TCell *aRawMaster = mPairMaster.line(theLine), *aRawSlave = mPairSlave.line(theLine);
     if (mAzimuth) {
       const int32_t aHalf = CTLRX_AZIMUTH_FILTER_TAPS / 2;
       std::array<const TCell *, CTLRX_AZIMUTH_FILTER_TAPS> aMasters, aSlaves;
       for (int32_t k = 0; k < CTLRX_AZIMUTH_FILTER_TAPS; ++k) {
         const int32_t aLine = theLine - aHalf + k;
         const bool aInside = aLine >= 0 && aLine < mLines;
-        aMasters[k] = aInside ? mPairs[static_cast<size_t>(aLine - mFirstPair)].mMaster.data() : nullptr;
-        aSlaves[k] = aInside ? mPairs[static_cast<size_t>(aLine - mFirstPair)].mSlave.data() : nullptr;
+        aMasters[k] = aInside ? mPairMaster.line(aLine) : nullptr;
+        aSlaves[k] = aInside ? mPairSlave.line(aLine) : nullptr;
       }
-      mAzimuth->filterLine(aMasters.data(), theLine, aMaster.data());
-      mAzimuth->filterLine(aSlaves.data(), theLine, aSlave.data());
+      mAzimuth->filterLine(aMasters.data(), theLine, theMaster.data());
+      mAzimuth->filterLine(aSlaves.data(), theLine, theSlave.data());
       // The filter spreads no data into its neighbours' cells: a cell that
       // was no data stays so.
-      const SPair &aRaw = mPairs[static_cast<size_t>(theLine - mFirstPair)];
       for (int32_t i = 0; i < mPixels; ++i) {
-        if (aRaw.mMaster[i] == TCell())
-          aMaster[i] = TCell();
-        if (aRaw.mSlave[i] == TCell())
-          aSlave[i] = TCell();
+        if (aRawMaster[i] == TCell())
+          theMaster[i] = TCell();
+        if (aRawSlave[i] == TCell())
+          theSlave[i] = TCell();
       }
     } else {
-      const SPair &aRaw = mPairs[static_cast<size_t>(theLine - mFirstPair)];
-      std::copy(aRaw.mMaster.begin(), aRaw.mMaster.end(), aMaster.begin());
-      std::copy(aRaw.mSlave.begin(), aRaw.mSlave.end(), aSlave.begin());
+      std::copy(aRawMaster, aRawMaster + mPixels, theMaster.begin());
+      std::copy(aRawSlave, aRawSlave + mPixels, theSlave.begin());
     }
     if (mResults->mResampled[0]) {
-      mResults->mResampled[0]->file().putComplexLine(theLine, aMaster.data());
-      mResults->mResampled[1]->file().putComplexLine(theLine, aSlave.data());
+      const size_t aAt = static_cast<size_t>(theLine - mBandFirst) * static_cast<size_t>(mPixels);
+      std::copy(theMaster.begin(), theMaster.end(), mBandResampled[0].begin() + static_cast<std::ptrdiff_t>(aAt));
+      std::copy(theSlave.begin(), theSlave.end(), mBandResampled[1].begin() + static_cast<std::ptrdiff_t>(aAt));
     }
-    if (mGroupMaster.empty())
-      mGroupFirst = theLine;
-    mGroupMaster.push_back(std::move(aMaster));
-    mGroupSlave.push_back(std::move(aSlave));
-    if ((theLine + 1) % CTLRX_FRINGE_GROUP == 0 || theLine + 1 == mLines)
-      finishGroup();
   }
 
-  // The range common band of the group, then its lines through the product.
-  void finishGroup() {
+  // The range common band of the group of theCount lines from theFirst, then
+  // its lines through the product.
+  void finishGroup(int32_t theFirst, int32_t theCount, SBlockWorker &theWorker) {
     SRangeBand aMasterBand, aSlaveBand;
     bool aBanded = false;
+    SGroupFringe &aGroup = mBandGroups[static_cast<size_t>((theFirst - mBandFirst) / CTLRX_FRINGE_GROUP)];
+    aGroup = SGroupFringe();
     if (mRangeBandwidth > 0.0) {
       double aFringe = 0.0, aSnr = 0.0;
       bool aFound = false;
       if (mPhase != nullptr) {
-        aFringe = phaseFringe();
+        aFringe = phaseFringe(theFirst, theCount);
         aFound = true;
       } else {
-        mFringe.reset();
-        for (size_t i = 0; i < mGroupMaster.size(); ++i)
-          mFringe.add(mGroupMaster[i].data(), mGroupSlave[i].data());
-        aFound = mFringe.result(aFringe, aSnr);
+        theWorker.mFringe.reset();
+        for (int32_t i = 0; i < theCount; ++i)
+          theWorker.mFringe.add(theWorker.mGroupMaster[static_cast<size_t>(i)].data(),
+                                theWorker.mGroupSlave[static_cast<size_t>(i)].data());
+        aFound = theWorker.mFringe.result(aFringe, aSnr);
       }
       if (aFound) {
         aBanded = fdfCommonRangeBands(aFringe, mRangeBandwidth, aMasterBand, aSlaveBand);
-        mFringeSum += aFringe;
-        ++mFringeCount;
+        aGroup = SGroupFringe{true, aFringe};
       }
     }
-    for (size_t i = 0; i < mGroupMaster.size(); ++i) {
-      productLine(mGroupFirst + static_cast<int32_t>(i), mGroupMaster[i], mGroupSlave[i],
-                  aBanded ? &aMasterBand : nullptr, aBanded ? &aSlaveBand : nullptr);
-      mSpare.push_back(std::move(mGroupMaster[i]));
-      mSpare.push_back(std::move(mGroupSlave[i]));
-    }
-    mGroupMaster.clear();
-    mGroupSlave.clear();
+    for (int32_t i = 0; i < theCount; ++i)
+      productLine(theFirst + i, theWorker.mGroupMaster[static_cast<size_t>(i)],
+                  theWorker.mGroupSlave[static_cast<size_t>(i)], aBanded ? &aMasterBand : nullptr,
+                  aBanded ? &aSlaveBand : nullptr, theWorker);
   }
 
   // Mean fringe frequency of the synthetic phase over the group's lines.
-  double phaseFringe() {
+  double phaseFringe(int32_t theFirst, int32_t theCount) {
     double aSum = 0.0;
-    for (size_t i = 0; i < mGroupMaster.size(); ++i) {
-      mPhase->getLine(mPhaseLine.data(), mGroupFirst + static_cast<int32_t>(i));
-      aSum += fdfFringeFromPhase(mPhaseLine.data(), mPixels, mPhase->getDummyVal());
-    }
-    return aSum / static_cast<double>(mGroupMaster.size());
+    for (int32_t i = 0; i < theCount; ++i)
+      aSum += fdfFringeFromPhase(phaseLine(theFirst + i), mPixels, mPhase->getDummyVal());
+    return aSum / static_cast<double>(theCount);
   }
 
   // e^(-i phase) on the oversampled grid: the synthetic phase of line
   // theLine interpolated linearly between pixels (by its wrapped step).
-  void removePhase(int32_t theLine) {
-    mPhase->getLine(mPhaseLine.data(), theLine);
+  void removePhase(int32_t theLine, TLine &theProduct) {
+    const float *aPhase = phaseLine(theLine);
     const double aNull = mPhase->getDummyVal();
     const int32_t aFactor = mLooks.mFactor;
     for (int32_t j = 0; j < mPixels; ++j) {
-      const double a0 = std::isnan(mPhaseLine[j]) || mPhaseLine[j] == aNull ? 0.0 : mPhaseLine[j];
+      const double a0 = std::isnan(aPhase[j]) || aPhase[j] == aNull ? 0.0 : aPhase[j];
       double aStep = 0.0;
-      if (j + 1 < mPixels && !std::isnan(mPhaseLine[j + 1]) && mPhaseLine[j + 1] != aNull) {
-        aStep = mPhaseLine[j + 1] - a0;
+      if (j + 1 < mPixels && !std::isnan(aPhase[j + 1]) && aPhase[j + 1] != aNull) {
+        aStep = aPhase[j + 1] - a0;
         aStep -= 2.0 * CTLRX_INTERF_PI * std::round(aStep / (2.0 * CTLRX_INTERF_PI));
       }
       for (int32_t k = 0; k < aFactor; ++k)
-        mProduct[static_cast<size_t>(j) * aFactor + k] *=
+        theProduct[static_cast<size_t>(j) * aFactor + k] *=
             std::polar(1.0F, static_cast<float>(-(a0 + aStep * k / aFactor)));
     }
   }
 
   void productLine(int32_t theLine, const TLine &theMaster, const TLine &theSlave, const SRangeBand *theMasterBand,
-                   const SRangeBand *theSlaveBand) {
-    mMasterOversampler.process(theMaster.data(), theMasterBand, mMasterOver.data());
-    mSlaveOversampler.process(theSlave.data(), theSlaveBand, mSlaveOver.data());
+                   const SRangeBand *theSlaveBand, SBlockWorker &theWorker) {
+    theWorker.mMasterOversampler.process(theMaster.data(), theMasterBand, theWorker.mMasterOver.data());
+    theWorker.mSlaveOversampler.process(theSlave.data(), theSlaveBand, theWorker.mSlaveOver.data());
     // Parts spelled out: the library's complex product checks for NaN on
     // every call, and this loop runs on every oversampled sample.
-    const size_t aCount = mMasterOver.size();
-    mProduct.resize(aCount);
-    const float *m = reinterpret_cast<const float *>(mMasterOver.data());
-    const float *s = reinterpret_cast<const float *>(mSlaveOver.data());
-    float *z = reinterpret_cast<float *>(mProduct.data());
+    const size_t aCount = theWorker.mMasterOver.size();
+    const float *m = reinterpret_cast<const float *>(theWorker.mMasterOver.data());
+    const float *s = reinterpret_cast<const float *>(theWorker.mSlaveOver.data());
+    float *z = reinterpret_cast<float *>(theWorker.mProduct.data());
     for (size_t i = 0; i < 2 * aCount; i += 2) {
       z[i] = m[i] * s[i] + m[i + 1] * s[i + 1];
       z[i + 1] = m[i + 1] * s[i] - m[i] * s[i + 1];
     }
-    dropNoData(theMaster, theSlave);
+    dropNoData(theMaster, theSlave, theWorker);
     if (mPhase != nullptr)
-      removePhase(theLine);
+      removePhase(theLine, theWorker.mProduct);
     const size_t aGroup = static_cast<size_t>(mLooks.mGroup);
     for (size_t p = 0; p < static_cast<size_t>(mOutPixels); ++p) {
       double aRe = 0.0, aIm = 0.0, aMaster = 0.0, aSlave = 0.0;
@@ -604,87 +743,120 @@ private:
         aMaster += double(m[i]) * m[i] + double(m[i + 1]) * m[i + 1];
         aSlave += double(s[i]) * s[i] + double(s[i + 1]) * s[i + 1];
       }
-      mSumProduct[p] += std::complex<double>(aRe, aIm);
-      mSumMaster[p] += aMaster;
-      mSumSlave[p] += aSlave;
+      theWorker.mSumProduct[p] += std::complex<double>(aRe, aIm);
+      theWorker.mSumMaster[p] += aMaster;
+      theWorker.mSumSlave[p] += aSlave;
     }
     if ((theLine + 1) % mLooks.mAzimuth == 0 && (theLine + 1) / mLooks.mAzimuth <= mOutLines)
-      writeOutputLine((theLine + 1) / mLooks.mAzimuth - 1);
+      outputLine((theLine + 1) / mLooks.mAzimuth - 1, theWorker);
   }
 
   // A cell that is no data (0 + 0i) in either image, and the oversampled
   // samples between it and its neighbours, which carry its ringing, add
   // nothing to the sums: where every sample of a look is so, the result is
   // exactly 0 + 0i with powers 0.
-  void dropNoData(const TLine &theMaster, const TLine &theSlave) {
+  void dropNoData(const TLine &theMaster, const TLine &theSlave, SBlockWorker &theWorker) {
     const int32_t aFactor = mLooks.mFactor;
+    TLine &aProduct = theWorker.mProduct, &aMasterOver = theWorker.mMasterOver, &aSlaveOver = theWorker.mSlaveOver;
     const auto aValid = [&](int32_t j) { return j >= mPixels || (theMaster[j] != TCell() && theSlave[j] != TCell()); };
     for (int32_t j = 0; j < mPixels; ++j) {
       if (aValid(j) && aValid(j + 1))
         continue;
       for (int32_t k = aValid(j) ? 1 : 0; k < aFactor; ++k) {
         const size_t i = static_cast<size_t>(j) * aFactor + k;
-        mProduct[i] = mMasterOver[i] = mSlaveOver[i] = TCell();
+        aProduct[i] = aMasterOver[i] = aSlaveOver[i] = TCell();
       }
       // The samples after the previous cell lean on this one too.
       for (int32_t k = 1; j > 0 && !aValid(j) && k < aFactor; ++k) {
         const size_t i = static_cast<size_t>(j - 1) * aFactor + k;
-        mProduct[i] = mMasterOver[i] = mSlaveOver[i] = TCell();
+        aProduct[i] = aMasterOver[i] = aSlaveOver[i] = TCell();
       }
     }
   }
 
-  // Normalised product and power means of output line theLine.
-  void writeOutputLine(int32_t theLine) {
+  // Normalised product and power means of output line theLine into the
+  // band's result lines.
+  void outputLine(int32_t theLine, SBlockWorker &theWorker) {
     const double aLooks = static_cast<double>(mLooks.mGroup) * mLooks.mAzimuth;
+    const size_t aAt = static_cast<size_t>(theLine - mBandFirst / mLooks.mAzimuth) * static_cast<size_t>(mOutPixels);
+    TCell *aInterferogram = mBandInterferogram.data() + aAt;
+    float *aMasterPower = mBandMaster.data() + aAt, *aSlavePower = mBandSlave.data() + aAt;
     for (int32_t p = 0; p < mOutPixels; ++p) {
-      const double aD = std::sqrt(mSumMaster[p] * mSumSlave[p]);
+      const double aSumMaster = theWorker.mSumMaster[p], aSumSlave = theWorker.mSumSlave[p];
+      const double aD = std::sqrt(aSumMaster * aSumSlave);
       if (aD > CTLRX_INTERF_EPSILON || aD < -CTLRX_INTERF_EPSILON) {
         // Rounding of the sums can take |z| a hair above 1; coherence never is.
-        std::complex<double> aZ = mSumProduct[p] / aD;
+        std::complex<double> aZ = theWorker.mSumProduct[p] / aD;
         const double aNorm = std::norm(aZ);
         if (aNorm > 1.0)
           aZ /= std::sqrt(aNorm);
-        mOutInterferogram[p] = TCell(static_cast<float>(aZ.real()), static_cast<float>(aZ.imag()));
-        ++mProcessed;
+        aInterferogram[p] = TCell(static_cast<float>(aZ.real()), static_cast<float>(aZ.imag()));
+        ++theWorker.mProcessed;
       } else {
-        mOutInterferogram[p] = TCell();
+        aInterferogram[p] = TCell();
       }
-      mOutMaster[p] = static_cast<float>(mSumMaster[p] / aLooks);
-      mOutSlave[p] = static_cast<float>(mSumSlave[p] / aLooks);
+      aMasterPower[p] = static_cast<float>(aSumMaster / aLooks);
+      aSlavePower[p] = static_cast<float>(aSumSlave / aLooks);
     }
-    mResults->mInterferogram->file().putComplexLine(theLine, mOutInterferogram.data());
-    mResults->mMasterPower->file().putLine(theLine, mOutMaster.data());
-    mResults->mSlavePower->file().putLine(theLine, mOutSlave.data());
-    std::fill(mSumProduct.begin(), mSumProduct.end(), std::complex<double>());
-    std::fill(mSumMaster.begin(), mSumMaster.end(), 0.0);
-    std::fill(mSumSlave.begin(), mSumSlave.end(), 0.0);
+    std::fill(theWorker.mSumProduct.begin(), theWorker.mSumProduct.end(), std::complex<double>());
+    std::fill(theWorker.mSumMaster.begin(), theWorker.mSumMaster.end(), 0.0);
+    std::fill(theWorker.mSumSlave.begin(), theWorker.mSumSlave.end(), 0.0);
+  }
+
+  // On the calling thread, in line order: the co-registered pair, the result
+  // lines the band completes, and its fringe estimates into the mean.
+  void writeBand(int32_t theFirst, int32_t theCount) {
+    const size_t aPixels = static_cast<size_t>(mPixels), aOut = static_cast<size_t>(mOutPixels);
+    if (mResults->mResampled[0])
+      for (int32_t y = theFirst; y < theFirst + theCount; ++y) {
+        const size_t aAt = static_cast<size_t>(y - theFirst) * aPixels;
+        mResults->mResampled[0]->file().putComplexLine(y, mBandResampled[0].data() + aAt);
+        mResults->mResampled[1]->file().putComplexLine(y, mBandResampled[1].data() + aAt);
+      }
+    const int32_t aFirstOut = theFirst / mLooks.mAzimuth;
+    const int32_t aEndOut = std::min(mOutLines, (theFirst + theCount) / mLooks.mAzimuth);
+    for (int32_t o = aFirstOut; o < aEndOut; ++o) {
+      const size_t aAt = static_cast<size_t>(o - aFirstOut) * aOut;
+      mResults->mInterferogram->file().putComplexLine(o, mBandInterferogram.data() + aAt);
+      mResults->mMasterPower->file().putLine(o, mBandMaster.data() + aAt);
+      mResults->mSlavePower->file().putLine(o, mBandSlave.data() + aAt);
+    }
+    const int32_t aGroups = (theCount + CTLRX_FRINGE_GROUP - 1) / CTLRX_FRINGE_GROUP;
+    for (int32_t g = 0; g < aGroups; ++g)
+      if (mBandGroups[static_cast<size_t>(g)].mFound) {
+        mFringeSum += mBandGroups[static_cast<size_t>(g)].mFringe;
+        ++mFringeCount;
+      }
   }
 
   SSlcInput &mMaster;
   SSlcInput &mSlave;
+  CShiftField &mField;
   SLooks mLooks;
-  int32_t mPixels, mLines, mOutPixels, mOutLines;
+  int32_t mPixels, mLines, mOutPixels, mOutLines, mMaxHeld;
   std::vector<uint8_t> mSlaveValid, mMasterValid;
-  CSlaveResampler mResampler;
-  CFringeEstimator mFringe;
-  CRangeOversampler mMasterOversampler, mSlaveOversampler;
+  CResampleKernel mKernel;
   std::unique_ptr<CAzimuthBandFilter> mAzimuth;
   double mRangeBandwidth = 0.0;
   CRasterFile *mPhase = nullptr;
   SResults *mResults = nullptr;
+  std::vector<std::unique_ptr<SBlockWorker>> mWorkers;
 
-  std::deque<SPair> mPairs;
-  int32_t mFirstPair = 0;
-  std::vector<TLine> mSpare;
-  std::vector<TLine> mGroupMaster, mGroupSlave;
-  int32_t mGroupFirst = 0;
-  TLine mMasterOver, mSlaveOver, mProduct;
-  std::vector<float> mPhaseLine;
-  std::vector<std::complex<double>> mSumProduct;
-  std::vector<double> mSumMaster, mSumSlave;
-  TLine mOutInterferogram;
-  std::vector<float> mOutMaster, mOutSlave;
+  // Lines held across bands, by absolute number: the master and resampled
+  // slave of the band and its filter margin, the range-passed slave lines.
+  CLineStore mPairMaster, mPairSlave, mSlaveLines;
+  // The band being entered: shift field of its new pair lines, raw slave
+  // lines and their range columns.
+  std::vector<double> mColumns, mPositions, mRangeColumns;
+  TLine mRaw;
+  // The band's lines: synthetic phase, results, co-registered pair, fringes.
+  int32_t mBandFirst = 0;
+  std::vector<float> mBandPhase;
+  TLine mBandInterferogram;
+  std::vector<float> mBandMaster, mBandSlave;
+  TLine mBandResampled[2];
+  std::vector<SGroupFringe> mBandGroups;
+
   int64_t mProcessed = 0;
   double mFringeSum = 0.0;
   int64_t mFringeCount = 0;

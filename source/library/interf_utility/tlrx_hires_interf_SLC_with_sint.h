@@ -17,10 +17,13 @@
 // writes the co-registered pair (folder of the interferogram + input name +
 // "_rsp").
 //
-// The images stream line by line: every estimate (Doppler centroid, fringe
-// frequency per group of CTLRX_FRINGE_GROUP lines) is anchored to absolute
-// line numbers, so the result does not depend on the block size, and memory
-// holds a few dozen lines per raster whatever the image height.
+// The images stream in bands of lines: every estimate (Doppler centroid,
+// fringe frequency per group of CTLRX_FRINGE_GROUP lines) and every multilook
+// sum is anchored to absolute line numbers, and each resampled, filtered or
+// summed line is a function of its line number alone, so the result depends
+// neither on the block size nor on the thread count. Memory holds a band of
+// lines per raster (blocks of whole groups and looks, two per thread) whatever
+// the image height.
 #pragma once
 
 #include <cstdint>

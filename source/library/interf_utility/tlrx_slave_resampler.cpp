@@ -157,40 +157,140 @@ void CRasterShiftField::slaveLineColumns(int32_t theSlaveLine, int32_t theCount,
     theColumns[i] = i + (aRange != nullptr && i < mImpl->mPixels ? aRange[i] : 0.0);
 }
 
+// ------------------------------------------------------------ kernel
+
+CResampleKernel::CResampleKernel(int32_t theSlaveLines, int32_t theSlavePixels, int32_t theMasterPixels,
+                                 std::vector<double> theCentroid, double theOversampling)
+    : mSlaveLines(std::max(0, theSlaveLines)), mSlavePixels(std::max(0, theSlavePixels)),
+      mMasterPixels(std::max(0, theMasterPixels)), mCentroid(std::move(theCentroid)), mTable(theOversampling) {
+  if (!mCentroid.empty() && mCentroid.size() != static_cast<size_t>(mMasterPixels))
+    TLRX_RAISE_F(CTLRX_ERR_SIZE_MISMATCH, "Doppler centroid of %zu columns for %d master pixels", mCentroid.size(),
+                 mMasterPixels);
+  mDoppler = std::any_of(mCentroid.begin(), mCentroid.end(), [](double f) { return f != 0.0; });
+  mZeros.assign(static_cast<size_t>(mMasterPixels), std::complex<float>(0.0f, 0.0f));
+}
+
+void CResampleKernel::prepare(SResampleScratch &theScratch) const {
+  const size_t aMaster = static_cast<size_t>(mMasterPixels);
+  theScratch.mFractions.resize(aMaster);
+  theScratch.mCycles.resize(aMaster);
+  theScratch.mFirstTap.resize(aMaster);
+}
+
+void CResampleKernel::rangePass(int32_t theLine, const std::complex<float> *theRaw, const double *theColumns,
+                                std::complex<float> *theOut, SResampleScratch &theScratch) const {
+  fdfSincResampleLine(mTable, theRaw, mSlavePixels, theColumns, mMasterPixels, theOut);
+  if (mDoppler) {
+    prepare(theScratch);
+    const double j = theLine;
+    for (int32_t c = 0; c < mMasterPixels; ++c)
+      theScratch.mCycles[static_cast<size_t>(c)] = -mCentroid[static_cast<size_t>(c)] * j;
+    multiplyByTurns(theOut, theScratch.mCycles.data(), mMasterPixels);
+  }
+}
+
+bool CResampleKernel::window(const double *theColumns, const double *theLines, int64_t &theFirst,
+                             int64_t &theLast) const {
+  const double aLastLine = double(mSlaveLines) - 1.0, aLastPixel = double(mSlavePixels) - 1.0;
+  int64_t aLow = std::numeric_limits<int64_t>::max(), aHigh = std::numeric_limits<int64_t>::min();
+  for (int32_t c = 0; c < mMasterPixels; ++c) {
+    const double p = theLines[c], x = theColumns[c];
+    if (!(p >= 0.0 && p <= aLastLine && x >= 0.0 && x <= aLastPixel))
+      continue;
+    int64_t aFirst = 0;
+    double aFraction = 0.0;
+    fdfSplitPosition(p, aFirst, aFraction);
+    aLow = std::min(aLow, aFirst);
+    aHigh = std::max(aHigh, aFirst);
+  }
+  if (aLow > aHigh)
+    return false;
+  theFirst = aLow - CTLRX_SINC_BEFORE;
+  theLast = aHigh + CTLRX_SINC_TAPS - CTLRX_SINC_BEFORE - 1;
+  return true;
+}
+
+void CResampleKernel::checkReach(int32_t theMasterLine, int64_t theFirst, int64_t theLast, int32_t theMaxHeld) {
+  if (theLast - theFirst + 1 > theMaxHeld)
+    TLRX_RAISE_F(CTLRX_ERR_ARGUMENTS,
+                 "the azimuth shifts of master line %d reach over %lld slave lines, more than the %d lines a block holds",
+                 theMasterLine, static_cast<long long>(theLast - theFirst + 1), theMaxHeld);
+}
+
+void CResampleKernel::azimuthPass(const double *theColumns, const double *theLines, const TSlaveLine &theSlaveLine,
+                                  std::complex<float> *theOut, SResampleScratch &theScratch) const {
+  const int32_t n = mMasterPixels;
+  prepare(theScratch);
+  // Which master pixels see the slave, and the slave lines they need.
+  const double aLastLine = double(mSlaveLines) - 1.0, aLastPixel = double(mSlavePixels) - 1.0;
+  int64_t aLow = std::numeric_limits<int64_t>::max(), aHigh = std::numeric_limits<int64_t>::min();
+  for (int32_t c = 0; c < n; ++c) {
+    const double p = theLines[c], x = theColumns[c];
+    int64_t &aFirst = theScratch.mFirstTap[static_cast<size_t>(c)];
+    if (!(p >= 0.0 && p <= aLastLine && x >= 0.0 && x <= aLastPixel)) {
+      aFirst = -1;
+      continue;
+    }
+    fdfSplitPosition(p, aFirst, theScratch.mFractions[static_cast<size_t>(c)]);
+    aLow = std::min(aLow, aFirst);
+    aHigh = std::max(aHigh, aFirst);
+  }
+  if (aLow > aHigh) {
+    std::fill(theOut, theOut + n, std::complex<float>(0.0f, 0.0f));
+    return;
+  }
+  const int64_t aWindowFirst = aLow - CTLRX_SINC_BEFORE;
+  const int64_t aWindowLast = aHigh + CTLRX_SINC_TAPS - CTLRX_SINC_BEFORE - 1;
+  // Lines outside the slave are a line of zeros: taps there count as 0.
+  std::vector<const std::complex<float> *> &aTaps = theScratch.mTaps;
+  aTaps.resize(static_cast<size_t>(aWindowLast - aWindowFirst + 1));
+  for (int64_t j = aWindowFirst; j <= aWindowLast; ++j)
+    aTaps[static_cast<size_t>(j - aWindowFirst)] =
+        j >= 0 && j < mSlaveLines ? theSlaveLine(static_cast<int32_t>(j)) : mZeros.data();
+  double *aCycles = theScratch.mCycles.data();
+  for (int32_t c = 0; c < n; ++c) {
+    const size_t i = static_cast<size_t>(c);
+    const int64_t aFirst = theScratch.mFirstTap[i];
+    if (aFirst < 0) {
+      theOut[c] = std::complex<float>(0.0f, 0.0f);
+      aCycles[i] = 0.0;
+      continue;
+    }
+    const double aFraction = theScratch.mFractions[i];
+    const float *aW = mTable.weights(aFraction);
+    const std::complex<float> *const *aRows = aTaps.data() + (aFirst - CTLRX_SINC_BEFORE - aWindowFirst);
+    float aRe = 0.0f, aIm = 0.0f;
+    for (int32_t k = 0; k < CTLRX_SINC_TAPS; ++k) {
+      aRe += aW[k] * aRows[k][i].real();
+      aIm += aW[k] * aRows[k][i].imag();
+    }
+    theOut[c] = std::complex<float>(aRe, aIm);
+    aCycles[i] = mDoppler ? mCentroid[i] * (double(aFirst) + aFraction) : 0.0;
+  }
+  if (mDoppler)
+    multiplyByTurns(theOut, aCycles, n);
+}
+
 // ------------------------------------------------------------ resampler
 
 CSlaveResampler::CSlaveResampler(int32_t theSlaveLines, int32_t theSlavePixels, int32_t theMasterPixels,
                                  CShiftField &theField, std::vector<double> theCentroid, TLineReader theReader,
                                  double theOversampling)
-    : mSlaveLines(std::max(0, theSlaveLines)), mSlavePixels(std::max(0, theSlavePixels)),
-      mMasterPixels(std::max(0, theMasterPixels)), mField(theField), mCentroid(std::move(theCentroid)),
-      mReader(std::move(theReader)), mTable(theOversampling) {
-  if (!mCentroid.empty() && mCentroid.size() != static_cast<size_t>(mMasterPixels))
-    TLRX_RAISE_F(CTLRX_ERR_SIZE_MISMATCH, "Doppler centroid of %zu columns for %d master pixels", mCentroid.size(),
-                 mMasterPixels);
-  mDoppler = std::any_of(mCentroid.begin(), mCentroid.end(), [](double f) { return f != 0.0; });
-  const size_t aMaster = static_cast<size_t>(mMasterPixels);
-  mRaw.resize(static_cast<size_t>(mSlavePixels));
+    : mKernel(theSlaveLines, theSlavePixels, theMasterPixels, std::move(theCentroid), theOversampling),
+      mField(theField), mReader(std::move(theReader)) {
+  const size_t aMaster = static_cast<size_t>(mKernel.masterPixels());
+  mRaw.resize(static_cast<size_t>(mKernel.slavePixels()));
   mColumns.resize(aMaster);
   mLines.resize(aMaster);
   mRangeColumns.resize(aMaster);
-  mCycles.resize(aMaster);
-  mZeros.assign(aMaster, std::complex<float>(0.0f, 0.0f));
-  mFirstTap.resize(aMaster);
 }
 
 void CSlaveResampler::rangePass(int32_t theLine, std::vector<std::complex<float>> &theOut) {
-  theOut.resize(static_cast<size_t>(mMasterPixels));
+  theOut.resize(static_cast<size_t>(mKernel.masterPixels()));
   mReader(theLine, mRaw.data());
   ++mLinesRead;
-  mField.slaveLineColumns(theLine, mMasterPixels, mRangeColumns.data());
-  fdfSincResampleLine(mTable, mRaw.data(), mSlavePixels, mRangeColumns.data(), mMasterPixels, theOut.data());
-  if (mDoppler) {
-    const double j = theLine;
-    for (int32_t c = 0; c < mMasterPixels; ++c)
-      mCycles[static_cast<size_t>(c)] = -mCentroid[static_cast<size_t>(c)] * j;
-    multiplyByTurns(theOut.data(), mCycles.data(), mMasterPixels);
-  }
+  mField.slaveLineColumns(theLine, mKernel.masterPixels(), mRangeColumns.data());
+  mKernel.rangePass(theLine, mRaw.data(), mRangeColumns.data(), theOut.data(), mScratch);
 }
 
 void CSlaveResampler::hold(int32_t theFirst, int32_t theLast) {
@@ -225,60 +325,20 @@ void CSlaveResampler::hold(int32_t theFirst, int32_t theLast) {
 }
 
 void CSlaveResampler::resampleLine(int32_t theLine, std::complex<float> *theOut) {
-  const int32_t n = mMasterPixels;
+  const int32_t n = mKernel.masterPixels();
   mField.masterLine(theLine, n, mColumns.data(), mLines.data());
-  // Which master pixels see the slave, and the slave lines they need.
-  const double aLastLine = double(mSlaveLines) - 1.0, aLastPixel = double(mSlavePixels) - 1.0;
-  int64_t aLow = std::numeric_limits<int64_t>::max(), aHigh = std::numeric_limits<int64_t>::min();
-  for (int32_t c = 0; c < n; ++c) {
-    const double p = mLines[static_cast<size_t>(c)], x = mColumns[static_cast<size_t>(c)];
-    int64_t &aFirst = mFirstTap[static_cast<size_t>(c)];
-    if (!(p >= 0.0 && p <= aLastLine && x >= 0.0 && x <= aLastPixel)) {
-      aFirst = -1;
-      continue;
-    }
-    double aFraction = 0.0;
-    fdfSplitPosition(p, aFirst, aFraction);
-    mLines[static_cast<size_t>(c)] = aFraction;
-    aLow = std::min(aLow, aFirst);
-    aHigh = std::max(aHigh, aFirst);
-  }
-  if (aLow > aHigh) {
+  int64_t aFirst = 0, aLast = 0;
+  if (!mKernel.window(mColumns.data(), mLines.data(), aFirst, aLast)) {
     std::fill(theOut, theOut + n, std::complex<float>(0.0f, 0.0f));
     return;
   }
-  const int64_t aWindowFirst = aLow - CTLRX_SINC_BEFORE;
-  const int64_t aWindowLast = aHigh + CTLRX_SINC_TAPS - CTLRX_SINC_BEFORE - 1;
-  if (aWindowLast - aWindowFirst + 1 > mMaxHeld)
-    TLRX_RAISE_F(CTLRX_ERR_ARGUMENTS,
-                 "the azimuth shifts of master line %d reach over %lld slave lines, more than the %d lines a block holds",
-                 theLine, static_cast<long long>(aWindowLast - aWindowFirst + 1), mMaxHeld);
-  hold(static_cast<int32_t>(std::max<int64_t>(0, aWindowFirst)),
-       static_cast<int32_t>(std::min<int64_t>(mSlaveLines - 1, aWindowLast)));
-  // Lines outside the slave are a line of zeros: taps there count as 0.
-  mTaps.resize(static_cast<size_t>(aWindowLast - aWindowFirst + 1));
-  for (int64_t j = aWindowFirst; j <= aWindowLast; ++j)
-    mTaps[static_cast<size_t>(j - aWindowFirst)] =
-        j >= 0 && j < mSlaveLines ? mHeld[static_cast<size_t>(j - mFirstHeld)].data() : mZeros.data();
-  for (int32_t c = 0; c < n; ++c) {
-    const size_t i = static_cast<size_t>(c);
-    if (mFirstTap[i] < 0) {
-      theOut[c] = std::complex<float>(0.0f, 0.0f);
-      mCycles[i] = 0.0;
-      continue;
-    }
-    const float *aW = mTable.weights(mLines[i]);
-    const std::complex<float> *const *aRows = mTaps.data() + (mFirstTap[i] - CTLRX_SINC_BEFORE - aWindowFirst);
-    float aRe = 0.0f, aIm = 0.0f;
-    for (int32_t k = 0; k < CTLRX_SINC_TAPS; ++k) {
-      aRe += aW[k] * aRows[k][i].real();
-      aIm += aW[k] * aRows[k][i].imag();
-    }
-    theOut[c] = std::complex<float>(aRe, aIm);
-    mCycles[i] = mDoppler ? mCentroid[i] * (double(mFirstTap[i]) + mLines[i]) : 0.0;
-  }
-  if (mDoppler)
-    multiplyByTurns(theOut, mCycles.data(), n);
+  CResampleKernel::checkReach(theLine, aFirst, aLast, mMaxHeld);
+  hold(static_cast<int32_t>(std::max<int64_t>(0, aFirst)),
+       static_cast<int32_t>(std::min<int64_t>(mKernel.slaveLines() - 1, aLast)));
+  mKernel.azimuthPass(
+      mColumns.data(), mLines.data(),
+      [this](int32_t theSlaveLine) { return mHeld[static_cast<size_t>(theSlaveLine - mFirstHeld)].data(); }, theOut,
+      mScratch);
 }
 
 // ------------------------------------------------------------ Doppler

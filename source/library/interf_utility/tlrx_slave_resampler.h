@@ -76,6 +76,67 @@ private:
   std::unique_ptr<SImpl> mImpl;
 };
 
+// The two passes as functions of the lines they are given, for callers that
+// hold and schedule the lines themselves: the range pass of one slave line and
+// the azimuth pass of one master line over range-passed slave lines. Each
+// result depends only on its line numbers and inputs, so lines may be computed
+// in any order and at the same time, each call with its own scratch.
+struct SResampleScratch {
+  std::vector<double> mFractions;                // azimuth fraction per master pixel
+  std::vector<double> mCycles;                   // phases in cycles, one line
+  std::vector<int64_t> mFirstTap;                // floor of the slave line, per master pixel
+  std::vector<const std::complex<float> *> mTaps; // lines of the azimuth window
+};
+
+class CResampleKernel {
+public:
+  // Returns slave line theLine (range-passed) of the window being resampled.
+  using TSlaveLine = std::function<const std::complex<float> *(int32_t theLine)>;
+
+  // theCentroid: Doppler centroid per master column in cycles per line
+  // (empty: zero everywhere; another size than theMasterPixels raises 652807).
+  CResampleKernel(int32_t theSlaveLines, int32_t theSlavePixels, int32_t theMasterPixels,
+                  std::vector<double> theCentroid, double theOversampling = 1.2);
+
+  int32_t slaveLines() const { return mSlaveLines; }
+  int32_t slavePixels() const { return mSlavePixels; }
+  int32_t masterPixels() const { return mMasterPixels; }
+
+  // Raw slave line theLine (slave pixels) interpolated at theColumns (one
+  // per master pixel) into theOut (master pixels), demodulated by the
+  // centroid at its absolute line number.
+  void rangePass(int32_t theLine, const std::complex<float> *theRaw, const double *theColumns,
+                 std::complex<float> *theOut, SResampleScratch &theScratch) const;
+
+  // The slave lines [theFirst, theLast] whose taps the azimuth pass of a
+  // master line with slave positions theColumns, theLines (master pixels)
+  // reaches, lines outside the slave included; false when no pixel lies
+  // inside the slave.
+  bool window(const double *theColumns, const double *theLines, int64_t &theFirst, int64_t &theLast) const;
+
+  // Raises 456962 naming master line theMasterLine when window [theFirst,
+  // theLast] spans more than theMaxHeld lines.
+  static void checkReach(int32_t theMasterLine, int64_t theFirst, int64_t theLast, int32_t theMaxHeld);
+
+  // The resampled slave at a master line into theOut (master pixels): the
+  // azimuth interpolation of the range-passed lines of its window inside the
+  // slave (theSlaveLine), remodulated. A pixel whose position lies outside
+  // the slave is 0 + 0i; taps outside it count as 0.
+  void azimuthPass(const double *theColumns, const double *theLines, const TSlaveLine &theSlaveLine,
+                   std::complex<float> *theOut, SResampleScratch &theScratch) const;
+
+private:
+  void prepare(SResampleScratch &theScratch) const;
+
+  int32_t mSlaveLines;
+  int32_t mSlavePixels;
+  int32_t mMasterPixels;
+  std::vector<double> mCentroid;
+  bool mDoppler = false;                   // some centroid is not zero
+  CSincTable mTable;
+  std::vector<std::complex<float>> mZeros; // a line outside the slave
+};
+
 class CSlaveResampler {
 public:
   // Reads slave line theLine (0 .. slave lines - 1) into theCells.
@@ -104,29 +165,20 @@ public:
 
 private:
   void hold(int32_t theFirst, int32_t theLast);
+  // Range pass of one slave line into theOut (master pixels), demodulated.
+  void rangePass(int32_t theLine, std::vector<std::complex<float>> &theOut);
 
-  int32_t mSlaveLines;
-  int32_t mSlavePixels;
-  int32_t mMasterPixels;
+  CResampleKernel mKernel;
   CShiftField &mField;
-  std::vector<double> mCentroid;
   TLineReader mReader;
-  CSincTable mTable;
+  SResampleScratch mScratch;
   int32_t mFirstHeld = 0;  // absolute slave line of mHeld.front()
   std::deque<std::vector<std::complex<float>>> mHeld; // range-resampled, demodulated
   std::vector<std::vector<std::complex<float>>> mSpare;
   std::vector<std::complex<float>> mRaw;
-  std::vector<double> mColumns, mLines;
+  std::vector<double> mColumns, mLines, mRangeColumns;
   int64_t mLinesRead = 0;
   int32_t mMaxHeld = INT32_MAX;
-  // Range pass of one slave line into theOut (master pixels), demodulated.
-  void rangePass(int32_t theLine, std::vector<std::complex<float>> &theOut);
-  bool mDoppler = false;                       // some centroid is not zero
-  std::vector<double> mRangeColumns;           // slave columns of the range pass
-  std::vector<double> mCycles;                 // phases in cycles, one line
-  std::vector<std::complex<float>> mZeros;     // a line outside the slave
-  std::vector<const std::complex<float> *> mTaps; // lines of the azimuth window
-  std::vector<int64_t> mFirstTap;              // floor of the slave line, per master pixel
 };
 
 // Doppler centroid per master column (cycles per line, in [-0.5, 0.5)) from
