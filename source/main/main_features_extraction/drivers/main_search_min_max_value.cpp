@@ -15,6 +15,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_threads.h"
 
 #include <algorithm>
 #include <cmath>
@@ -30,6 +31,8 @@ constexpr int CTLRX_MINMAX_ROOT = 1;
 constexpr int CTLRX_MINMAX_TIFF = 7;
 constexpr int CTLRX_MINMAX_SATURATION = 8;
 constexpr int CTLRX_PALETTE_SIZE = 256;
+// Lines per piece of parallel work.
+constexpr int32_t CTLRX_MINMAX_BLOCK_LINES = 8;
 
 // The four results, in the order they are written and converted.
 const char *const sResultSuffixes[4] = {"_min", "_max", "_min_date", "_max_date"};
@@ -142,20 +145,41 @@ int32_t fdfRunMinMax(const char *theArguments) {
   }
   const float aNull = static_cast<float>(aOut[0]->file().getDummyVal());
 
-  std::vector<std::vector<float>> aRows(aInputs, std::vector<float>(aPixels));
-  std::vector<float> aResultRows(4 * static_cast<size_t>(aPixels));
-  const SMinMax aLine = {&aResultRows[0], &aResultRows[aPixels], &aResultRows[2 * static_cast<size_t>(aPixels)],
-                         &aResultRows[3 * static_cast<size_t>(aPixels)]};
-  std::vector<uint8_t> aValid(aPixels);
+  const SLineBands aBands = fdfLineBands(aLines, CTLRX_MINMAX_BLOCK_LINES);
+  std::vector<CBandLines<float>> aInBand(static_cast<size_t>(aInputs), CBandLines<float>(aBands, aPixels));
+  std::vector<CBandLines<float>> aOutBand(4, CBandLines<float>(aBands, aPixels));
+  // Per thread: the input lines of the pixel row in hand and the validity flags.
+  const size_t aThreads = static_cast<size_t>(fdfThreadCount());
+  std::vector<std::vector<const float *>> aRows(aThreads, std::vector<const float *>(aInBand.size()));
+  std::vector<std::vector<uint8_t>> aValid(aThreads, std::vector<uint8_t>(aPixels));
   CLineProgress aProgress(50.0);
-  for (int32_t l = 0; l < aLines; ++l) {
-    aProgress.update(l, aLines);
-    for (int32_t i = 0; i < aInputs; ++i)
-      aIn[i]->getLine(aRows[i].data(), l);
-    fdfMinMaxLine(aRows, aNulls, aPixels, aNull, aValid, aLine);
-    for (int k = 0; k < 4; ++k)
-      aOut[k]->file().putLine(l, &aResultRows[k * static_cast<size_t>(aPixels)]);
-  }
+  fdfRunLineBands(
+      aBands,
+      [&](int32_t theFirst, int32_t theCount) {
+        for (auto &aBand : aInBand)
+          aBand.start(theFirst);
+        for (auto &aBand : aOutBand)
+          aBand.start(theFirst);
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          aProgress.update(l, aLines);
+          for (int32_t i = 0; i < aInputs; ++i)
+            aIn[i]->getLine(aInBand[i].line(l), l);
+        }
+      },
+      [&](int32_t theFirst, int32_t theCount, int theThread) {
+        std::vector<const float *> &aLineRows = aRows[static_cast<size_t>(theThread)];
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          for (size_t i = 0; i < aInBand.size(); ++i)
+            aLineRows[i] = aInBand[i].line(l);
+          fdfMinMaxLine(aLineRows, aNulls, aPixels, aNull, aValid[static_cast<size_t>(theThread)],
+                        {aOutBand[0].line(l), aOutBand[1].line(l), aOutBand[2].line(l), aOutBand[3].line(l)});
+        }
+      },
+      [&](int32_t theFirst, int32_t theCount) {
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+          for (int k = 0; k < 4; ++k)
+            aOut[k]->file().putLine(l, aOutBand[static_cast<size_t>(k)].line(l));
+      });
   for (auto &aRaster : aIn)
     aRaster->close();
   for (int k = 0; k < 4; ++k)

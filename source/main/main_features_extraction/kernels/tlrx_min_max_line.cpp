@@ -40,17 +40,17 @@ void fdfValidCells(const float *__restrict theRow, double theNull, int32_t thePi
 // Input by input over the whole line, so each loop vectorises; a pixel that
 // is no data in any input ends as theNull with date 0, as if the visit had
 // stopped at that input. Strict comparisons keep the earlier date on ties.
-void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
+void fdfMinMaxLine(const std::vector<const float *> &theRows, const std::vector<double> &theNulls,
                    int32_t thePixels, float theNull, std::vector<uint8_t> &theValid, const SMinMax &theOut) {
   std::fill(theValid.begin(), theValid.end(), 1);
-  const float *aFirst = theRows[0].data();
+  const float *aFirst = theRows[0];
   for (int32_t x = 0; x < thePixels; ++x) {
     theOut.mMin[x] = theOut.mMax[x] = aFirst[x];
     theOut.mMinDate[x] = theOut.mMaxDate[x] = 1.0f;
   }
   fdfValidCells(aFirst, theNulls[0], thePixels, theValid.data());
   for (size_t i = 1; i < theRows.size(); ++i) {
-    const float *__restrict aRow = theRows[i].data();
+    const float *__restrict aRow = theRows[i];
     float *__restrict aMin = theOut.mMin;
     float *__restrict aMax = theOut.mMax;
     float *__restrict aMinDate = theOut.mMinDate;

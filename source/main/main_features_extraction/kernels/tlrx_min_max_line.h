@@ -11,5 +11,5 @@ struct SMinMax {
 
 // theRows: one line of each input in chronological order; theNulls their
 // null values (a NaN null matches NaN); theValid a scratch line of flags.
-void fdfMinMaxLine(const std::vector<std::vector<float>> &theRows, const std::vector<double> &theNulls,
+void fdfMinMaxLine(const std::vector<const float *> &theRows, const std::vector<double> &theNulls,
                    int32_t thePixels, float theNull, std::vector<uint8_t> &theValid, const SMinMax &theOut);

@@ -1,7 +1,8 @@
 // Ratio of two co-registered images: out = a / b per pixel, or 10 log10(a / b)
 // in decibels. A pixel is null (the program-wide dummy value) where either
 // input holds its own null value or the divisor is not above the smallest
-// normal float. One line of each raster is held at a time.
+// normal float. Bands of a few lines per raster are held at a time, their
+// lines computed in parallel.
 #include "ratio_images.h"
 
 #include "tlrx_enviroment.h"
@@ -12,6 +13,7 @@
 #include "tlrx_ratio_line.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_threads.h"
 #include "tlrx_window_step.h"
 
 #include <algorithm>
@@ -26,6 +28,8 @@
 namespace {
 
 constexpr const char *CTLRX_RATIO_SUFFIX = "_rto";
+// Lines per piece of parallel work.
+constexpr int32_t CTLRX_RATIO_BLOCK_LINES = 8;
 
 // Printed classes; "Less than 0.01 " has no counting test and stays 0.
 const char *const sHistogramLabels[CTLRX_RATIO_HISTOGRAM_CLASSES] = {
@@ -83,17 +87,35 @@ int ratio_images(int argc, char **argv) {
 
   const int32_t aLines = aFirst.lines();
   const int32_t aPixels = aFirst.pixels();
-  std::vector<float> aResult(aPixels), aLine1(aPixels), aLine2(aPixels);
-  long long aHistogram[CTLRX_RATIO_COUNTED_CLASSES] = {};
+  const SLineBands aBands = fdfLineBands(aLines, CTLRX_RATIO_BLOCK_LINES);
+  CBandLines<float> aBand1(aBands, aPixels), aBand2(aBands, aPixels), aResult(aBands, aPixels);
+  // Counts per thread, added up after the pass: integers, so in any order.
+  std::vector<std::array<long long, CTLRX_RATIO_COUNTED_CLASSES>> aCounts(static_cast<size_t>(fdfThreadCount()));
   CLineProgress aProgress(99.0);
-  for (int32_t aLine = 0; aLine < aLines; ++aLine) {
-    aProgress.update(aLine, aLines);
-    aFirst.readFloatLine(aLine, aLine1.data());
-    aSecond.readFloatLine(aLine, aLine2.data());
-    fdfRatioLine(aLine1.data(), aFirst.nullValue(), aLine2.data(), aSecond.nullValue(), aPixels, aDecibel, aNull,
-                 aResult.data(), aHistogram);
-    aOut.file().putLine(aLine, aResult.data());
-  }
+  fdfRunLineBands(
+      aBands,
+      [&](int32_t theFirst, int32_t theCount) {
+        for (CBandLines<float> *aBand : {&aBand1, &aBand2, &aResult})
+          aBand->start(theFirst);
+        for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine) {
+          aProgress.update(aLine, aLines);
+          aFirst.readFloatLine(aLine, aBand1.line(aLine));
+          aSecond.readFloatLine(aLine, aBand2.line(aLine));
+        }
+      },
+      [&](int32_t theFirst, int32_t theCount, int theThread) {
+        for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine)
+          fdfRatioLine(aBand1.line(aLine), aFirst.nullValue(), aBand2.line(aLine), aSecond.nullValue(), aPixels,
+                       aDecibel, aNull, aResult.line(aLine), aCounts[static_cast<size_t>(theThread)].data());
+      },
+      [&](int32_t theFirst, int32_t theCount) {
+        for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine)
+          aOut.file().putLine(aLine, aResult.line(aLine));
+      });
+  long long aHistogram[CTLRX_RATIO_COUNTED_CLASSES] = {};
+  for (const auto &aThreadCounts : aCounts)
+    for (int i = 0; i < CTLRX_RATIO_COUNTED_CLASSES; ++i)
+      aHistogram[i] += aThreadCounts[static_cast<size_t>(i)];
   aFirst.close();
   aSecond.close();
   fdfTraceMessage("writing the output parameter file %s\n", aOutput.c_str());

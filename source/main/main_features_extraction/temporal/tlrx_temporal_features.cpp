@@ -21,6 +21,7 @@
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_temporal_grid.h"
+#include "tlrx_threads.h"
 
 #include <algorithm>
 #include <cmath>
@@ -48,6 +49,8 @@ const STemporalOutput sOutputs[CTLRX_TF_COUNT] = {
 
 constexpr const char *CTLRX_TF_PROCESS = "Multi Temporal Features Extraction";
 constexpr const char *CTLRX_TF_TIFF_PROCESS = "Tiff generation ... ";
+// Lines per piece of parallel work: rows of every input are held per line.
+constexpr int32_t CTLRX_TF_BLOCK_LINES = 2;
 
 // The inputs' values along one output line: n rows of P values.
 class CInputRows {
@@ -128,14 +131,12 @@ private:
   CGeocodedImageStack mStack;
 };
 
-// One open output with its header and line buffer.
+// One open output with its header.
 struct SOpenOutput {
   int mFeature = 0;
   std::string mName;
   CDescription mHeader;
   std::unique_ptr<CResultRaster> mFile;
-  std::vector<float> mValues;
-  std::vector<int32_t> mDates;
 };
 
 [[noreturn]] void fdfRaiseMissing(const std::string &theName) {
@@ -205,7 +206,7 @@ namespace {
 // Opens every requested output, in the order of the output table, with its
 // header written beside it.
 std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest &theRequest,
-                                                         const CDescription &theGridHeader, int32_t thePixels,
+                                                         const CDescription &theGridHeader,
                                                          const std::string &theReference) {
   std::vector<std::unique_ptr<SOpenOutput>> aOutputs;
   for (int f = 0; f < CTLRX_TF_COUNT; ++f) {
@@ -214,37 +215,71 @@ std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest 
     auto aOutput = std::make_unique<SOpenOutput>();
     aOutput->mFeature = f;
     aOutput->mName = theRequest.mRoot + sOutputs[f].mSuffix;
-    if (sOutputs[f].mDate)
-      aOutput->mDates.assign(thePixels, CTLRX_TF_NO_DATE);
-    else
-      aOutput->mValues.assign(thePixels, 0.0f);
     fdfOpenOutput(*aOutput, theGridHeader, theReference);
     aOutputs.push_back(std::move(aOutput));
   }
   return aOutputs;
 }
 
-// The pass over the output lines: inputs read (or resampled), features
-// computed into the outputs' line buffers, lines written.
-void fdfWriteFeatureLines(CInputRows &theSource, CTemporalSeries &theSeries, int32_t theLines, int32_t thePixels,
-                          size_t theInputs, std::vector<std::unique_ptr<SOpenOutput>> &theOpen) {
-  STemporalLines aOutputLines;
-  for (auto &aOutput : theOpen) {
-    if (sOutputs[aOutput->mFeature].mDate)
-      aOutputLines.mDate[aOutput->mFeature - CTLRX_TF_DATE_MAX] = aOutput->mDates.data();
+// The pass over the output lines in bands: inputs read (or resampled) on
+// this thread, features computed into the band's output lines in parallel,
+// lines written in order.
+void fdfWriteFeatureLines(CInputRows &theSource, const CTemporalSeries &theSeries, int32_t theLines,
+                          int32_t thePixels, size_t theInputs, std::vector<std::unique_ptr<SOpenOutput>> &theOpen) {
+  const SLineBands aBands = fdfLineBands(theLines, CTLRX_TF_BLOCK_LINES);
+  CBandLines<double> aRows(aBands, static_cast<int32_t>(theInputs) * thePixels);
+  // One band of lines per output: values as floats, dates as integers.
+  std::vector<CBandLines<float>> aValueBands(CTLRX_TF_VALUE_COUNT, CBandLines<float>(SLineBands{}, 0));
+  std::vector<CBandLines<int32_t>> aDateBands(2, CBandLines<int32_t>(SLineBands{}, 0));
+  for (const auto &aOutput : theOpen) {
+    const int aFeature = aOutput->mFeature;
+    if (sOutputs[aFeature].mDate)
+      aDateBands[aFeature - CTLRX_TF_DATE_MAX] = CBandLines<int32_t>(aBands, thePixels);
     else
-      aOutputLines.mValue[aOutput->mFeature] = aOutput->mValues.data();
+      aValueBands[aFeature] = CBandLines<float>(aBands, thePixels);
   }
-  std::vector<double> aRows(theInputs * static_cast<size_t>(thePixels));
+  auto aLinesAt = [&](int32_t theLine) {
+    STemporalLines aLines;
+    for (const auto &aOutput : theOpen) {
+      const int aFeature = aOutput->mFeature;
+      if (sOutputs[aFeature].mDate)
+        aLines.mDate[aFeature - CTLRX_TF_DATE_MAX] = aDateBands[aFeature - CTLRX_TF_DATE_MAX].line(theLine);
+      else
+        aLines.mValue[aFeature] = aValueBands[aFeature].line(theLine);
+    }
+    return aLines;
+  };
+  // Every thread reduces its pixels' series with a copy of its own.
+  std::vector<CTemporalSeries> aSeries(static_cast<size_t>(fdfThreadCount()), theSeries);
   CLineProgress aProgress(100.0);
-  for (int32_t l = 0; l < theLines; ++l) {
-    aProgress.update(l, theLines);
-    theSource.read(l, aRows.data());
-    theSeries.line(aRows.data(), thePixels, aOutputLines);
-    for (auto &aOutput : theOpen)
-      aOutput->mFile->file().putLine(l, aOutput->mDates.empty() ? static_cast<const void *>(aOutput->mValues.data())
-                                                        : static_cast<const void *>(aOutput->mDates.data()));
-  }
+  fdfRunLineBands(
+      aBands,
+      [&](int32_t theFirst, int32_t theCount) {
+        aRows.start(theFirst);
+        for (auto &aBand : aValueBands)
+          aBand.start(theFirst);
+        for (auto &aBand : aDateBands)
+          aBand.start(theFirst);
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          aProgress.update(l, theLines);
+          theSource.read(l, aRows.line(l));
+        }
+      },
+      [&](int32_t theFirst, int32_t theCount, int theThread) {
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+          aSeries[static_cast<size_t>(theThread)].line(aRows.line(l), thePixels, aLinesAt(l));
+      },
+      [&](int32_t theFirst, int32_t theCount) {
+        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          const STemporalLines aLines = aLinesAt(l);
+          for (const auto &aOutput : theOpen) {
+            const int aFeature = aOutput->mFeature;
+            aOutput->mFile->file().putLine(l, sOutputs[aFeature].mDate
+                                                  ? static_cast<const void *>(aLines.mDate[aFeature - CTLRX_TF_DATE_MAX])
+                                                  : static_cast<const void *>(aLines.mValue[aFeature]));
+          }
+        }
+      });
 }
 
 } // namespace
@@ -308,7 +343,7 @@ int32_t fdfTemporalFeatureExtraction(const STemporalRequest &theRequest) {
   fdfRemoveHeaderFiles(aGrid);
   aRun.forgetAll();
 
-  std::vector<std::unique_ptr<SOpenOutput>> aOutputs = fdfOpenOutputs(theRequest, aGridHeader, aPixels, aReference);
+  std::vector<std::unique_ptr<SOpenOutput>> aOutputs = fdfOpenOutputs(theRequest, aGridHeader, aReference);
   CTemporalSeries aSeries(aSettings, aDays, aSource->nulls());
   fdfWriteFeatureLines(*aSource, aSeries, aLines, aPixels, aNames.size(), aOutputs);
   aSource.reset();

@@ -7,6 +7,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <vector>
 
 // Upper bound of TELLURIX_THREADS.
 constexpr int CTLRX_MAX_THREADS = 256;
@@ -51,3 +52,19 @@ SLineBands fdfLineBands(int32_t theLines, int32_t theBlock, int32_t theBlocksPer
 // band's index times mBand is its slot in the caller's buffers.
 void fdfRunLineBands(const SLineBands &theBands, const TLRXLineRange &theRead, const TLRXLineBlock &theCompute,
                      const TLRXLineRange &theWrite);
+
+// The lines of the band in hand for one raster or result: line l of the
+// image at (l - first) * pixels. Workers write disjoint lines.
+template <typename T>
+class CBandLines {
+public:
+  CBandLines(const SLineBands &theBands, int32_t thePixels)
+      : mPixels(static_cast<size_t>(thePixels)), mValues(static_cast<size_t>(theBands.mBand) * mPixels) {}
+  void start(int32_t theFirst) { mFirst = theFirst; }
+  T *line(int32_t theLine) { return &mValues[static_cast<size_t>(theLine - mFirst) * mPixels]; }
+
+private:
+  size_t mPixels;
+  std::vector<T> mValues;
+  int32_t mFirst = 0;
+};
