@@ -16,6 +16,7 @@
 #include "tlrx_errors.h"
 #include "tlrx_generic_utility.h"
 #include "tlrx_header_numbers.h"
+#include "tlrx_platform.h"
 #include "tlrx_standard_header.h"
 
 static_assert(sizeof(off_t) >= 8, "raster files need 64-bit offsets");
@@ -387,6 +388,8 @@ void CRasterFile::openStream(const char *theFileName, int32_t theMode) {
   if (!mStreamBuffer)
     mStreamBuffer.reset(new char[CTLRX_RF_STREAM_BUFFER]);
   std::setvbuf(aFile, mStreamBuffer.get(), _IOFBF, CTLRX_RF_STREAM_BUFFER);
+  if (theMode == CTLRX_RF_OPEN_READ)
+    fdfAdviseSequentialRead(fileno(aFile));
 }
 
 void CRasterFile::adoptLayout(const CRasterFileParam &theParam, int32_t theMode) {

@@ -255,6 +255,11 @@ std::string fdfOwnCgroupDir() {
 
 } // namespace
 
+void fdfAdviseSequentialRead(int theDescriptor) {
+  if (theDescriptor >= 0)
+    posix_fadvise(theDescriptor, 0, 0, POSIX_FADV_SEQUENTIAL);
+}
+
 int fdfUsableCpuCount() {
   cpu_set_t aSet;
   CPU_ZERO(&aSet);

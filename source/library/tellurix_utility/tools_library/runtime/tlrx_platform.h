@@ -52,6 +52,10 @@ constexpr char CTLRX_PATH_SEPARATOR = '/';
 bool fdfSameFile(const std::string &theFirst, const std::string &theSecond);
 int fdfProcessId();
 
+// Tells the kernel theDescriptor will be read from start to end, so it reads
+// ahead further; a hint only, failures are ignored.
+void fdfAdviseSequentialRead(int theDescriptor);
+
 // CPUs this process may run on: its affinity mask, capped by the CPU quota of
 // its control group (cgroup v2 "cpu.max" or v1 "cpu.cfs_quota_us", rounded
 // up); at least 1.
