@@ -162,3 +162,14 @@ TEST_F(ThreadsTest, InterruptionMidWayEndsAsWithOneThread) {
     EXPECT_FALSE(tlrxFileExists(file("out.img.sml"))) << aThreads;
   }
 }
+
+// A thread count that is not one ends the run before any result exists.
+TEST_F(ThreadsTest, BadThreadCountIsRefusedBeforeAnyResult) {
+  const std::string aList = series("s", 2, 5, 4);
+  for (const char *aValue : {"0", "two", "300"}) {
+    resetWorking();
+    expectFailure(command("main_ratio#", {aList, file("r"), "0", "x", "NO", "0"}, aValue), 13, 783360,
+                  "TELLURIX_THREADS = \"" + std::string(aValue) + "\"");
+    EXPECT_FALSE(tlrxFileExists(file("r_rto"))) << aValue;
+  }
+}
