@@ -50,6 +50,8 @@ cat >>"$WORK/c_par.sml" <<XML
 <interferometric_processing>
 <DRangePoly><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">0.4</ValueDouble></VectorDouble></DRangePoly>
 <DAzimuthPoly><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">-0.3</ValueDouble></VectorDouble></DAzimuthPoly>
+<DRangePolyInv><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">-0.4</ValueDouble></VectorDouble></DRangePolyInv>
+<DAzimuthPolyInv><VectorDouble NumberOfElements = "1"><ValueDouble ID = "0">0.3</ValueDouble></VectorDouble></DAzimuthPolyInv>
 </interferometric_processing>
 </HEADER_INFO>
 XML

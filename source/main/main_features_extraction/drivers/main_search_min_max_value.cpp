@@ -99,7 +99,6 @@ int32_t fdfRunMinMax(const char *theArguments) {
     TLRX_RAISE(CTLRX_ERR_ARGUMENTS, aTokens[CTLRX_MINMAX_LIST].c_str());
   }
   const int32_t aInputs = static_cast<int32_t>(aNames.size());
-  const int32_t aBuffer = 4000 / (aInputs + 4);
 
   CDescription aValueHeader;
   fdfLoadInputHeader(aNames[0], aValueHeader);
@@ -129,7 +128,6 @@ int32_t fdfRunMinMax(const char *theArguments) {
   for (int32_t i = 0; i < aInputs; ++i) {
     aIn.push_back(std::make_unique<CRasterFile>());
     aIn[i]->open_read(aNames[i].c_str());
-    aIn[i]->setBuffer(aBuffer);
     aNulls.push_back(aIn[i]->getDummyVal());
     if (aIn[i]->getNrOfLinesPerImage() != aIn[0]->getNrOfLinesPerImage())
       TLRX_RAISE(CTLRX_ERR_LINES_DIFFER, aNames[i].c_str());
@@ -141,7 +139,6 @@ int32_t fdfRunMinMax(const char *theArguments) {
   std::vector<std::unique_ptr<CResultRaster>> aOut;
   for (int k = 0; k < 4; ++k) {
     aOut.push_back(std::make_unique<CResultRaster>(aResults[k], *aHeaders[k]));
-    aOut[k]->file().setBuffer(aBuffer);
   }
   const float aNull = static_cast<float>(aOut[0]->file().getDummyVal());
 
