@@ -3,6 +3,7 @@
 #include "normalize_images.h"
 #include "quick_and_dirty.h"
 #include "tlrx_header_expect.h"
+#include "tlrx_trace_test_support.h"
 #include "tlrx_window_step.h"
 #include "tlrx_window_step_support.h"
 
@@ -53,6 +54,50 @@ TEST_F(CorrelationStepTest, BothStepsMatchDirectWindowsWithNoDataOddAndEvenWindo
       expectMatches(aCoherence, refCoherence(aA, false, aB, true, aNorm, aWindow.first, aWindow.second, sNull), sNull,
                     "coherence " + aWhat);
     }
+}
+
+// 1, 2 and 3 threads write the same normalisation and coherence bytes and
+// trace the same counts, which are those of the direct windows: an odd image
+// of several bands with a last block cut short, windows of R odd and even.
+TEST_F(CorrelationStepTest, ThreadsWriteTheSameBytesAndCountsAsOneThread) {
+  STestImage aA = randomImage(467, 37, 4, 0.2, 6.0, {0, 40, 3000, 3001, 17000});
+  STestImage aB = randomImage(467, 37, 5, 0.2, 6.0, {1, 40, 9000, 17278});
+  // As the float rasters hold them: near g = 0 the square root magnifies any
+  // difference of the inputs some thousandfold.
+  for (STestImage *aImage : {&aA, &aB})
+    for (double &aValue : aImage->mValues)
+      aValue = static_cast<float>(aValue);
+  write("a", aA, "AMPLITUDE");
+  write("b", aB, "POWER");
+  for (const auto &aWindows : {std::vector<int>{5, 3, 7, 5}, std::vector<int>{4, 6, 6, 4}}) {
+    const std::string aWhat = std::to_string(aWindows[2]) + " x " + std::to_string(aWindows[3]);
+    std::vector<std::string> aTraces;
+    expectSameBytesForThreads(
+        [&] {
+          ASSERT_TRUE(tlrxStartTrace());
+          coherence("a", "b", aWindows[0], aWindows[1], aWindows[2], aWindows[3]);
+          aTraces.push_back(tlrxStopTrace(mDir.path()));
+        },
+        {file("norm"), file("coh")}, aWhat);
+    for (const std::string &aTrace : aTraces)
+      EXPECT_EQ(aTrace, aTraces[0]) << aWhat;
+    STestImage aNorm{467, 37, tlrxReadTestRaster(file("norm")), {}};
+    int64_t aNormCount = 0;
+    for (double aValue : aNorm.mValues) {
+      aNorm.mValid.push_back(aValue != sNormNull ? 1 : 0);
+      aNormCount += aValue != sNormNull ? 1 : 0;
+    }
+    const std::vector<double> aWant = refCoherence(aA, false, aB, true, aNorm, aWindows[2], aWindows[3], sNull);
+    expectMatches(tlrxReadTestRaster(file("coh")), aWant, sNull, aWhat);
+    const int64_t aComputed = std::count_if(aWant.begin(), aWant.end(), [](double v) { return v != sNull; });
+    const int64_t aAbove08 = std::count_if(aWant.begin(), aWant.end(), [](double v) { return v > 0.8; });
+    EXPECT_TRUE(tlrxContains(aTraces[0], "Number of significant value (no equal to -5 one) = " +
+                                             std::to_string(aNormCount)))
+        << aWhat;
+    EXPECT_TRUE(tlrxContains(aTraces[0], "Number  =" + std::to_string(aComputed) +
+                                             "\nNumber of  >0.8 =" + std::to_string(aAbove08) + "\n"))
+        << aWhat << "\n" << aTraces[0];
+  }
 }
 
 // Guards the one-sided no-data fault: squares summed over pixels missing
@@ -167,12 +212,18 @@ TEST_F(CorrelationStepTest, ComplexInputGivesItsPartsWithNoData) {
   aInput.open();
   const std::complex<double> aWant[2][3] = {{{1, 2}, {-1, -1}, {-1, 5}}, {{3, -4}, {0.5, 0.25}, {-1, -1}}};
   const int32_t aValid[2][3] = {{1, 0, 1}, {1, 1, 0}};
-  for (int l = 0; l < 2; ++l) {
-    aInput.readLine(l);
-    for (int j = 0; j < 3; ++j) {
-      EXPECT_EQ(aInput.mask()[j], aValid[l][j]) << l << ", " << j;
-      if (aValid[l][j] != 0)
-        EXPECT_EQ(aInput.cells()[j], aWant[l][j]) << l << ", " << j;
-    }
+  // The second band keeps line 1 of the first.
+  for (const std::pair<int, int> &aBand : {std::pair<int, int>{0, 2}, {1, 1}}) {
+    aInput.readBand(aBand.first, aBand.second);
+    for (int l = aBand.first; l < aBand.first + aBand.second; ++l)
+      for (int j = 0; j < 3; ++j) {
+        EXPECT_EQ(aInput.mask(l)[j], aValid[l][j]) << l << ", " << j;
+        if (aValid[l][j] != 0)
+          EXPECT_EQ(aInput.cells(l)[j], aWant[l][j]) << l << ", " << j;
+      }
   }
+  // A line outside the band held is the caller's fault, named.
+  std::string aMessage;
+  EXPECT_EQ(tlrxRaisedCode([&] { aInput.mask(0); }, &aMessage), 913920);
+  EXPECT_NE(aMessage.find("line 0 asked of the band of lines 1 .. 1"), std::string::npos) << aMessage;
 }

@@ -71,12 +71,37 @@ TEST_F(TextureStepTest, ErrorsAndTheirCodes) {
   EXPECT_FALSE(tlrxFileExists(aOut));
 }
 
-// The line loop sends progress, and the host's interruption stops it there.
+// The line loop sends progress, and the host's interruption stops it there,
+// whatever the threads.
 TEST_F(TextureStepTest, HostInterruptionDuringTheLinesStopsTheStep) {
   write("in", constantImage(50, 4, 1.0), "AMPLITUDE");
-  resetWorking("101");
-  EXPECT_EQ(raised(::texture, {file("in"), file("o"), "0", "3", "3"}), 326400);
-  resetWorking();
-  texture("in", 3, 3);
-  EXPECT_EQ(tlrxReadLines(working())[0], "97"); // 2 + int(97 x 49 / 50)
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    const CTestThreads aSetting(aThreads);
+    resetWorking("101");
+    EXPECT_EQ(raised(::texture, {file("in"), file("o"), "0", "3", "3"}), 326400) << aThreads;
+    EXPECT_FALSE(tlrxFileExists(file("o"))) << aThreads;
+    resetWorking();
+    texture("in", 3, 3);
+    EXPECT_EQ(tlrxReadLines(working())[0], "97") << aThreads; // 2 + int(97 x 49 / 50)
+  }
+}
+
+// 1, 2 and 3 threads write the same bytes: an odd image long enough for
+// several bands of blocks (a last one cut short) with no data, windows of R
+// odd, even and taller than a block of small windows; the values are those of
+// direct windows.
+TEST_F(TextureStepTest, ThreadsWriteTheSameBytesAsOneThread) {
+  STestImage aImage = randomImage(601, 37, 9, 0.5, 30.0, {0, 36, 37, 5000, 5001, 22236});
+  aImage.mValues[300 * 37 + 5] = std::numeric_limits<double>::quiet_NaN();
+  write("amp", aImage, "AMPLITUDE");
+  const std::pair<int, int> aWindows[] = {{5, 7}, {4, 3}, {67, 5}};
+  for (const auto &aWindow : aWindows) {
+    const std::string aWhat = std::to_string(aWindow.first) + " x " + std::to_string(aWindow.second);
+    const std::vector<std::string> aArgs = {file("amp"), file("tex"), "0", std::to_string(aWindow.first),
+                                            std::to_string(aWindow.second)};
+    expectSameBytesForThreads([&] { EXPECT_EQ(run(::texture, aArgs), 0); }, {file("tex")}, aWhat);
+    CTestThreads aSetting(3);
+    expectMatches(texture("amp", aWindow.first, aWindow.second),
+                  refTexture(aImage, false, aWindow.first, aWindow.second, sNull), sNull, aWhat);
+  }
 }

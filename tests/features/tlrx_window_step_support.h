@@ -3,11 +3,13 @@
 #pragma once
 
 #include "tlrx_command_test_support.h"
+#include "tlrx_slc_test_support.h"
 #include "tlrx_window_reference.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -52,4 +54,24 @@ inline void expectMatches(const std::vector<double> &theGot, const std::vector<d
     else
       EXPECT_NEAR(theGot[i], theWant[i], 2e-6 * std::max(1.0, std::fabs(theWant[i]))) << theWhat << " pixel " << i;
   }
+}
+
+// theRun under each of CTLRX_TEST_THREADS: the bytes of theFiles must be those
+// of one thread. Returns them (one thread's), for checks of their values.
+inline std::vector<std::string> expectSameBytesForThreads(const std::function<void()> &theRun,
+                                                          const std::vector<std::string> &theFiles,
+                                                          const std::string &theWhat) {
+  std::vector<std::string> aOne;
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    const CTestThreads aSetting(aThreads);
+    theRun();
+    for (size_t i = 0; i < theFiles.size(); ++i) {
+      const std::string aBytes = tlrxReadFile(theFiles[i]);
+      if (aThreads == 1)
+        aOne.push_back(aBytes);
+      else
+        EXPECT_TRUE(aBytes == aOne[i]) << theWhat << ": " << theFiles[i] << " with " << aThreads << " threads";
+    }
+  }
+  return aOne;
 }

@@ -79,6 +79,28 @@ std::vector<float> ringCoherence(SPair thePair, int theWr, int theWa, const std:
   return aOut;
 }
 
+// The coherence of pixel (l, j) summed directly over its Wr x Wa window of
+// restored products and powers; theNull on the border or where the window
+// holds a pixel marked in theBad.
+double directCoherence(const SPair &thePair, const std::vector<uint8_t> &theBad, int theWr, int theWa, int l, int j,
+                       double theNull) {
+  const int P = thePair.mPixels;
+  if (l < theWa / 2 || l >= thePair.mLines - theWa / 2 || j < theWr / 2 || j >= P - theWr / 2)
+    return theNull;
+  std::complex<double> aZ;
+  double aM = 0, aS = 0;
+  for (int k = l - theWa / 2; k < l - theWa / 2 + theWa; ++k)
+    for (int c = j - theWr / 2; c < j - theWr / 2 + theWr; ++c) {
+      const size_t i = size_t(k * P + c);
+      if (!theBad.empty() && theBad[i])
+        return theNull;
+      aZ += std::complex<double>(thePair.mZ[i]) * std::sqrt(double(thePair.mM[i]) * thePair.mS[i]);
+      aM += thePair.mM[i];
+      aS += thePair.mS[i];
+    }
+  return std::min(std::abs(aZ) / std::sqrt(aM * aS), 0.999);
+}
+
 // Mean of the values at the centres of disjoint windows (computed pixels:
 // ha .. L - ha - 1, hr .. P - hr - 1).
 double disjointMean(const std::vector<float> &theValues, int theLines, int thePixels, int theWr, int theWa) {
@@ -173,27 +195,14 @@ TEST(CoherenceMeasure, RunningSumsMatchDirectSumsAndTheEdgeRulesHold) {
   for (const auto &aWindow : {std::pair<int, int>{5, 5}, {4, 3}, {2, 6}}) {
     const int Wr = aWindow.first, Wa = aWindow.second;
     const std::vector<float> aG = ringCoherence(aPair, Wr, Wa, aBad);
+    // Computed columns run from hr to, not including, P - hr; lines likewise.
     for (int l = 0; l < L; ++l)
       for (int j = 0; j < P; ++j) {
-        const float aGot = aG[size_t(l * P + j)];
-        // Computed columns run from hr to, not including, P - hr; lines likewise.
-        if (l < Wa / 2 || l >= L - Wa / 2 || j < Wr / 2 || j >= P - Wr / 2) {
-          EXPECT_EQ(aGot, -1.0f) << Wr << "x" << Wa << " border " << l << "," << j;
-          continue;
-        }
-        std::complex<double> aZ;
-        double aM = 0, aS = 0;
-        bool aInvalid = false;
-        for (int k = l - Wa / 2; k < l - Wa / 2 + Wa; ++k)
-          for (int c = j - Wr / 2; c < j - Wr / 2 + Wr; ++c) {
-            const size_t i = size_t(k * P + c);
-            aInvalid = aInvalid || aBad[i];
-            aZ += std::complex<double>(aPair.mZ[i]) * std::sqrt(double(aPair.mM[i]) * aPair.mS[i]);
-            aM += aPair.mM[i];
-            aS += aPair.mS[i];
-          }
-        const double aWant = aInvalid ? -1.0 : std::min(std::abs(aZ) / std::sqrt(aM * aS), 0.999);
-        EXPECT_NEAR(aGot, aWant, 2e-6) << Wr << "x" << Wa << " at " << l << "," << j;
+        const double aWant = directCoherence(aPair, aBad, Wr, Wa, l, j, -1.0);
+        if (aWant == -1.0)
+          EXPECT_EQ(aG[size_t(l * P + j)], -1.0f) << Wr << "x" << Wa << " null " << l << "," << j;
+        else
+          EXPECT_NEAR(aG[size_t(l * P + j)], aWant, 2e-6) << Wr << "x" << Wa << " at " << l << "," << j;
       }
   }
   SPair aSame = whitePair(9, 12, 1.0, 5); // an image with itself: constant phase, equal powers
@@ -307,4 +316,73 @@ TEST_F(CoherenceStep, FailuresRaiseTheirCodesAndTheClosingRemovesTheInputs) {
   run(p, "o", {"5"}, tlrx_cc_ave_close);
   for (const char *aSuffix : {"_int", "_int.sml", "_mpwr", "_mpwr.sml", "_spwr", "_spwr.sml"})
     EXPECT_FALSE(tlrxFileExists(p + aSuffix)) << aSuffix;
+}
+
+// 1, 2 and 3 threads write the same bytes, both paths: an odd image of several
+// bands with a last block cut short, windows of R odd and even, the whole
+// image and a processing window off its corner. The plain path's values are
+// those of direct sums, across block boundaries included.
+TEST_F(CoherenceStep, ThreadsWriteTheSameBytesAsOneThread) {
+  const SPair aPair = whitePair(557, 23, 0.6, 7, [](int l, int p) { return 0.3 * p + 0.1 * l; });
+  const std::string aName = write("t", aPair);
+  STLRXTestRaster aAux;
+  aAux.mValues.assign(20, 0.0);
+  tlrxWriteTestRaster(mDir.file("aux"), aAux);
+  const std::vector<std::vector<std::string>> aCases = {
+      {"5", "5"},
+      {"3", "4"},
+      {"5", "6", "0", "0", "-", "2", "20", "3", "550"},
+      {"5", "5", "9", "9", mDir.file("aux")},
+      {"3", "4", "7", "10", mDir.file("aux"), "1", "21", "5", "556"},
+  };
+  for (const auto &aCase : aCases) {
+    std::string aWhat;
+    for (const std::string &aToken : aCase)
+      aWhat += aToken + " ";
+    std::vector<double> aOne;
+    std::string aBytes;
+    for (const int aThreads : CTLRX_TEST_THREADS) {
+      const CTestThreads aSetting(aThreads);
+      const std::vector<double> aOut = run(aName, "t_cc", aCase);
+      if (aThreads == 1) {
+        aOne = aOut;
+        aBytes = tlrxReadFile(mDir.file("t_cc"));
+      } else {
+        EXPECT_TRUE(tlrxReadFile(mDir.file("t_cc")) == aBytes) << aWhat << aThreads << " threads";
+      }
+    }
+    if (aCase.size() != 2)
+      continue;
+    const int Wr = std::stoi(aCase[0]), Wa = std::stoi(aCase[1]);
+    for (const int l : {0, 1, 2, 63, 64, 65, 66, 128, 129, 130, 195, 260, 554, 555, 556})
+      for (const int j : {0, 2, 3, 11, 20, 21}) {
+        const double aWant = directCoherence(aPair, {}, Wr, Wa, l, j, fdfGetDummyValue());
+        EXPECT_NEAR(aOne[size_t(l * 23 + j)], aWant, 2e-6) << aWhat << "at " << l << "," << j;
+      }
+  }
+}
+
+// The host's interruption stops the step with its code whatever the threads,
+// and no result is left.
+TEST_F(CoherenceStep, InterruptionStopsTheStepWhateverTheThreads) {
+  const std::string aName = write("i", whitePair(300, 9, 0.5, 3));
+  for (const int aThreads : CTLRX_TEST_THREADS) {
+    const CTestThreads aSetting(aThreads);
+    for (const std::vector<std::string> &aArgs :
+         {std::vector<std::string>{"5"}, std::vector<std::string>{"3", "3", "5", "5", aName + "_mpwr"}}) {
+      tlrxWriteFile(mDir.file("Process.working"), "101\nhost\n");
+      std::vector<std::string> aAll = {"tlrx_cc_ave", aName + "_int", aName + "_mpwr", aName + "_spwr",
+                                       mDir.file("i_cc")};
+      aAll.insert(aAll.end(), aArgs.begin(), aArgs.end());
+      int32_t aCode = 0;
+      try {
+        tlrxCallStep(tlrx_cc_ave, aAll);
+      } catch (const CErrorExceptionManager &aError) {
+        aCode = aError.mCode;
+      }
+      EXPECT_EQ(aCode, CTLRX_ERR_INTERRUPTED) << aThreads << " threads, " << aArgs.size() << " arguments";
+      EXPECT_FALSE(tlrxFileExists(mDir.file("i_cc"))) << aThreads;
+    }
+  }
+  tlrxWriteFile(mDir.file("Process.working"), "0\nhost\n");
 }

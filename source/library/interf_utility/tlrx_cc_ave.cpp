@@ -1,13 +1,12 @@
-// Coherence estimation (see tlrx_cc_ave.h). The inputs are read line by line
-// over the processing window; the plain path streams through the window ring
-// of tlrx_window_sums.h, the local-frequency path keeps the Fa lines of its
-// outer window.
+// Coherence estimation (see tlrx_cc_ave.h). The inputs are read in bands of
+// lines over the processing window and the bands' blocks of lines computed in
+// parallel: the plain path on the window rings of tlrx_window_sums.h, the
+// local-frequency path directly over the Fa lines of each outer window.
 #include "tlrx_cc_ave.h"
 
 #include <algorithm>
 #include <cmath>
 #include <complex>
-#include <deque>
 #include <string>
 #include <vector>
 
@@ -20,6 +19,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_step_common.h"
+#include "tlrx_threads.h"
 #include "tlrx_window_sums.h"
 
 namespace {
@@ -37,14 +37,12 @@ struct SCcArguments {
   int32_t mXmin = 0, mXmax = 0, mYmin = 0, mYmax = 0;
 };
 
-// One input over the processing window: a line of cells or values and the
-// raster's validity flags.
+// One input over the processing window.
 struct SCcInput {
   std::string mName;
   CDescription mHeader;
   CRasterFile mRaster;
   SNoData mNull;
-  std::vector<uint8_t> mValid;
 };
 
 void openInput(SCcInput &theInput, const char *theName) {
@@ -134,171 +132,259 @@ std::string slcName(const std::string &theName) {
   return (aCut == std::string::npos ? theName : theName.substr(0, aCut)) + "_slc";
 }
 
-// The three inputs over the processing window, one prepared line at a time.
-class CCcLines {
+// One input line over the processing window: as read, then prepared in place
+// (tlrx_coherence_measure.h), with its unit-phasor differences when the local
+// frequency is removed.
+struct SCcRow {
+  std::vector<TCell> mZ, mRange, mAzimuth;
+  std::vector<float> mM, mS, mRangeAngles, mAzimuthAngles;
+  std::vector<uint8_t> mZValid, mMValid, mSValid, mInvalid;
+};
+
+// The input lines a band needs. Lines the band before held too are kept; the
+// others are read on the calling thread, then prepared in parallel, each line
+// once (its differences need the line above prepared, so they come after).
+class CCcBand {
 public:
-  CCcLines(SCcInput &theZ, SCcInput &theM, SCcInput &theS, const SCcArguments &theArgs,
-           const SCoherenceInputs &theSwitches)
-      : mZ(theZ), mM(theM), mS(theS), mArgs(theArgs), mSwitches(theSwitches),
-        mPixels(theArgs.mXmax - theArgs.mXmin + 1) {
-    for (SCcInput *aInput : {&mZ, &mM, &mS})
-      aInput->mValid.resize(static_cast<size_t>(mPixels));
+  CCcBand(SCcInput &theZ, SCcInput &theM, SCcInput &theS, const SCcArguments &theArgs,
+          const SCoherenceInputs &theSwitches, bool theDifferences, int32_t theCapacity)
+      : mZ(theZ), mM(theM), mS(theS), mArgs(theArgs), mSwitches(theSwitches), mDifferences(theDifferences),
+        mPixels(theArgs.mXmax - theArgs.mXmin + 1), mRows(static_cast<size_t>(theCapacity)) {
+    const size_t n = static_cast<size_t>(mPixels), aDifferences = theDifferences ? n : 0;
+    for (SCcRow &aRow : mRows) {
+      aRow.mZ.resize(n);
+      aRow.mM.resize(n);
+      aRow.mS.resize(n);
+      for (auto *aFlags : {&aRow.mZValid, &aRow.mMValid, &aRow.mSValid, &aRow.mInvalid})
+        aFlags->resize(n);
+      aRow.mRange.resize(aDifferences);
+      aRow.mAzimuth.resize(aDifferences);
+      aRow.mRangeAngles.resize(aDifferences);
+      aRow.mAzimuthAngles.resize(aDifferences);
+    }
   }
   int32_t pixels() const { return mPixels; }
 
-  // Window line theLine (0 = ymin), prepared into the given buffers.
-  void read(int32_t theLine, TCell *theZ, float *theM, float *theS, uint8_t *theInvalid) {
-    const int32_t aRow = mArgs.mYmin + theLine;
-    mZ.mRaster.getComplexLine(theZ, aRow, mArgs.mXmin, mArgs.mXmax, mZ.mValid.data());
-    mM.mRaster.getLine(theM, aRow, mArgs.mXmin, mArgs.mXmax);
-    mS.mRaster.getLine(theS, aRow, mArgs.mXmin, mArgs.mXmax);
-    for (int32_t j = 0; j < mPixels; ++j) {
-      mM.mValid[j] = mM.mNull.isNull(theM[j]) ? 0 : 1;
-      mS.mValid[j] = mS.mNull.isNull(theS[j]) ? 0 : 1;
-    }
-    fdfCoherencePrepare(theZ, mZ.mValid.data(), theM, mM.mValid.data(), theS, mS.mValid.data(), mPixels, mSwitches,
-                        theInvalid);
+  // Line l sits in row l % rows: the lines the band before held stay put.
+  void hold(const SLineBand &theBand) {
+    const int32_t aHeldFirst = mFirst, aHeldEnd = mFirst + mCount;
+    const int32_t aRows = static_cast<int32_t>(mRows.size());
+    if (theBand.mInCount > aRows)
+      TLRX_RAISE_F(CTLRX_ERR_UNEXPECTED, "coherence band of %d lines, %d rows", theBand.mInCount, aRows);
+    mFirst = theBand.mInFirst;
+    mCount = 0; // nothing to read from while the band changes (a read may fail)
+    std::vector<int32_t> aNew;
+    for (int32_t aLine = theBand.mInFirst; aLine < theBand.mInFirst + theBand.mInCount; ++aLine)
+      if (aLine < aHeldFirst || aLine >= aHeldEnd) {
+        read(aLine, rowOf(aLine));
+        aNew.push_back(aLine);
+      }
+    mCount = theBand.mInCount;
+    const int64_t aCount = static_cast<int64_t>(aNew.size());
+    fdfParallelFor(aCount, [&](int64_t i, int) { prepare(rowOf(aNew[static_cast<size_t>(i)])); });
+    if (!mDifferences)
+      return;
+    // The first line of a band below line 0 is there only as the line above
+    // the next one: no window of the band holds it.
+    fdfParallelFor(aCount, [&](int64_t i, int) {
+      const int32_t aLine = aNew[static_cast<size_t>(i)];
+      if (aLine == mFirst && aLine > 0)
+        return;
+      SCcRow &aRow = rowOf(aLine);
+      const TCell *aAbove = aLine > 0 ? rowOf(aLine - 1).mZ.data() : nullptr;
+      fdfPhaseDifferences(aRow.mZ.data(), aAbove, mPixels, aRow.mRange.data(), aRow.mRangeAngles.data(),
+                          aRow.mAzimuth.data(), aRow.mAzimuthAngles.data());
+    });
+  }
+
+  // Window line theLine (0 = ymin) of the band held.
+  const SCcRow &row(int32_t theLine) const {
+    if (theLine < mFirst || theLine >= mFirst + mCount)
+      TLRX_RAISE_F(CTLRX_ERR_UNEXPECTED, "coherence line %d asked of the band of lines %d .. %d", theLine, mFirst,
+                   mFirst + mCount - 1);
+    return mRows[static_cast<size_t>(theLine) % mRows.size()];
   }
 
 private:
+  SCcRow &rowOf(int32_t theLine) { return mRows[static_cast<size_t>(theLine) % mRows.size()]; }
+
+  void read(int32_t theLine, SCcRow &theRow) {
+    const int32_t aRow = mArgs.mYmin + theLine;
+    mZ.mRaster.getComplexLine(theRow.mZ.data(), aRow, mArgs.mXmin, mArgs.mXmax, theRow.mZValid.data());
+    mM.mRaster.getLine(theRow.mM.data(), aRow, mArgs.mXmin, mArgs.mXmax);
+    mS.mRaster.getLine(theRow.mS.data(), aRow, mArgs.mXmin, mArgs.mXmax);
+  }
+
+  void prepare(SCcRow &theRow) const {
+    for (int32_t j = 0; j < mPixels; ++j) {
+      theRow.mMValid[static_cast<size_t>(j)] = mM.mNull.isNull(theRow.mM[static_cast<size_t>(j)]) ? 0 : 1;
+      theRow.mSValid[static_cast<size_t>(j)] = mS.mNull.isNull(theRow.mS[static_cast<size_t>(j)]) ? 0 : 1;
+    }
+    fdfCoherencePrepare(theRow.mZ.data(), theRow.mZValid.data(), theRow.mM.data(), theRow.mMValid.data(),
+                        theRow.mS.data(), theRow.mSValid.data(), mPixels, mSwitches, theRow.mInvalid.data());
+  }
+
   SCcInput &mZ, &mM, &mS;
   const SCcArguments &mArgs;
   SCoherenceInputs mSwitches;
+  bool mDifferences;
   int32_t mPixels;
+  std::vector<SCcRow> mRows;
+  int32_t mFirst = 0;
+  int32_t mCount = 0;
 };
 
-// Plain path: running sums through the window ring.
-void runPlain(CCcLines &theLines, int32_t theLineCount, const SCcArguments &theArgs, float theNull,
-              CResultRaster &theOut) {
-  const SWindowShape aShape{theArgs.mWa, theArgs.mWr, ETLRXWindowBorder::kNull};
-  const int32_t aPixels = theLines.pixels();
-  CWindowRing aRing(aShape, theLineCount, aPixels, CTLRX_COHERENCE_CHANNELS);
-  const std::vector<double *> aTerms = aRing.termArrays();
-  const std::vector<const double *> aSums = aRing.columnArrays();
-  std::vector<TCell> aZ(static_cast<size_t>(aPixels));
-  std::vector<float> aM(static_cast<size_t>(aPixels)), aS(static_cast<size_t>(aPixels)),
-      aOut(static_cast<size_t>(aPixels));
-  std::vector<uint8_t> aInvalid(static_cast<size_t>(aPixels));
-  CLineProgress aProgress(97.0, 1);
-  fdfRunWindowSchedule(
-      aRing,
-      [&](int32_t theLine) {
-        theLines.read(theLine, aZ.data(), aM.data(), aS.data(), aInvalid.data());
-        fdfCoherenceTerms(aZ.data(), aM.data(), aS.data(), aInvalid.data(), aPixels, aTerms.data(),
-                          aRing.centre(theLine));
-      },
-      [&](int32_t theLine) {
-        fdfCoherenceLine(aSums.data(), aRing.centre(theLine), aPixels, theNull, aOut.data());
-        theOut.file().putLine(theLine, aOut.data());
-      },
-      [&](int32_t theLine, int32_t theCount) { aProgress.update(theLine, theCount); });
-}
-
-// Local-frequency path: the Fa lines of the outer window, their unit-phasor
-// differences, and direct sums of z e^(-i psi) over the central window.
-class CLocalPath {
+// Both paths stream the lines in bands: the calling thread tells progress for
+// every line and reads the band, blocks of lines are computed in parallel into
+// the band's output, which the calling thread writes in order.
+class CCcOutput {
 public:
-  CLocalPath(CCcLines &theLines, int32_t theLineCount, const SCcArguments &theArgs, float theNull)
-      : mLines(theLines), mLineCount(theLineCount), mArgs(theArgs), mNull(theNull), mPixels(theLines.pixels()) {}
+  CCcOutput(CResultRaster &theOut, int32_t theLines, int32_t thePixels, int32_t theBandLines)
+      : mOut(theOut), mLines(theLines), mPixels(static_cast<size_t>(thePixels)),
+        mValues(static_cast<size_t>(theBandLines) * mPixels) {}
 
-  void run(CResultRaster &theOut) {
-    const int32_t aAbove = mArgs.mFa / 2, aLeft = mArgs.mFr / 2;
-    const int32_t aOffsetLines = (mArgs.mFa - mArgs.mWa) / 2, aOffsetColumns = (mArgs.mFr - mArgs.mWr) / 2;
-    std::vector<float> aOut(static_cast<size_t>(mPixels));
-    CLineProgress aProgress(97.0, 1);
-    int32_t aNext = 0;
-    for (int32_t l = 0; l < mLineCount; ++l) {
-      aProgress.update(l, mLineCount);
-      const int32_t aFirst = l - aAbove, aLast = aFirst + mArgs.mFa - 1;
-      std::fill(aOut.begin(), aOut.end(), mNull);
-      if (aFirst >= 0 && aLast < mLineCount) {
-        for (; aNext <= aLast; ++aNext)
-          enter(aNext);
-        for (int32_t j = aLeft; j - aLeft + mArgs.mFr - 1 < mPixels; ++j)
-          aOut[static_cast<size_t>(j)] = pixel(aFirst, j - aLeft, aOffsetLines, aOffsetColumns);
-      }
-      theOut.file().putLine(l, aOut.data());
-    }
+  void start(const SLineBand &theBand) {
+    for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
+      mProgress.update(l, mLines);
+    mFirst = theBand.mFirst;
+  }
+  float *line(int32_t theLine) { return &mValues[static_cast<size_t>(theLine - mFirst) * mPixels]; }
+  void write(const SLineBand &theBand) {
+    for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
+      mOut.file().putLine(l, line(l));
   }
 
 private:
-  struct SLine {
-    std::vector<TCell> mZ, mRange, mAzimuth;
-    std::vector<float> mM, mS, mRangeAngles, mAzimuthAngles;
-    std::vector<uint8_t> mInvalid;
+  CResultRaster &mOut;
+  int32_t mLines;
+  size_t mPixels;
+  std::vector<float> mValues;
+  CLineProgress mProgress{97.0, 1};
+  int32_t mFirst = 0;
+};
+
+// Plain path: running sums through the window rings.
+void runPlain(SCcInput &theZ, SCcInput &theM, SCcInput &theS, const SCoherenceInputs &theSwitches,
+              int32_t theLineCount, const SCcArguments &theArgs, float theNull, CResultRaster &theOut) {
+  const SWindowShape aShape{theArgs.mWa, theArgs.mWr, ETLRXWindowBorder::kNull};
+  const int32_t aPixels = theArgs.mXmax - theArgs.mXmin + 1;
+  CWindowBands aBands(aShape, theLineCount, aPixels, CTLRX_COHERENCE_CHANNELS, fdfThreadCount(), fdfParallelFor);
+  CCcBand aInput(theZ, theM, theS, theArgs, theSwitches, false, aBands.plan().bandInputLines());
+  CCcOutput aOutput(theOut, theLineCount, aPixels, aBands.plan().mBand);
+  aBands.run(
+      [&](const SLineBand &theBand) {
+        aOutput.start(theBand);
+        aInput.hold(theBand);
+      },
+      [&](CWindowRing &theRing, int32_t theLine, int) {
+        const SCcRow &aRow = aInput.row(theLine);
+        fdfCoherenceTerms(aRow.mZ.data(), aRow.mM.data(), aRow.mS.data(), aRow.mInvalid.data(), aPixels,
+                          theRing.termArrays().data(), theRing.centre(theLine));
+      },
+      [&](CWindowRing &theRing, int32_t theLine, int) {
+        fdfCoherenceLine(theRing.columnArrays().data(), theRing.centre(theLine), aPixels, theNull,
+                         aOutput.line(theLine));
+      },
+      [&](const SLineBand &theBand) { aOutput.write(theBand); });
+}
+
+// Lines of a block of the local-frequency path: its pixels are independent,
+// so the block length only sets the grain of the work.
+constexpr int32_t CTLRX_CC_LOCAL_BLOCK = 16;
+
+// Local-frequency path: the Fa lines of the outer window (and the line above
+// it, for the azimuth differences), and direct sums of z e^(-i psi) over the
+// central window.
+class CLocalPath {
+public:
+  CLocalPath(SCcInput &theZ, SCcInput &theM, SCcInput &theS, const SCoherenceInputs &theSwitches,
+             int32_t theLineCount, const SCcArguments &theArgs, float theNull)
+      : mLineCount(theLineCount), mArgs(theArgs), mNull(theNull), mPixels(theArgs.mXmax - theArgs.mXmin + 1),
+        mPlan(fdfBandPlan(theLineCount, CTLRX_CC_LOCAL_BLOCK, fdfThreadCount(), fdfThreadCount() > 1 ? 2 : 1,
+                          theArgs.mFa / 2 + 1, theArgs.mFa - 1 - theArgs.mFa / 2)),
+        mInput(theZ, theM, theS, theArgs, theSwitches, true, mPlan.bandInputLines()),
+        mScratch(static_cast<size_t>(fdfThreadCount())) {}
+
+  void run(CResultRaster &theOut) {
+    CCcOutput aOutput(theOut, mLineCount, mPixels, mPlan.mBand);
+    fdfRunBands(
+        mPlan, fdfParallelFor,
+        [&](const SLineBand &theBand) {
+          aOutput.start(theBand);
+          mInput.hold(theBand);
+        },
+        [&](int32_t theFirst, int32_t theCount, int theThread) {
+          for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+            line(l, mScratch.at(static_cast<size_t>(theThread)), aOutput.line(l));
+        },
+        [&](const SLineBand &theBand) { aOutput.write(theBand); });
+  }
+
+private:
+  // The line arrays of one pixel's outer window, per thread.
+  struct SScratch {
+    std::vector<const TCell *> mRangeDiffs, mAzimuthDiffs;
+    std::vector<const float *> mRangeAngles, mAzimuthAngles;
   };
 
-  void enter(int32_t theLine) {
-    SLine aLine;
-    if (static_cast<int32_t>(mRing.size()) == mArgs.mFa) {
-      aLine = std::move(mRing.front());
-      mRing.pop_front();
-      ++mFirst;
+  void line(int32_t theLine, SScratch &theScratch, float *theOut) const {
+    const int32_t aLeft = mArgs.mFr / 2;
+    const int32_t aOffsetLines = (mArgs.mFa - mArgs.mWa) / 2, aOffsetColumns = (mArgs.mFr - mArgs.mWr) / 2;
+    const int32_t aFirst = theLine - mArgs.mFa / 2, aLast = aFirst + mArgs.mFa - 1;
+    std::fill(theOut, theOut + mPixels, mNull);
+    if (aFirst < 0 || aLast >= mLineCount)
+      return;
+    theScratch.mRangeDiffs.clear();
+    theScratch.mAzimuthDiffs.clear();
+    theScratch.mRangeAngles.clear();
+    theScratch.mAzimuthAngles.clear();
+    for (int32_t k = 0; k < mArgs.mFa; ++k) {
+      const SCcRow &aRow = mInput.row(aFirst + k);
+      theScratch.mRangeDiffs.push_back(aRow.mRange.data());
+      theScratch.mAzimuthDiffs.push_back(aRow.mAzimuth.data());
+      theScratch.mRangeAngles.push_back(aRow.mRangeAngles.data());
+      theScratch.mAzimuthAngles.push_back(aRow.mAzimuthAngles.data());
     }
-    const size_t n = static_cast<size_t>(mPixels);
-    for (auto *aCells : {&aLine.mZ, &aLine.mRange, &aLine.mAzimuth})
-      aCells->resize(n);
-    for (auto *aValues : {&aLine.mM, &aLine.mS, &aLine.mRangeAngles, &aLine.mAzimuthAngles})
-      aValues->resize(n);
-    aLine.mInvalid.resize(n);
-    mLines.read(theLine, aLine.mZ.data(), aLine.mM.data(), aLine.mS.data(), aLine.mInvalid.data());
-    const TCell *aPrevious = theLine > 0 ? mPrevious.data() : nullptr;
-    fdfPhaseDifferences(aLine.mZ.data(), aPrevious, mPixels, aLine.mRange.data(), aLine.mRangeAngles.data(),
-                        aLine.mAzimuth.data(), aLine.mAzimuthAngles.data());
-    mPrevious = aLine.mZ;
-    if (mRing.empty())
-      mFirst = theLine;
-    mRing.push_back(std::move(aLine));
+    for (int32_t j = aLeft; j - aLeft + mArgs.mFr - 1 < mPixels; ++j)
+      theOut[j] = pixel(theScratch, aFirst, j - aLeft, aOffsetLines, aOffsetColumns);
   }
 
   // The coherence of the pixel whose outer window starts at line theLine,
   // column theColumn.
-  float pixel(int32_t theLine, int32_t theColumn, int32_t theOffsetLines, int32_t theOffsetColumns) {
-    mRangeDiffs.clear();
-    mAzimuthDiffs.clear();
-    mRangeAngles.clear();
-    mAzimuthAngles.clear();
-    for (int32_t k = 0; k < mArgs.mFa; ++k) {
-      const SLine &aLine = mRing[static_cast<size_t>(theLine + k - mFirst)];
-      mRangeDiffs.push_back(aLine.mRange.data());
-      mAzimuthDiffs.push_back(aLine.mAzimuth.data());
-      mRangeAngles.push_back(aLine.mRangeAngles.data());
-      mAzimuthAngles.push_back(aLine.mAzimuthAngles.data());
-    }
+  float pixel(const SScratch &theScratch, int32_t theLine, int32_t theColumn, int32_t theOffsetLines,
+              int32_t theOffsetColumns) const {
     double aFr = 0.0, aFa = 0.0;
-    if (!fdfLocalFrequency({mRangeDiffs.data(), mRangeAngles.data()}, {mAzimuthDiffs.data(), mAzimuthAngles.data()},
-                           theColumn, mArgs.mFr, mArgs.mFa, aFr, aFa))
+    if (!fdfLocalFrequency({theScratch.mRangeDiffs.data(), theScratch.mRangeAngles.data()},
+                           {theScratch.mAzimuthDiffs.data(), theScratch.mAzimuthAngles.data()}, theColumn, mArgs.mFr,
+                           mArgs.mFa, aFr, aFa))
       return mNull;
     double aM = 0.0, aS = 0.0, aRe = 0.0, aIm = 0.0;
     const std::complex<double> aStep = std::polar(1.0, -aFr);
     for (int32_t k = 0; k < mArgs.mWa; ++k) {
-      const SLine &aLine = mRing[static_cast<size_t>(theLine + theOffsetLines + k - mFirst)];
+      const SCcRow &aRow = mInput.row(theLine + theOffsetLines + k);
       // psi starts at k fa on window line k and grows by fr before each column.
       std::complex<double> aTurn = std::polar(1.0, -k * aFa);
       for (int32_t c = theColumn + theOffsetColumns; c < theColumn + theOffsetColumns + mArgs.mWr; ++c) {
-        if (aLine.mInvalid[static_cast<size_t>(c)] != 0)
+        if (aRow.mInvalid[static_cast<size_t>(c)] != 0)
           return mNull;
         aTurn *= aStep;
-        const std::complex<double> z = std::complex<double>(aLine.mZ[static_cast<size_t>(c)]) * aTurn;
+        const std::complex<double> z = std::complex<double>(aRow.mZ[static_cast<size_t>(c)]) * aTurn;
         aRe += z.real();
         aIm += z.imag();
-        aM += aLine.mM[static_cast<size_t>(c)];
-        aS += aLine.mS[static_cast<size_t>(c)];
+        aM += aRow.mM[static_cast<size_t>(c)];
+        aS += aRow.mS[static_cast<size_t>(c)];
       }
     }
     return fdfCoherenceValue(aM, aS, aRe, aIm, mNull);
   }
 
-  CCcLines &mLines;
   int32_t mLineCount;
   const SCcArguments &mArgs;
   float mNull;
   int32_t mPixels;
-  std::deque<SLine> mRing;
-  int32_t mFirst = 0;
-  std::vector<TCell> mPrevious;
-  std::vector<const TCell *> mRangeDiffs, mAzimuthDiffs;
-  std::vector<const float *> mRangeAngles, mAzimuthAngles;
+  SBandPlan mPlan;
+  CCcBand mInput;
+  std::vector<SScratch> mScratch;
 };
 
 } // namespace
@@ -362,11 +448,10 @@ int tlrx_cc_ave(int argc, char **argv) {
   fdfSetHeaderNumber(aHeader, "RasterInfo.NrOfPixelsPerLine", aOutPixels);
   fdfSetHeaderList(aHeader, "RasterInfo.FilesList", {slcName(aM.mName), slcName(aS.mName)});
   CResultRaster aOut(argv[4], aHeader);
-  CCcLines aInputLines(aZ, aM, aS, aArgs, aSwitches);
   if (aArgs.mLocal)
-    CLocalPath(aInputLines, aOutLines, aArgs, aNull).run(aOut);
+    CLocalPath(aZ, aM, aS, aSwitches, aOutLines, aArgs, aNull).run(aOut);
   else
-    runPlain(aInputLines, aOutLines, aArgs, aNull, aOut);
+    runPlain(aZ, aM, aS, aSwitches, aOutLines, aArgs, aNull, aOut);
   for (SCcInput *aInput : {&aZ, &aM, &aS})
     aInput->mRaster.close();
   fdfTraceMessage("\noutput lines:%d\n", aOutLines);

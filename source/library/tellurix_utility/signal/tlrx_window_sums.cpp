@@ -1,6 +1,8 @@
 #include "tlrx_window_sums.h"
 
 #include <algorithm>
+#include <stdexcept>
+#include <string>
 
 namespace {
 
@@ -68,20 +70,11 @@ CWindowRing::CWindowRing(const SWindowShape &theShape, int32_t theLines, int32_t
       mSlots(static_cast<size_t>(theShape.mRows) * theChannels * mPixels, 0.0),
       mSlotNonZero(mSlots.size(), 0), mCentre(static_cast<size_t>(theShape.mRows) * mPixels, 0),
       mColumns(static_cast<size_t>(theChannels) * mPixels, 0.0), mColumnNonZero(mColumns.size(), 0),
-      mTerms(mColumns.size(), 0.0) {}
-
-std::vector<double *> CWindowRing::termArrays() {
-  std::vector<double *> aArrays;
-  for (int c = 0; c < mChannels; ++c)
-    aArrays.push_back(terms(c));
-  return aArrays;
-}
-
-std::vector<const double *> CWindowRing::columnArrays() const {
-  std::vector<const double *> aArrays;
-  for (int c = 0; c < mChannels; ++c)
-    aArrays.push_back(column(c));
-  return aArrays;
+      mTerms(mColumns.size(), 0.0) {
+  for (int c = 0; c < mChannels; ++c) {
+    mTermArrays.push_back(terms(c));
+    mColumnArrays.push_back(column(c));
+  }
 }
 
 void CWindowRing::storeLine(int32_t theLine) {
@@ -138,16 +131,25 @@ void CWindowRing::recompute(int32_t theFirst, int32_t theLast) {
 // to l, line l + below - R leaves and line l + below enters. Both map to the
 // same slot, so the leaving line is subtracted before the entering one is
 // loaded. At lines that are multiples of R the accumulators are recomputed
-// from the slots of the window instead, in line order.
-void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &theLoad, const TLRXWindowEmit &theEmit,
-                          const TLRXWindowProgress &theProgress) {
+// from the slots of the window instead, in line order: they then depend on
+// the slots alone, which is why a run may start afresh there.
+void fdfRunWindowLines(CWindowRing &theRing, int32_t theFirst, int32_t theEnd, const TLRXWindowLoad &theLoad,
+                       const TLRXWindowEmit &theEmit) {
   const int32_t aRows = theRing.shape().mRows;
   const int32_t aBelow = theRing.shape().below();
   const int32_t aLines = theRing.lines();
-  int32_t aNextLoad = 0;
-  for (int32_t l = 0; l < aLines; ++l) {
-    if (theProgress)
-      theProgress(l, aLines);
+  const bool aContinues = theFirst == theRing.mNextLine;
+  if (theFirst < 0 || theEnd < theFirst || theEnd > aLines || (!aContinues && theFirst % aRows != 0))
+    throw std::invalid_argument("window lines " + std::to_string(theFirst) + " .. " + std::to_string(theEnd) +
+                                " of " + std::to_string(aLines) + ": a run starts at a multiple of " +
+                                std::to_string(aRows) + " or where the last one ended (" +
+                                std::to_string(theRing.mNextLine) + ")");
+  if (!aContinues)
+    theRing.mNextLoad = std::max(0, theFirst + aBelow - aRows + 1);
+  // A run that fails leaves the ring to be started afresh.
+  theRing.mNextLine = -1;
+  int32_t aNextLoad = theRing.mNextLoad;
+  for (int32_t l = theFirst; l < theEnd; ++l) {
     const bool aRecompute = l % aRows == 0;
     const int32_t aLeaving = l + aBelow - aRows;
     if (!aRecompute && aLeaving >= 0)
@@ -163,4 +165,73 @@ void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &theLoad, c
       theRing.recompute(std::max(0, aLeaving + 1), aLastInWindow);
     theEmit(l);
   }
+  theRing.mNextLoad = aNextLoad;
+  theRing.mNextLine = theEnd;
+}
+
+SBandPlan fdfBandPlan(int32_t theLines, int32_t theBlock, int theThreads, int theBlocksPerThread, int32_t theAbove,
+                      int32_t theBelow) {
+  SBandPlan aPlan;
+  aPlan.mLines = std::max(0, theLines);
+  aPlan.mBlock = std::max(1, theBlock);
+  aPlan.mAbove = std::max(0, theAbove);
+  aPlan.mBelow = std::max(0, theBelow);
+  const int64_t aBand = int64_t(aPlan.mBlock) * std::max(1, theBlocksPerThread) * std::max(1, theThreads);
+  const int64_t aImage = (int64_t(aPlan.mLines) + aPlan.mBlock - 1) / aPlan.mBlock * aPlan.mBlock;
+  aPlan.mBand = static_cast<int32_t>(std::max<int64_t>(aPlan.mBlock, std::min(aBand, aImage)));
+  return aPlan;
+}
+
+void fdfRunBands(const SBandPlan &thePlan, const TLRXParallelFor &theParallelFor, const TLRXBandStep &theRead,
+                 const TLRXBlockStep &theCompute, const TLRXBandStep &theWrite) {
+  for (int32_t aFirst = 0; aFirst < thePlan.mLines; aFirst += thePlan.mBand) {
+    SLineBand aBand;
+    aBand.mFirst = aFirst;
+    aBand.mCount = std::min(thePlan.mBand, thePlan.mLines - aFirst);
+    aBand.mInFirst = std::max(0, aFirst - thePlan.mAbove);
+    aBand.mInCount = std::min(thePlan.mLines, aFirst + aBand.mCount + thePlan.mBelow) - aBand.mInFirst;
+    theRead(aBand);
+    const int64_t aBlocks = (aBand.mCount + thePlan.mBlock - 1) / thePlan.mBlock;
+    theParallelFor(aBlocks, [&](int64_t theBlock, int theThread) {
+      const int32_t aStart = aFirst + static_cast<int32_t>(theBlock) * thePlan.mBlock;
+      theCompute(aStart, std::min(thePlan.mBlock, aFirst + aBand.mCount - aStart), theThread);
+    });
+    theWrite(aBand);
+  }
+}
+
+int32_t fdfWindowBlockLines(const SWindowShape &theShape) {
+  const int32_t aRows = std::max(1, theShape.mRows);
+  return aRows * std::max(4, (64 + aRows - 1) / aRows);
+}
+
+// Several threads: blocks of fdfWindowBlockLines, one per thread in a band,
+// which keeps the band buffers of a correlation (three inputs) of 4096 pixels
+// near 25 MB for two threads. One thread: the whole image is one run of its
+// ring from line 0 (the reference the blocks equal), read in bands of R lines
+// so that a line is still in cache when it is used.
+CWindowBands::CWindowBands(const SWindowShape &theShape, int32_t theLines, int32_t thePixels, int theChannels,
+                           int theThreads, TLRXParallelFor theParallelFor)
+    : mShape(theShape), mPixels(thePixels), mChannels(theChannels), mParallelFor(std::move(theParallelFor)),
+      mRings(static_cast<size_t>(std::max(1, theThreads))) {
+  const int32_t aBelow = theShape.below(), aAbove = theShape.mRows - 1 - aBelow;
+  const int32_t aBlock = fdfWindowBlockLines(theShape);
+  mPlan = theThreads > 1 ? fdfBandPlan(theLines, aBlock, theThreads, 1, aAbove, aBelow)
+                         : fdfBandPlan(theLines, theShape.mRows, 1, 1, aAbove, aBelow);
+}
+
+void CWindowBands::run(const TLRXBandStep &theRead, const TLRXRingLine &theLoad, const TLRXRingLine &theEmit,
+                       const TLRXBandStep &theWrite) {
+  fdfRunBands(
+      mPlan, mParallelFor, theRead,
+      [&](int32_t theFirst, int32_t theCount, int theThread) {
+        std::unique_ptr<CWindowRing> &aRing = mRings.at(static_cast<size_t>(theThread));
+        if (!aRing)
+          aRing = std::make_unique<CWindowRing>(mShape, mPlan.mLines, mPixels, mChannels);
+        CWindowRing &aOwn = *aRing;
+        fdfRunWindowLines(
+            aOwn, theFirst, theFirst + theCount, [&](int32_t theLine) { theLoad(aOwn, theLine, theThread); },
+            [&](int32_t theLine) { theEmit(aOwn, theLine, theThread); });
+      },
+      theWrite);
 }

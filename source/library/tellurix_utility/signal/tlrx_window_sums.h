@@ -33,10 +33,18 @@
 // block of lines or columns starts. The cost per pixel stays independent of
 // the window size (one recomputation of cost K per K columns, of R line slots
 // per R lines). Sums are double precision.
+//
+// Threads: a run of output lines that starts at a multiple of R needs nothing
+// from the lines before it but the input lines its first window holds, so
+// blocks of lines starting at multiples of R can run on rings of their own and
+// give, bit for bit, what one ring running from line 0 gives. The band runner
+// below streams an image so: bands of lines read and written by the caller,
+// blocks of a band computed in parallel.
 #pragma once
 
 #include <cstdint>
 #include <functional>
+#include <memory>
 #include <vector>
 
 // How the window meets the image edges (see above).
@@ -66,6 +74,16 @@ struct SWindowShape {
 void fdfRowWindowSum(const double *theTerms, int32_t thePixels, int32_t theLeft, int32_t theWidth, double *theSums,
                      int32_t *theNonZero);
 
+// Fills the ring's scratch terms and the centre flags of input line theLine.
+using TLRXWindowLoad = std::function<void(int32_t theLine)>;
+// Produces output line theLine from the accumulators and its centre flags.
+using TLRXWindowEmit = std::function<void(int32_t theLine)>;
+
+class CWindowRing;
+// The line schedule (below); it keeps its place in the ring.
+void fdfRunWindowLines(CWindowRing &theRing, int32_t theFirst, int32_t theEnd, const TLRXWindowLoad &theLoad,
+                       const TLRXWindowEmit &theEmit);
+
 // R line slots of row-window sums, the column accumulators over the lines
 // currently in the window, and the scratch line the measure fills before a
 // line is stored. Memory: (R + 2) x channels x P doubles, (R + 1) x channels
@@ -73,6 +91,9 @@ void fdfRowWindowSum(const double *theTerms, int32_t thePixels, int32_t theLeft,
 class CWindowRing {
 public:
   CWindowRing(const SWindowShape &theShape, int32_t theLines, int32_t thePixels, int theChannels);
+  // The channel arrays point into the ring itself.
+  CWindowRing(const CWindowRing &) = delete;
+  CWindowRing &operator=(const CWindowRing &) = delete;
 
   const SWindowShape &shape() const { return mShape; }
   int32_t lines() const { return mLines; }
@@ -82,7 +103,7 @@ public:
   // Scratch terms of channel theChannel for the line about to be stored.
   double *terms(int theChannel) { return &mTerms[static_cast<size_t>(theChannel) * mPixels]; }
   // The scratch terms of every channel, for the measures' term functions.
-  std::vector<double *> termArrays();
+  const std::vector<double *> &termArrays() const { return mTermArrays; }
   // Centre flags (1 computed) of image line theLine (its slot).
   uint8_t *centre(int32_t theLine) { return &mCentre[slotIndex(theLine) * mPixels]; }
   // Row-window sums of the scratch terms into the slot of image line
@@ -98,9 +119,15 @@ public:
   // Accumulator of channel theChannel: the window sums of the added lines.
   const double *column(int theChannel) const { return &mColumns[static_cast<size_t>(theChannel) * mPixels]; }
   // The accumulators of every channel, for the measures' line functions.
-  std::vector<const double *> columnArrays() const;
+  const std::vector<const double *> &columnArrays() const { return mColumnArrays; }
+
+  // Output line the ring would emit next when continuing (-1: none, after a
+  // run that failed).
+  int32_t nextLine() const { return mNextLine; }
 
 private:
+  friend void fdfRunWindowLines(CWindowRing &, int32_t, int32_t, const TLRXWindowLoad &, const TLRXWindowEmit &);
+
   size_t slotIndex(int32_t theLine) const { return static_cast<size_t>(theLine % mShape.mRows); }
   size_t slotOffset(int32_t theLine, int theChannel) const {
     return (slotIndex(theLine) * mChannels + theChannel) * mPixels;
@@ -118,20 +145,113 @@ private:
   std::vector<double> mColumns;
   std::vector<int32_t> mColumnNonZero;
   std::vector<double> mTerms;
+  std::vector<double *> mTermArrays;
+  std::vector<const double *> mColumnArrays;
+  // Where the schedule stands: the next output line and the next input line
+  // to load.
+  int32_t mNextLine = 0;
+  int32_t mNextLoad = 0;
 };
 
-// Fills the ring's scratch terms and the centre flags of input line theLine.
-using TLRXWindowLoad = std::function<void(int32_t theLine)>;
-// Produces output line theLine from the accumulators and its centre flags.
-using TLRXWindowEmit = std::function<void(int32_t theLine)>;
-// Told output line theLine of theLines is next (progress, interruption).
-using TLRXWindowProgress = std::function<void(int32_t theLine, int32_t theLines)>;
+// The line schedule over output lines theFirst .. theEnd - 1: for output line
+// l, the line that left the window is subtracted, the lines that entered it
+// are loaded into the slots just freed and added (at lines that are multiples
+// of R the accumulators are recomputed from the slots instead), and line l is
+// emitted. A run continues where the ring's last run ended (theFirst ==
+// nextLine()) or starts afresh at a multiple of R, loading first the lines
+// the window of theFirst holds; either way every line comes out as in one run
+// from line 0. Any other start, or a range outside 0 .. lines(), throws
+// std::invalid_argument. Input lines are loaded once each, in order.
+void fdfRunWindowLines(CWindowRing &theRing, int32_t theFirst, int32_t theEnd, const TLRXWindowLoad &theLoad,
+                       const TLRXWindowEmit &theEmit);
+// The whole image from line 0 on a fresh ring.
+inline void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &theLoad, const TLRXWindowEmit &theEmit) {
+  fdfRunWindowLines(theRing, 0, theRing.lines(), theLoad, theEmit);
+}
 
-// The line schedule over the ring's lines: for output line l, the line that
-// left the window is subtracted, the lines that entered it are loaded into
-// the slots just freed and added (at lines that are multiples of R the
-// accumulators are recomputed from the slots instead), and line l is
-// emitted. Every input line is loaded once, in order. Progress (when given)
-// is told before each output line.
-void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &theLoad, const TLRXWindowEmit &theEmit,
-                          const TLRXWindowProgress &theProgress = nullptr);
+// ------------------------------------------------------------ band runner
+// A parallel loop: theBody(i, t) once for every i in [0, theCount), t < the
+// number of threads naming the thread (callers pass fdfParallelFor).
+using TLRXBlockBody = std::function<void(int64_t theIndex, int theThread)>;
+using TLRXParallelFor = std::function<void(int64_t theCount, const TLRXBlockBody &theBody)>;
+
+// Output lines mFirst .. mFirst + mCount - 1 of a band and the input lines
+// mInFirst .. mInFirst + mInCount - 1 their values need.
+struct SLineBand {
+  int32_t mFirst = 0;
+  int32_t mCount = 0;
+  int32_t mInFirst = 0;
+  int32_t mInCount = 0;
+};
+
+// How an image of mLines lines (input and output alike) is streamed: bands of
+// mBand lines, each cut into blocks of mBlock lines, both starting at
+// multiples of their length counted from line 0; an output line needs the
+// input lines mAbove above it to mBelow below it (clipped to the image).
+// mBlock is the grain of the parallel work, mBand how many lines are held;
+// the users below make neither shape their results.
+struct SBandPlan {
+  int32_t mLines = 0;
+  int32_t mBlock = 1;
+  int32_t mBand = 1;
+  int32_t mAbove = 0;
+  int32_t mBelow = 0;
+  // Input lines a band can need: what a band buffer must hold.
+  int32_t bandInputLines() const { return mBand + mAbove + mBelow; }
+};
+
+// A plan of blocks of theBlock lines, theBlocksPerThread blocks per thread in
+// a band (the band no longer than the image rounded up to whole blocks).
+SBandPlan fdfBandPlan(int32_t theLines, int32_t theBlock, int theThreads, int theBlocksPerThread, int32_t theAbove,
+                      int32_t theBelow);
+
+// A band's input lines on the calling thread (read), or its output lines
+// (write).
+using TLRXBandStep = std::function<void(const SLineBand &theBand)>;
+// Output lines theFirst .. theFirst + theCount - 1 computed on thread theThread.
+using TLRXBlockStep = std::function<void(int32_t theFirst, int32_t theCount, int theThread)>;
+
+// For each band in order: theRead on the calling thread, theCompute on the
+// band's blocks in parallel, then theWrite on the calling thread. An
+// exception of a block is rethrown here (the parallel loop's rule), before
+// the band is written.
+void fdfRunBands(const SBandPlan &thePlan, const TLRXParallelFor &theParallelFor, const TLRXBandStep &theRead,
+                 const TLRXBlockStep &theCompute, const TLRXBandStep &theWrite);
+
+// Lines of a window block: a multiple of R (so every block starts afresh at a
+// recomputation line) of at least 4 R and about 64 lines, so the R - 1 lines
+// a block that starts afresh loads again stay a small part of its work (at
+// most a quarter; 6 in 70 lines for R = 7), while a band of one block per
+// thread stays short.
+int32_t fdfWindowBlockLines(const SWindowShape &theShape);
+
+// Loads (or emits) line theLine on the ring of thread theThread.
+using TLRXRingLine = std::function<void(CWindowRing &theRing, int32_t theLine, int theThread)>;
+
+// The window schedule over an image streamed in bands: for each band the
+// caller reads the band's input lines into its band buffers (theRead), the
+// blocks of the band run in parallel, each on the ring of its thread
+// (theLoad fills the ring's terms of an input line from the band buffers,
+// theEmit turns the ring's sums into an output line of the caller's band
+// output), then the caller writes the band's output lines (theWrite). One
+// ring per thread, made when the thread first needs it; a block that follows
+// on its ring's last one continues without loading its window again. One
+// thread runs the image as one block on one ring, read in bands of R lines.
+// Results do not depend on theThreads.
+class CWindowBands {
+public:
+  CWindowBands(const SWindowShape &theShape, int32_t theLines, int32_t thePixels, int theChannels, int theThreads,
+               TLRXParallelFor theParallelFor);
+
+  const SBandPlan &plan() const { return mPlan; }
+  void run(const TLRXBandStep &theRead, const TLRXRingLine &theLoad, const TLRXRingLine &theEmit,
+           const TLRXBandStep &theWrite);
+
+private:
+  SWindowShape mShape;
+  int32_t mPixels;
+  int mChannels;
+  SBandPlan mPlan;
+  TLRXParallelFor mParallelFor;
+  std::vector<std::unique_ptr<CWindowRing>> mRings;
+};

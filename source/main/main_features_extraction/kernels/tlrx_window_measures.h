@@ -55,6 +55,15 @@ struct SCorrelationStats {
   int64_t mAbove07 = 0;  // 0.7 < g <= 0.8
   int64_t mAbove05 = 0;  // 0.5 < g <= 0.7
   int64_t mAbove0 = 0;   // 0 < g <= 0.5 (r > 0.5 only; r <= 0.5 is in no class)
+
+  SCorrelationStats &operator+=(const SCorrelationStats &theOther) {
+    mComputed += theOther.mComputed;
+    mAbove08 += theOther.mAbove08;
+    mAbove07 += theOther.mAbove07;
+    mAbove05 += theOther.mAbove05;
+    mAbove0 += theOther.mAbove0;
+    return *this;
+  }
 };
 
 // x = I / n with n the normalisation value; a pixel counts where both inputs

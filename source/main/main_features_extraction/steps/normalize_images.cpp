@@ -43,17 +43,22 @@ int normalize_images(int argc, char **argv) {
   CResultRaster aOutput(argv[3], aHeader);
 
   const float aNull = static_cast<float>(aDummy);
-  int64_t aComputed = 0;
+  std::vector<SThreadCounter<int64_t>> aComputed(static_cast<size_t>(aStep.threads()));
   aStep.runLines(
       aOutput, CTLRX_NORMALIZE_CHANNELS,
-      [&](double *const *theTerms, uint8_t *theCentre) {
-        fdfNormalizeTerms(aFirst.values(), aFirst.mask(), aFirst.deliversIntensity(), aSecond.values(),
-                          aSecond.mask(), aSecond.deliversIntensity(), aFirst.pixels(), theTerms, theCentre);
+      [&](int32_t theLine, double *const *theTerms, uint8_t *theCentre) {
+        fdfNormalizeTerms(aFirst.values(theLine), aFirst.mask(theLine), aFirst.deliversIntensity(),
+                          aSecond.values(theLine), aSecond.mask(theLine), aSecond.deliversIntensity(), aFirst.pixels(),
+                          theTerms, theCentre);
       },
-      [&](const double *const *theSums, const uint8_t *theCentre, float *theOut) {
-        aComputed += fdfNormalizeLine(theSums, theCentre, aFirst.pixels(), aNull, theOut);
+      [&](int theThread, const double *const *theSums, const uint8_t *theCentre, float *theOut) {
+        aComputed[static_cast<size_t>(theThread)].mValue +=
+            fdfNormalizeLine(theSums, theCentre, aFirst.pixels(), aNull, theOut);
       });
-  fdfTraceSignificantCount(aDummy, aComputed);
+  int64_t aTotal = 0;
+  for (const auto &aCount : aComputed)
+    aTotal += aCount.mValue;
+  fdfTraceSignificantCount(aDummy, aTotal);
   aStep.commit(aOutput, aHeader);
   return 0;
 }

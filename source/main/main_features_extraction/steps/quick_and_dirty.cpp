@@ -53,17 +53,21 @@ int quick_and_dirty(int argc, char **argv) {
   fdfStampPairInputs(aHeader, aFirst, aSecond);
   CResultRaster aOutput(argv[4], aHeader);
 
-  SCorrelationStats aStats;
+  std::vector<SThreadCounter<SCorrelationStats>> aThreadStats(static_cast<size_t>(aStep.threads()));
   aStep.runLines(
       aOutput, CTLRX_CORRELATION_CHANNELS,
-      [&](double *const *theTerms, uint8_t *theCentre) {
-        fdfCorrelationTerms(aFirst.values(), aFirst.mask(), aFirst.deliversIntensity(), aSecond.values(),
-                            aSecond.mask(), aSecond.deliversIntensity(), aNorm.values(), aNorm.mask(),
-                            aFirst.pixels(), theTerms, theCentre);
+      [&](int32_t theLine, double *const *theTerms, uint8_t *theCentre) {
+        fdfCorrelationTerms(aFirst.values(theLine), aFirst.mask(theLine), aFirst.deliversIntensity(),
+                            aSecond.values(theLine), aSecond.mask(theLine), aSecond.deliversIntensity(),
+                            aNorm.values(theLine), aNorm.mask(theLine), aFirst.pixels(), theTerms, theCentre);
       },
-      [&](const double *const *theSums, const uint8_t *theCentre, float *theOut) {
-        fdfCorrelationLine(theSums, theCentre, aFirst.pixels(), aNull, theOut, aStats);
+      [&](int theThread, const double *const *theSums, const uint8_t *theCentre, float *theOut) {
+        fdfCorrelationLine(theSums, theCentre, aFirst.pixels(), aNull, theOut,
+                           aThreadStats[static_cast<size_t>(theThread)].mValue);
       });
+  SCorrelationStats aStats;
+  for (const auto &aThread : aThreadStats)
+    aStats += aThread.mValue;
   fdfTraceCorrelationStats(aStats);
   fdfTraceSignificantCount(aNull, aStats.mComputed);
   aStep.commit(aOutput, aHeader);

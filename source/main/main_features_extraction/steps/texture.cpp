@@ -49,11 +49,11 @@ int texture(int argc, char **argv) {
   const float aNull = fdfGetDummyValue();
   aStep.runLines(
       aOutput, CTLRX_TEXTURE_CHANNELS,
-      [&](double *const *theTerms, uint8_t *theCentre) {
-        fdfTextureTerms(aInput.values(), aInput.mask(), aInput.pixels(), aInput.deliversIntensity(), theTerms,
-                        theCentre);
+      [&](int32_t theLine, double *const *theTerms, uint8_t *theCentre) {
+        fdfTextureTerms(aInput.values(theLine), aInput.mask(theLine), aInput.pixels(), aInput.deliversIntensity(),
+                        theTerms, theCentre);
       },
-      [&](const double *const *theSums, const uint8_t *theCentre, float *theOut) {
+      [&](int, const double *const *theSums, const uint8_t *theCentre, float *theOut) {
         fdfTextureLine(theSums, theCentre, aInput.pixels(), aNull, theOut);
       });
   aStep.commit(aOutput, aHeader);

@@ -8,6 +8,9 @@
 #include "tlrx_step_common.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_threads.h"
+
+#include <algorithm>
 
 
 namespace {
@@ -39,25 +42,54 @@ void CWindowInput::open() {
   // The raster file checks the layout and the file size before anything is
   // sized by the header's counts.
   mRaster.open_read(mName.c_str(), mHeader);
-  const size_t aPixels = static_cast<size_t>(mRaster.getNrOfPixelsPerLine());
-  mValues.assign(mParts ? 0 : aPixels, 0.0);
-  mCells.assign(mParts ? aPixels : 0, 0.0);
-  mValid.assign(mParts ? aPixels : 0, 0);
-  mMask.assign(aPixels, 0);
+  mRows = mBandFirst = mBandCount = 0;
+  mValid.assign(static_cast<size_t>(mPixels), 0);
 }
 
 void CWindowInput::readParts() { mParts = fdfIsComplexHeader(mHeader); }
 
+void CWindowInput::reserveLines(int32_t theLines) {
+  const size_t aCells = static_cast<size_t>(std::max(0, theLines)) * static_cast<size_t>(mPixels);
+  if (mParts)
+    mCells.resize(aCells);
+  else
+    mValues.resize(aCells);
+  mMask.resize(aCells);
+  mRows = std::max(0, theLines);
+  mBandCount = 0;
+}
+
+size_t CWindowInput::row(int32_t theLine) const {
+  if (theLine < mBandFirst || theLine >= mBandFirst + mBandCount)
+    TLRX_RAISE_F(CTLRX_ERR_UNEXPECTED, "%.200s: line %d asked of the band of lines %d .. %d", mName.c_str(), theLine,
+                 mBandFirst, mBandFirst + mBandCount - 1);
+  return static_cast<size_t>(theLine % mRows) * static_cast<size_t>(mPixels);
+}
+
 // The mask is the raster rule's; the window measures then drop a NaN (or
 // infinite) value as no data too, whatever the null (tlrx_window_measures.h).
-void CWindowInput::readLine(int32_t theLine) {
+void CWindowInput::readRow(int32_t theLine, size_t theRow) {
+  const size_t aOffset = theRow * static_cast<size_t>(mPixels);
   if (!mParts) {
-    mRaster.getValidMask(mValues.data(), mMask.data(), theLine);
+    mRaster.getValidMask(&mValues[aOffset], &mMask[aOffset], theLine);
     return;
   }
-  mRaster.getComplexLine(mCells.data(), theLine, 0, -1, mValid.data());
-  for (size_t j = 0; j < mValid.size(); ++j)
-    mMask[j] = mValid[j];
+  mRaster.getComplexLine(&mCells[aOffset], theLine, 0, -1, mValid.data());
+  std::copy(mValid.begin(), mValid.end(), mMask.begin() + static_cast<std::ptrdiff_t>(aOffset));
+}
+
+// The rows of the lines of the new band are distinct (no more lines than
+// rows), so reading the lines the old band lacks leaves the others in place.
+void CWindowInput::readBand(int32_t theFirst, int32_t theCount) {
+  if (theCount > mRows)
+    reserveLines(theCount);
+  const int32_t aHeldFirst = mBandFirst, aHeldEnd = mBandFirst + mBandCount;
+  mBandFirst = theFirst;
+  mBandCount = 0; // nothing to read from while the band changes (a read may fail)
+  for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine)
+    if (aLine < aHeldFirst || aLine >= aHeldEnd)
+      readRow(aLine, static_cast<size_t>(aLine % mRows));
+  mBandCount = theCount;
 }
 
 void fdfCheckSameSize(const CWindowInput &theFirst, const CWindowInput &theOther) {
@@ -135,26 +167,38 @@ void CWindowStep::openInputs() {
     aInput->open();
 }
 
+int CWindowStep::threads() const { return fdfThreadCount(); }
+
 void CWindowStep::runLines(CResultRaster &theOutput, int theChannels, const TLRXWindowTerms &theTerms,
                            const TLRXWindowValues &theValues) {
   CWindowInput &aFirst = *mInputs[0];
-  CWindowRing aRing(mShape, aFirst.lines(), aFirst.pixels(), theChannels);
-  const std::vector<double *> aTerms = aRing.termArrays();
-  const std::vector<const double *> aSums = aRing.columnArrays();
-  std::vector<float> aLine(static_cast<size_t>(aFirst.pixels()));
+  const int32_t aLines = aFirst.lines();
+  const size_t aPixels = static_cast<size_t>(aFirst.pixels());
+  CWindowBands aBands(mShape, aLines, aFirst.pixels(), theChannels, threads(), fdfParallelFor);
+  std::vector<float> aOut(static_cast<size_t>(aBands.plan().mBand) * aPixels);
+  for (const auto &aInput : mInputs)
+    aInput->reserveLines(aBands.plan().bandInputLines());
   CLineProgress aProgress(97.0, 2);
-  fdfRunWindowSchedule(
-      aRing,
-      [&](int32_t theLine) {
+  int32_t aBandFirst = 0;
+  aBands.run(
+      [&](const SLineBand &theBand) {
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
+          aProgress.update(l, aLines);
         for (const auto &aInput : mInputs)
-          aInput->readLine(theLine);
-        theTerms(aTerms.data(), aRing.centre(theLine));
+          aInput->readBand(theBand.mInFirst, theBand.mInCount);
+        aBandFirst = theBand.mFirst;
       },
-      [&](int32_t theLine) {
-        theValues(aSums.data(), aRing.centre(theLine), aLine.data());
-        theOutput.file().putLine(theLine, aLine.data());
+      [&](CWindowRing &theRing, int32_t theLine, int) {
+        theTerms(theLine, theRing.termArrays().data(), theRing.centre(theLine));
       },
-      [&](int32_t theLine, int32_t theLines) { aProgress.update(theLine, theLines); });
+      [&](CWindowRing &theRing, int32_t theLine, int theThread) {
+        theValues(theThread, theRing.columnArrays().data(), theRing.centre(theLine),
+                  &aOut[static_cast<size_t>(theLine - aBandFirst) * aPixels]);
+      },
+      [&](const SLineBand &theBand) {
+        for (int32_t l = 0; l < theBand.mCount; ++l)
+          theOutput.file().putLine(theBand.mFirst + l, &aOut[static_cast<size_t>(l) * aPixels]);
+      });
   for (const auto &aInput : mInputs)
     aInput->close();
 }

@@ -56,8 +56,8 @@ bool fdfDeliversIntensity(const CDescription &theHeader);
 
 // One input raster of a window step: its header (missing: 261122 with the
 // header name), size and whether it delivers intensities, then the open raster
-// and one line of values with their validity flags. A complex input asked for
-// its parts gives the cells themselves instead of their intensities.
+// and a band of lines of values with their validity flags. A complex input
+// asked for its parts gives the cells themselves instead of their intensities.
 class CWindowInput {
 public:
   explicit CWindowInput(const char *theName);
@@ -67,9 +67,14 @@ public:
   void readParts();
   // Opens the raster for reading (after every header check of the step).
   void open();
-  // Reads line theLine into values() (or cells()) and mask() (1 valid, 0 no
-  // data; a complex cell is no data when both its parts are).
-  void readLine(int32_t theLine);
+  // Band buffers for theLines lines (after open()).
+  void reserveLines(int32_t theLines);
+  // Holds lines theFirst .. theFirst + theCount - 1 in the band buffers:
+  // values() (or cells()) and mask() (1 valid, 0 no data; a complex cell is
+  // no data when both its parts are). A line sits in row line % rows, so the
+  // lines the band held already stay where they are and are not read again.
+  // A band longer than the buffers makes them grow (every line read again).
+  void readBand(int32_t theFirst, int32_t theCount);
   // Line theLine as floats into theValues (no-data cells hold nullValue()),
   // for steps that test validity themselves.
   void readFloatLine(int32_t theLine, float *theValues) { mRaster.getLine(theValues, theLine); }
@@ -82,11 +87,16 @@ public:
   int32_t pixels() const { return mPixels; }
   bool deliversIntensity() const { return mIntensity; }
   bool readsParts() const { return mParts; }
-  const double *values() const { return mValues.data(); }
-  const std::complex<double> *cells() const { return mCells.data(); }
-  const int32_t *mask() const { return mMask.data(); }
+  // Line theLine of the band held; a line outside it is a fault of the
+  // caller and raises 913920 naming it.
+  const double *values(int32_t theLine) const { return &mValues[row(theLine)]; }
+  const std::complex<double> *cells(int32_t theLine) const { return &mCells[row(theLine)]; }
+  const int32_t *mask(int32_t theLine) const { return &mMask[row(theLine)]; }
 
 private:
+  size_t row(int32_t theLine) const;
+  void readRow(int32_t theLine, size_t theRow);
+
   std::string mName;
   CDescription mHeader;
   int32_t mLines = 0;
@@ -94,6 +104,9 @@ private:
   bool mIntensity = false;
   bool mParts = false;
   CRasterFile mRaster;
+  int32_t mRows = 0;
+  int32_t mBandFirst = 0;
+  int32_t mBandCount = 0;
   std::vector<double> mValues;
   std::vector<std::complex<double>> mCells;
   std::vector<uint8_t> mValid;
@@ -130,10 +143,19 @@ struct SWindowStepSyntax {
   SWindowRule mRule;
 };
 
-// Fills the terms and centre flags of a line from the inputs' current lines.
-using TLRXWindowTerms = std::function<void(double *const *theTerms, uint8_t *theCentre)>;
-// Turns the window sums and centre flags of a line into an output line.
-using TLRXWindowValues = std::function<void(const double *const *theSums, const uint8_t *theCentre, float *theOut)>;
+// Fills the terms and centre flags of input line theLine from the inputs'
+// band buffers (values(theLine), mask(theLine)). Runs on the worker threads.
+using TLRXWindowTerms = std::function<void(int32_t theLine, double *const *theTerms, uint8_t *theCentre)>;
+// Turns the window sums and centre flags of a line into an output line, on
+// worker thread theThread (< CWindowStep::threads(): per-thread counters).
+using TLRXWindowValues =
+    std::function<void(int theThread, const double *const *theSums, const uint8_t *theCentre, float *theOut)>;
+
+// A count kept by one worker thread, alone on its cache line so the threads
+// do not slow each other; the calling thread adds them up after the run.
+template <class T> struct alignas(64) SThreadCounter {
+  T mValue{};
+};
 
 // One run of a window step: arguments, window, inputs, the line loop.
 class CWindowStep {
@@ -158,11 +180,15 @@ public:
   // Opens every input raster, after the step's header checks.
   void openInputs();
 
-  // The line loop over the first input's lines: each input line of every
-  // input is read once, in order, and handed to theTerms with the ring's
-  // terms and centre flags; each output line comes from theValues and is
-  // written to theOutput. Progress 2 .. 99 before each line (the host's
-  // interruption stops the run there); the inputs are closed at the end.
+  // Threads of the run (fdfThreadCount).
+  int threads() const;
+  // The line loop over the first input's lines, in bands: the inputs read a
+  // band of lines on the calling thread, the band's blocks run in parallel
+  // (theTerms of each input line, theValues of each output line), then the
+  // band's output lines are written to theOutput in order. Progress 2 .. 99
+  // for every line in order on the calling thread as its band is read (the
+  // host's interruption stops the run there); the inputs are closed at the
+  // end. Results do not depend on the number of threads.
   void runLines(CResultRaster &theOutput, int theChannels, const TLRXWindowTerms &theTerms,
                 const TLRXWindowValues &theValues);
   // Traces "writing the output parameter file <name>" and commits the
