@@ -38,3 +38,26 @@ median() { sort -g | awk '{ v[NR] = $1 } END { print (NR % 2) ? v[(NR + 1) / 2] 
 stat() { awk -v c="$2" '{ print (c == 23) ? $2 + $3 : $c }' "$WORK/$1.times" | median; }
 ratio() { awk -v a="$(stat "$1" "$3")" -v b="$(stat "$2" "$3")" 'BEGIN { printf "%.2f", a / b }'; }
 check() { awk -v v="$1" -v t="$3" -v op="$2" 'BEGIN { ok = (op == "<=") ? v <= t : v >= t; print ok ? "ok" : "MISSED" }'; }
+
+# temporal_parameters FILE ROOT KERNEL INPUT...: a temporal-features parameter
+# file asking for every feature of the inputs, results under ROOT.
+temporal_parameters() {
+  local aFile=$1 aRoot=$2 aKernel=$3 i=0
+  shift 3
+  {
+    printf '<?xml version="1.0" ?>\n<HEADER_INFO>\n<MAIN_CMD>\n<input_file_list>\n'
+    printf '<VectorString NumberOfElements = "%d">\n' "$#"
+    for aName in "$@"; do
+      printf '<ValueString ID = "%d">%s</ValueString>\n' "$i" "$aName"
+      i=$((i + 1))
+    done
+    printf '</VectorString>\n</input_file_list>\n<out_root_file_name>%s</out_root_file_name>\n' "$aRoot"
+    printf '<interp_type>%s</interp_type>\n' "$aKernel"
+    for aSwitch in mean std median gradient max min span_max_less_min max_less_min_sup max_less_min_inf \
+      span_max_on_min max_on_min_sup max_on_min_inf date_max date_min_before_max; do
+      printf '<%s>OK</%s>\n' "$aSwitch" "$aSwitch"
+    done
+    printf '<saturation_default>0</saturation_default>\n'
+    printf '<TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>\n</MAIN_CMD>\n</HEADER_INFO>\n'
+  } >"$aFile"
+}

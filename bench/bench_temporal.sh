@@ -38,29 +38,10 @@ simulate --out "$WORK/g" --lines "$SIDE" --utm 32N --origin 600000,5100000 --spa
   --image-origin 3:600005,5100000 --image-origin 5:600000,5099995 --image-origin 7:600005,5099995
 names() { for ((i = 1; i <= COUNT; ++i)); do printf '%s_%02d ' "$1" "$i"; done; }
 
-# Parameter file: inputs of root $1, output root $2, kernel $3, every output.
-parameters() {
-  {
-    printf '<?xml version="1.0" ?>\n<HEADER_INFO>\n<MAIN_CMD>\n<input_file_list>\n'
-    printf '<VectorString NumberOfElements = "%d">\n' "$COUNT"
-    local i=0
-    for aName in $(names "$1"); do
-      printf '<ValueString ID = "%d">%s</ValueString>\n' "$i" "$aName"
-      i=$((i + 1))
-    done
-    printf '</VectorString>\n</input_file_list>\n<out_root_file_name>%s</out_root_file_name>\n' "$2"
-    printf '<interp_type>%s</interp_type>\n' "$3"
-    for aSwitch in mean std median gradient max min span_max_less_min max_less_min_sup max_less_min_inf \
-      span_max_on_min max_on_min_sup max_on_min_inf date_max date_min_before_max; do
-      printf '<%s>OK</%s>\n' "$aSwitch" "$aSwitch"
-    done
-    printf '<saturation_default>0</saturation_default>\n'
-    printf '<TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>\n</MAIN_CMD>\n</HEADER_INFO>\n'
-  } >"$WORK/$4"
-}
-parameters "$WORK/s" "$WORK/ours" nearest_neighbour ours.xml
-parameters "$WORK/q" "$WORK/quarter" nearest_neighbour quarter.xml
-parameters "$WORK/g" "$WORK/geo" bilinear_interpolation geo.xml
+# Parameter files: every feature, inputs in the simulator's (temporal) order.
+temporal_parameters "$WORK/ours.xml" "$WORK/ours" nearest_neighbour $(names "$WORK/s")
+temporal_parameters "$WORK/quarter.xml" "$WORK/quarter" nearest_neighbour $(names "$WORK/q")
+temporal_parameters "$WORK/geo.xml" "$WORK/geo" bilinear_interpolation $(names "$WORK/g")
 OUTPUT_MB=$((14 * SIDE * SIDE * 4 / 1048576))
 
 MAIN="$BUILD/bin/main_features_extraction"

@@ -32,18 +32,7 @@ printf 'minmax\n%s\n%s\n2\n3\n4\n5\n6\nNO\n0\n' "$WORK/m_list.txt" "$WORK/mm" >"
 printf 'texture\n%s\n%s\n0\n7\n7\nx\nNO\n0\n' "$WORK/p_1" "$WORK/tex" >"$WORK/texture.txt"
 printf 'correlation\n%s\n%s\n%s\n%s\n7\n7\n7\n7\nNO\nNO\n0\n' "$WORK/p_1" "$WORK/p_2" "$WORK/coh" "$NULL" \
   >"$WORK/correlation.txt"
-{
-  printf '<?xml version="1.0" ?>\n<HEADER_INFO>\n<MAIN_CMD>\n<input_file_list>\n'
-  printf '<VectorString NumberOfElements = "8">\n'
-  for i in 0 1 2 3 4 5 6 7; do printf '<ValueString ID = "%d">%s</ValueString>\n' "$i" "${STACK[$i]}"; done
-  printf '</VectorString>\n</input_file_list>\n<out_root_file_name>%s</out_root_file_name>\n' "$WORK/tf"
-  for aSwitch in mean std median gradient max min span_max_less_min max_less_min_sup max_less_min_inf \
-    span_max_on_min max_on_min_sup max_on_min_inf date_max date_min_before_max; do
-    printf '<%s>OK</%s>\n' "$aSwitch" "$aSwitch"
-  done
-  printf '<saturation_default>0</saturation_default>\n'
-  printf '<TellurixEnvironment>IDL_ENVI_ENV</TellurixEnvironment>\n</MAIN_CMD>\n</HEADER_INFO>\n'
-} >"$WORK/temporal.xml"
+temporal_parameters "$WORK/temporal.xml" "$WORK/tf" nearest_neighbour "${STACK[@]}"
 # The interferogram step alone, on the chain's pair with the shifts known.
 sed 's:</HEADER_INFO>::' "$WORK/c_1.sml" >"$WORK/c_par.sml"
 cat >>"$WORK/c_par.sml" <<XML
