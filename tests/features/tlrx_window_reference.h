@@ -123,7 +123,8 @@ inline STestImage constantImage(int theLines, int thePixels, double theValue) {
   return aImage;
 }
 
-// Seeded uniform values in [theLow, theHigh), no data at theNoData.
+// Seeded uniform values in [theLow, theHigh), no data at theNoData (indices
+// past the image are ignored, so one list serves images of several sizes).
 inline STestImage randomImage(int theLines, int thePixels, uint64_t theSeed, double theLow, double theHigh,
                               const std::vector<int> &theNoData) {
   STestImage aImage = constantImage(theLines, thePixels, 0.0);
@@ -132,7 +133,8 @@ inline STestImage randomImage(int theLines, int thePixels, uint64_t theSeed, dou
   for (double &aCell : aImage.mValues)
     aCell = aValue(aEngine);
   for (int aIndex : theNoData)
-    aImage.mValid[aIndex] = 0;
+    if (aIndex >= 0 && static_cast<size_t>(aIndex) < aImage.mValid.size())
+      aImage.mValid[static_cast<size_t>(aIndex)] = 0;
   return aImage;
 }
 
