@@ -10,13 +10,11 @@
 #include "tlrx_fft.h"
 #include "tlrx_raster_file.h"
 #include "tlrx_test_support.h"
-#include "tlrx_threads.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
 #include <complex>
-#include <cstdlib>
 #include <random>
 #include <string>
 #include <vector>
@@ -129,22 +127,3 @@ inline void tlrxExpectStepFailures(int (*theProgram)(int, char **), const std::v
   }
 }
 
-// The thread counts a run is compared over: one, two, and more than a small
-// machine has cores.
-constexpr int CTLRX_TEST_THREADS[] = {1, 2, 3};
-
-// TELLURIX_THREADS = theCount within a scope (the count read again), unset
-// after it.
-class CTestThreads {
-public:
-  explicit CTestThreads(int theCount) {
-    setenv("TELLURIX_THREADS", std::to_string(theCount).c_str(), 1);
-    fdfResetThreadCount();
-  }
-  ~CTestThreads() {
-    unsetenv("TELLURIX_THREADS");
-    fdfResetThreadCount();
-  }
-  CTestThreads(const CTestThreads &) = delete;
-  CTestThreads &operator=(const CTestThreads &) = delete;
-};

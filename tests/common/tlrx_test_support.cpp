@@ -187,3 +187,18 @@ std::vector<double> tlrxReadTestRaster(const std::string &theName) {
   aFile.close();
   return aValues;
 }
+
+#include "tlrx_threads.h"
+
+CTestThreads::CTestThreads(const std::string &theValue) {
+  if (theValue.empty())
+    unsetenv("TELLURIX_THREADS");
+  else
+    setenv("TELLURIX_THREADS", theValue.c_str(), 1);
+  fdfResetThreadCount();
+}
+
+CTestThreads::~CTestThreads() {
+  unsetenv("TELLURIX_THREADS");
+  fdfResetThreadCount();
+}

@@ -7,6 +7,21 @@
 #include <string>
 #include <vector>
 
+// The thread counts a run is compared over: one, two, and more than a small
+// machine has cores.
+constexpr int CTLRX_TEST_THREADS[] = {1, 2, 3};
+
+// TELLURIX_THREADS = theValue within a scope ("" unsets it), the count read
+// again on entry and at the end.
+class CTestThreads {
+public:
+  explicit CTestThreads(int theCount) : CTestThreads(std::to_string(theCount)) {}
+  explicit CTestThreads(const std::string &theValue);
+  ~CTestThreads();
+  CTestThreads(const CTestThreads &) = delete;
+  CTestThreads &operator=(const CTestThreads &) = delete;
+};
+
 // A fresh folder under /tmp, removed with its contents at destruction.
 class CTempDir {
 public:

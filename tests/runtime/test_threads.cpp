@@ -3,6 +3,7 @@
 #include "tlrx_description_test_support.h"
 #include "tlrx_errors.h"
 #include "tlrx_platform.h"
+#include "tlrx_test_support.h"
 #include "tlrx_threads.h"
 
 #include <gtest/gtest.h>
@@ -14,39 +15,19 @@
 #include <unistd.h>
 #include <vector>
 
-namespace {
-
-// Sets TELLURIX_THREADS for one test ("" unsets it) and forgets the count.
-class CThreadsSetting {
-public:
-  explicit CThreadsSetting(const char *theValue) {
-    if (theValue[0] == '\0')
-      unsetenv("TELLURIX_THREADS");
-    else
-      setenv("TELLURIX_THREADS", theValue, 1);
-    fdfResetThreadCount();
-  }
-  ~CThreadsSetting() {
-    unsetenv("TELLURIX_THREADS");
-    fdfResetThreadCount();
-  }
-};
-
-} // namespace
-
 TEST(Threads, CountFromTheVariableOrTheCpus) {
   {
-    CThreadsSetting aSetting("");
+    CTestThreads aSetting("");
     EXPECT_EQ(fdfThreadCount(), fdfUsableCpuCount());
     EXPECT_GE(fdfUsableCpuCount(), 1);
     EXPECT_LE(fdfUsableCpuCount(), sysconf(_SC_NPROCESSORS_CONF));
   }
   for (const char *aValue : {"1", "3", "256"}) {
-    CThreadsSetting aSetting(aValue);
+    CTestThreads aSetting(aValue);
     EXPECT_EQ(fdfThreadCount(), std::atoi(aValue));
   }
   for (const char *aValue : {"0", "-2", "257", "abc", "2x", " ", "99999999999999999999"}) {
-    CThreadsSetting aSetting(aValue);
+    CTestThreads aSetting(aValue);
     std::string aMessage;
     EXPECT_EQ(tlrxCodeOf([] { fdfThreadCount(); }, &aMessage), CTLRX_ERR_SETTING_MISSING) << aValue;
     EXPECT_NE(aMessage.find("TELLURIX_THREADS = \"" + std::string(aValue) + "\""), std::string::npos) << aMessage;
@@ -55,7 +36,7 @@ TEST(Threads, CountFromTheVariableOrTheCpus) {
 
 TEST(Threads, ParallelForCallsEachIndexOnceOnTheRunsThreads) {
   for (const char *aThreads : {"1", "3"}) {
-    CThreadsSetting aSetting(aThreads);
+    CTestThreads aSetting(aThreads);
     for (int64_t aCount : {0, 1, 2, 97}) {
       std::vector<std::atomic<int>> aCalls(static_cast<size_t>(aCount));
       std::atomic<int> aBadThread{0};
@@ -74,7 +55,7 @@ TEST(Threads, ParallelForCallsEachIndexOnceOnTheRunsThreads) {
 // error, and every piece below it has run.
 TEST(Threads, ParallelForRethrowsTheFailureOfTheLowestIndex) {
   for (const char *aThreads : {"1", "2", "3"}) {
-    CThreadsSetting aSetting(aThreads);
+    CTestThreads aSetting(aThreads);
     std::vector<std::atomic<int>> aCalls(100);
     std::string aMessage;
     const int32_t aCode = tlrxCodeOf(
@@ -105,7 +86,7 @@ TEST(Threads, BandsReadComputeAndWriteInOrder) {
   };
   for (const SCase &aCase : {SCase{"3", 37, 4, 24}, SCase{"1", 37, 4, 8}, SCase{"3", 5, 4, 8}, SCase{"2", 0, 4, 4},
                              SCase{"2", 9, 1, 4}}) {
-    CThreadsSetting aSetting(aCase.mThreads);
+    CTestThreads aSetting(aCase.mThreads);
     const SLineBands aBands = fdfLineBands(aCase.mLines, aCase.mBlock);
     EXPECT_EQ(aBands.mBand, aCase.mBand) << aCase.mThreads << " " << aCase.mLines;
     std::vector<std::pair<int32_t, int32_t>> aReads, aWrites;
