@@ -1,5 +1,5 @@
 // Threads within a run: the thread count from TELLURIX_THREADS or the CPUs,
-// the parallel loop's coverage and failure rule, and the band schedule.
+// and the parallel loop's coverage and failure rule.
 #include "tlrx_description_test_support.h"
 #include "tlrx_errors.h"
 #include "tlrx_platform.h"
@@ -10,8 +10,6 @@
 
 #include <atomic>
 #include <cstdlib>
-#include <mutex>
-#include <set>
 #include <unistd.h>
 #include <vector>
 
@@ -73,43 +71,5 @@ TEST(Threads, ParallelForRethrowsTheFailureOfTheLowestIndex) {
     EXPECT_EQ(aMessage, "piece 40");
     for (int i = 0; i <= 40; ++i)
       EXPECT_EQ(aCalls[static_cast<size_t>(i)].load(), 1) << i;
-  }
-}
-
-// Reads and writes come in band order on the calling thread; every block
-// starts at a multiple of the block size, lies inside its band and runs
-// between the band's read and its write.
-TEST(Threads, BandsReadComputeAndWriteInOrder) {
-  struct SCase {
-    const char *mThreads;
-    int32_t mLines, mBlock, mBand;
-  };
-  for (const SCase &aCase : {SCase{"3", 37, 4, 24}, SCase{"1", 37, 4, 8}, SCase{"3", 5, 4, 8}, SCase{"2", 0, 4, 4},
-                             SCase{"2", 9, 1, 4}}) {
-    CTestThreads aSetting(aCase.mThreads);
-    const SLineBands aBands = fdfLineBands(aCase.mLines, aCase.mBlock);
-    EXPECT_EQ(aBands.mBand, aCase.mBand) << aCase.mThreads << " " << aCase.mLines;
-    std::vector<std::pair<int32_t, int32_t>> aReads, aWrites;
-    std::vector<int> aCovered(static_cast<size_t>(aCase.mLines), 0);
-    std::mutex aMutex;
-    bool aInsideBand = true;
-    fdfRunLineBands(
-        aBands, [&](int32_t theFirst, int32_t theCount) { aReads.emplace_back(theFirst, theCount); },
-        [&](int32_t theFirst, int32_t theCount, int) {
-          const std::lock_guard<std::mutex> aLock(aMutex);
-          aInsideBand &= theFirst % aCase.mBlock == 0 && aReads.size() == aWrites.size() + 1 &&
-                         theFirst >= aReads.back().first &&
-                         theFirst + theCount <= aReads.back().first + aReads.back().second &&
-                         theCount == std::min(aCase.mBlock, aCase.mLines - theFirst);
-          for (int32_t l = theFirst; l < theFirst + theCount; ++l)
-            ++aCovered[static_cast<size_t>(l)];
-        },
-        [&](int32_t theFirst, int32_t theCount) { aWrites.emplace_back(theFirst, theCount); });
-    EXPECT_TRUE(aInsideBand);
-    EXPECT_EQ(aReads, aWrites);
-    for (size_t i = 0; i < aReads.size(); ++i)
-      EXPECT_EQ(aReads[i], std::make_pair(static_cast<int32_t>(i) * aCase.mBand,
-                                          std::min(aCase.mBand, aCase.mLines - static_cast<int32_t>(i) * aCase.mBand)));
-    EXPECT_EQ(std::set<int>(aCovered.begin(), aCovered.end()), aCase.mLines ? std::set<int>{1} : std::set<int>{});
   }
 }

@@ -15,6 +15,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_step_common.h"
+#include "tlrx_line_bands.h"
 #include "tlrx_threads.h"
 
 namespace {
@@ -28,6 +29,28 @@ constexpr int32_t CTLRX_FLATTENING_BLOCK = 16;
 SNoData phaseNoData(const CDescription &theHeader) {
   const CDescriptionField *aField = theHeader.findField("RasterInfo.NullCellValue");
   return aField != nullptr && aField->holdsValue() ? SNoData(aField->getDouble()) : SNoData(std::nan(""));
+}
+
+// One line turned by minus its phase; a cell without data, zero or with a
+// phase without data gives 0. Returns the cells turned.
+int64_t fdfFlattenLine(std::complex<float> *theCells, const uint8_t *theValid, const double *thePhases,
+                       int32_t thePixels, const SNoData &thePhaseNull) {
+  int64_t aCount = 0;
+  for (int32_t j = 0; j < thePixels; ++j) {
+    std::complex<float> &z = theCells[j];
+    const double aAngle = thePhases[j];
+    if (theValid[j] == 0 || z == std::complex<float>() || thePhaseNull.isNullOrNaN(aAngle)) {
+      z = std::complex<float>();
+      continue;
+    }
+    // Turned in double: the magnitude is kept to float rounding.
+    double aSin = 0.0, aCos = 1.0;
+    ::sincos(-aAngle, &aSin, &aCos);
+    const double a = z.real(), b = z.imag();
+    z = std::complex<float>(static_cast<float>(a * aCos - b * aSin), static_cast<float>(a * aSin + b * aCos));
+    ++aCount;
+  }
+  return aCount;
 }
 
 } // namespace
@@ -82,50 +105,38 @@ int tlrx_flattening(int argc, char **argv) {
   const SNoData aPhaseNull = phaseNoData(aPhaseHeader);
   // Bands of lines read and written in order; the cells are turned on
   // blocks of lines in parallel, each line on its own.
-  const SLineBands aBands = fdfLineBands(aLines, CTLRX_FLATTENING_BLOCK);
-  const size_t aPixelCount = static_cast<size_t>(aPixels), aBand = static_cast<size_t>(aBands.mBand);
-  std::vector<std::complex<float>> aCells(aBand * aPixelCount);
-  std::vector<uint8_t> aValid(aBand * aPixelCount);
-  std::vector<double> aPhases(aBand * aPixelCount);
-  std::vector<int64_t> aBlockCounts(aBand / static_cast<size_t>(aBands.mBlock) + 1, 0);
+  const SBandPlan aPlan = fdfLineBandPlan(aLines, CTLRX_FLATTENING_BLOCK, fdfThreadCount());
+  CBandLines<std::complex<float>> aCells(aPlan.mBand, aPixels);
+  CBandLines<uint8_t> aValid(aPlan.mBand, aPixels);
+  CBandLines<double> aPhases(aPlan.mBand, aPixels);
+  // Counts per block of the band, added in block order.
+  std::vector<int64_t> aBlockCounts(static_cast<size_t>(aPlan.mBand / aPlan.mBlock + 1), 0);
   CLineProgress aProgress(99.0);
   int64_t aFlattened = 0;
   int32_t aBandFirst = 0;
-  fdfRunLineBands(
-      aBands,
-      [&](int32_t theFirst, int32_t theCount) {
-        aBandFirst = theFirst;
-        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+  fdfRunBands(
+      aPlan, fdfParallelFor,
+      [&](const SLineBand &theBand) {
+        aBandFirst = theBand.mFirst;
+        aCells.start(theBand.mFirst);
+        aValid.start(theBand.mFirst);
+        aPhases.start(theBand.mFirst);
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, aLines);
-          const size_t aAt = static_cast<size_t>(l - theFirst) * aPixelCount;
-          aZ.getComplexLine(aCells.data() + aAt, l, 0, -1, aValid.data() + aAt);
-          aPhi.getLine(aPhases.data() + aAt, l);
+          aZ.getComplexLine(aCells.line(l), l, 0, -1, aValid.line(l));
+          aPhi.getLine(aPhases.line(l), l);
         }
       },
       [&](int32_t theFirst, int32_t theCount, int) {
         int64_t aCount = 0;
-        for (size_t i = static_cast<size_t>(theFirst - aBandFirst) * aPixelCount,
-                    aEnd = i + static_cast<size_t>(theCount) * aPixelCount;
-             i < aEnd; ++i) {
-          std::complex<float> &z = aCells[i];
-          const double aAngle = aPhases[i];
-          if (aValid[i] == 0 || z == std::complex<float>() || aPhaseNull.isNullOrNaN(aAngle)) {
-            z = std::complex<float>();
-            continue;
-          }
-          // Turned in double: the magnitude is kept to float rounding.
-          double aSin = 0.0, aCos = 1.0;
-          ::sincos(-aAngle, &aSin, &aCos);
-          const double a = z.real(), b = z.imag();
-          z = std::complex<float>(static_cast<float>(a * aCos - b * aSin), static_cast<float>(a * aSin + b * aCos));
-          ++aCount;
-        }
-        aBlockCounts[static_cast<size_t>((theFirst - aBandFirst) / aBands.mBlock)] = aCount;
-      },
-      [&](int32_t theFirst, int32_t theCount) {
         for (int32_t l = theFirst; l < theFirst + theCount; ++l)
-          aOut.file().putComplexLine(l, aCells.data() + static_cast<size_t>(l - theFirst) * aPixelCount);
-        const int32_t aBlocks = (theCount + aBands.mBlock - 1) / aBands.mBlock;
+          aCount += fdfFlattenLine(aCells.line(l), aValid.line(l), aPhases.line(l), aPixels, aPhaseNull);
+        aBlockCounts[static_cast<size_t>((theFirst - aBandFirst) / aPlan.mBlock)] = aCount;
+      },
+      [&](const SLineBand &theBand) {
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
+          aOut.file().putComplexLine(l, aCells.line(l));
+        const int32_t aBlocks = (theBand.mCount + aPlan.mBlock - 1) / aPlan.mBlock;
         for (int32_t k = 0; k < aBlocks; ++k)
           aFlattened += aBlockCounts[static_cast<size_t>(k)];
       });

@@ -30,6 +30,7 @@
 #include "tlrx_slave_resampler.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_step_common.h"
+#include "tlrx_line_bands.h"
 #include "tlrx_threads.h"
 
 namespace {
@@ -520,7 +521,7 @@ public:
   // written in order.
   void run(SResults &theResults) {
     mResults = &theResults;
-    const SLineBands aBands = fdfLineBands(mLines, blockLines(mLooks.mAzimuth));
+    const SBandPlan aBands = fdfLineBandPlan(mLines, blockLines(mLooks.mAzimuth), fdfThreadCount());
     while (mWorkers.size() < static_cast<size_t>(fdfThreadCount()))
       mWorkers.push_back(std::make_unique<SBlockWorker>(mPixels, mLooks.mFactor, mOutPixels));
     const size_t aBand = static_cast<size_t>(aBands.mBand), aPixels = static_cast<size_t>(mPixels);
@@ -536,17 +537,17 @@ public:
       mBandResampled[1].resize(aBand * aPixels);
     }
     CLineProgress aProgress(99.0);
-    fdfRunLineBands(
-        aBands,
-        [&](int32_t theFirst, int32_t theCount) {
-          for (int32_t y = theFirst; y < theFirst + theCount; ++y)
+    fdfRunBands(
+        aBands, fdfParallelFor,
+        [&](const SLineBand &theBand) {
+          for (int32_t y = theBand.mFirst; y < theBand.mFirst + theBand.mCount; ++y)
             aProgress.update(y, mLines);
-          enterBand(theFirst, theCount);
+          enterBand(theBand.mFirst, theBand.mCount);
         },
         [&](int32_t theFirst, int32_t theCount, int theThread) {
           computeBlock(theFirst, theCount, *mWorkers[static_cast<size_t>(theThread)]);
         },
-        [&](int32_t theFirst, int32_t theCount) { writeBand(theFirst, theCount); });
+        [&](const SLineBand &theBand) { writeBand(theBand.mFirst, theBand.mCount); });
     for (const std::unique_ptr<SBlockWorker> &aWorker : mWorkers)
       mProcessed += aWorker->mProcessed;
   }

@@ -42,6 +42,8 @@
 // blocks of a band computed in parallel.
 #pragma once
 
+#include "tlrx_line_bands.h"
+
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -169,55 +171,7 @@ inline void fdfRunWindowSchedule(CWindowRing &theRing, const TLRXWindowLoad &the
   fdfRunWindowLines(theRing, 0, theRing.lines(), theLoad, theEmit);
 }
 
-// ------------------------------------------------------------ band runner
-// A parallel loop: theBody(i, t) once for every i in [0, theCount), t < the
-// number of threads naming the thread (callers pass fdfParallelFor).
-using TLRXBlockBody = std::function<void(int64_t theIndex, int theThread)>;
-using TLRXParallelFor = std::function<void(int64_t theCount, const TLRXBlockBody &theBody)>;
-
-// Output lines mFirst .. mFirst + mCount - 1 of a band and the input lines
-// mInFirst .. mInFirst + mInCount - 1 their values need.
-struct SLineBand {
-  int32_t mFirst = 0;
-  int32_t mCount = 0;
-  int32_t mInFirst = 0;
-  int32_t mInCount = 0;
-};
-
-// How an image of mLines lines (input and output alike) is streamed: bands of
-// mBand lines, each cut into blocks of mBlock lines, both starting at
-// multiples of their length counted from line 0; an output line needs the
-// input lines mAbove above it to mBelow below it (clipped to the image).
-// mBlock is the grain of the parallel work, mBand how many lines are held;
-// the users below make neither shape their results.
-struct SBandPlan {
-  int32_t mLines = 0;
-  int32_t mBlock = 1;
-  int32_t mBand = 1;
-  int32_t mAbove = 0;
-  int32_t mBelow = 0;
-  // Input lines a band can need: what a band buffer must hold.
-  int32_t bandInputLines() const { return mBand + mAbove + mBelow; }
-};
-
-// A plan of blocks of theBlock lines, theBlocksPerThread blocks per thread in
-// a band (the band no longer than the image rounded up to whole blocks).
-SBandPlan fdfBandPlan(int32_t theLines, int32_t theBlock, int theThreads, int theBlocksPerThread, int32_t theAbove,
-                      int32_t theBelow);
-
-// A band's input lines on the calling thread (read), or its output lines
-// (write).
-using TLRXBandStep = std::function<void(const SLineBand &theBand)>;
-// Output lines theFirst .. theFirst + theCount - 1 computed on thread theThread.
-using TLRXBlockStep = std::function<void(int32_t theFirst, int32_t theCount, int theThread)>;
-
-// For each band in order: theRead on the calling thread, theCompute on the
-// band's blocks in parallel, then theWrite on the calling thread. An
-// exception of a block is rethrown here (the parallel loop's rule), before
-// the band is written.
-void fdfRunBands(const SBandPlan &thePlan, const TLRXParallelFor &theParallelFor, const TLRXBandStep &theRead,
-                 const TLRXBlockStep &theCompute, const TLRXBandStep &theWrite);
-
+// ------------------------------------------------------------ window bands
 // Lines of a window block: a multiple of R (so every block starts afresh at a
 // recomputation line) of at least 4 R and about 64 lines, so the R - 1 lines
 // a block that starts afresh loads again stay a small part of its work (at

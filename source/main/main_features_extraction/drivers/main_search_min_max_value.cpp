@@ -15,6 +15,7 @@
 #include "tlrx_raster_file.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_line_bands.h"
 #include "tlrx_threads.h"
 
 #include <algorithm>
@@ -142,22 +143,22 @@ int32_t fdfRunMinMax(const char *theArguments) {
   }
   const float aNull = static_cast<float>(aOut[0]->file().getDummyVal());
 
-  const SLineBands aBands = fdfLineBands(aLines, CTLRX_MINMAX_BLOCK_LINES);
-  std::vector<CBandLines<float>> aInBand(static_cast<size_t>(aInputs), CBandLines<float>(aBands, aPixels));
-  std::vector<CBandLines<float>> aOutBand(4, CBandLines<float>(aBands, aPixels));
+  const SBandPlan aPlan = fdfLineBandPlan(aLines, CTLRX_MINMAX_BLOCK_LINES, fdfThreadCount());
+  std::vector<CBandLines<float>> aInBand(static_cast<size_t>(aInputs), CBandLines<float>(aPlan.mBand, aPixels));
+  std::vector<CBandLines<float>> aOutBand(4, CBandLines<float>(aPlan.mBand, aPixels));
   // Per thread: the input lines of the pixel row in hand and the validity flags.
   const size_t aThreads = static_cast<size_t>(fdfThreadCount());
   std::vector<std::vector<const float *>> aRows(aThreads, std::vector<const float *>(aInBand.size()));
   std::vector<std::vector<uint8_t>> aValid(aThreads, std::vector<uint8_t>(aPixels));
   CLineProgress aProgress(50.0);
-  fdfRunLineBands(
-      aBands,
-      [&](int32_t theFirst, int32_t theCount) {
+  fdfRunBands(
+      aPlan, fdfParallelFor,
+      [&](const SLineBand &theBand) {
         for (auto &aBand : aInBand)
-          aBand.start(theFirst);
+          aBand.start(theBand.mFirst);
         for (auto &aBand : aOutBand)
-          aBand.start(theFirst);
-        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          aBand.start(theBand.mFirst);
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, aLines);
           for (int32_t i = 0; i < aInputs; ++i)
             aIn[i]->getLine(aInBand[i].line(l), l);
@@ -172,8 +173,8 @@ int32_t fdfRunMinMax(const char *theArguments) {
                         {aOutBand[0].line(l), aOutBand[1].line(l), aOutBand[2].line(l), aOutBand[3].line(l)});
         }
       },
-      [&](int32_t theFirst, int32_t theCount) {
-        for (int32_t l = theFirst; l < theFirst + theCount; ++l)
+      [&](const SLineBand &theBand) {
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
           for (int k = 0; k < 4; ++k)
             aOut[k]->file().putLine(l, aOutBand[static_cast<size_t>(k)].line(l));
       });

@@ -13,6 +13,7 @@
 #include "tlrx_ratio_line.h"
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
+#include "tlrx_line_bands.h"
 #include "tlrx_threads.h"
 #include "tlrx_window_step.h"
 
@@ -87,17 +88,17 @@ int ratio_images(int argc, char **argv) {
 
   const int32_t aLines = aFirst.lines();
   const int32_t aPixels = aFirst.pixels();
-  const SLineBands aBands = fdfLineBands(aLines, CTLRX_RATIO_BLOCK_LINES);
-  CBandLines<float> aBand1(aBands, aPixels), aBand2(aBands, aPixels), aResult(aBands, aPixels);
+  const SBandPlan aPlan = fdfLineBandPlan(aLines, CTLRX_RATIO_BLOCK_LINES, fdfThreadCount());
+  CBandLines<float> aBand1(aPlan.mBand, aPixels), aBand2(aPlan.mBand, aPixels), aResult(aPlan.mBand, aPixels);
   // Counts per thread, added up after the pass: integers, so in any order.
   std::vector<std::array<long long, CTLRX_RATIO_COUNTED_CLASSES>> aCounts(static_cast<size_t>(fdfThreadCount()));
   CLineProgress aProgress(99.0);
-  fdfRunLineBands(
-      aBands,
-      [&](int32_t theFirst, int32_t theCount) {
+  fdfRunBands(
+      aPlan, fdfParallelFor,
+      [&](const SLineBand &theBand) {
         for (CBandLines<float> *aBand : {&aBand1, &aBand2, &aResult})
-          aBand->start(theFirst);
-        for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine) {
+          aBand->start(theBand.mFirst);
+        for (int32_t aLine = theBand.mFirst; aLine < theBand.mFirst + theBand.mCount; ++aLine) {
           aProgress.update(aLine, aLines);
           aFirst.readFloatLine(aLine, aBand1.line(aLine));
           aSecond.readFloatLine(aLine, aBand2.line(aLine));
@@ -108,8 +109,8 @@ int ratio_images(int argc, char **argv) {
           fdfRatioLine(aBand1.line(aLine), aFirst.nullValue(), aBand2.line(aLine), aSecond.nullValue(), aPixels,
                        aDecibel, aNull, aResult.line(aLine), aCounts[static_cast<size_t>(theThread)].data());
       },
-      [&](int32_t theFirst, int32_t theCount) {
-        for (int32_t aLine = theFirst; aLine < theFirst + theCount; ++aLine)
+      [&](const SLineBand &theBand) {
+        for (int32_t aLine = theBand.mFirst; aLine < theBand.mFirst + theBand.mCount; ++aLine)
           aOut.file().putLine(aLine, aResult.line(aLine));
       });
   long long aHistogram[CTLRX_RATIO_COUNTED_CLASSES] = {};

@@ -21,6 +21,7 @@
 #include "tlrx_result_files.h"
 #include "tlrx_standard_header.h"
 #include "tlrx_temporal_grid.h"
+#include "tlrx_line_bands.h"
 #include "tlrx_threads.h"
 
 #include <algorithm>
@@ -226,17 +227,17 @@ std::vector<std::unique_ptr<SOpenOutput>> fdfOpenOutputs(const STemporalRequest 
 // lines written in order.
 void fdfWriteFeatureLines(CInputRows &theSource, const CTemporalSeries &theSeries, int32_t theLines,
                           int32_t thePixels, size_t theInputs, std::vector<std::unique_ptr<SOpenOutput>> &theOpen) {
-  const SLineBands aBands = fdfLineBands(theLines, CTLRX_TF_BLOCK_LINES);
-  CBandLines<double> aRows(aBands, static_cast<int32_t>(theInputs) * thePixels);
+  const SBandPlan aPlan = fdfLineBandPlan(theLines, CTLRX_TF_BLOCK_LINES, fdfThreadCount());
+  CBandLines<double> aRows(aPlan.mBand, static_cast<int32_t>(theInputs) * thePixels);
   // One band of lines per output: values as floats, dates as integers.
-  std::vector<CBandLines<float>> aValueBands(CTLRX_TF_VALUE_COUNT, CBandLines<float>(SLineBands{}, 0));
-  std::vector<CBandLines<int32_t>> aDateBands(2, CBandLines<int32_t>(SLineBands{}, 0));
+  std::vector<CBandLines<float>> aValueBands(CTLRX_TF_VALUE_COUNT, CBandLines<float>(0, 0));
+  std::vector<CBandLines<int32_t>> aDateBands(2, CBandLines<int32_t>(0, 0));
   for (const auto &aOutput : theOpen) {
     const int aFeature = aOutput->mFeature;
     if (sOutputs[aFeature].mDate)
-      aDateBands[aFeature - CTLRX_TF_DATE_MAX] = CBandLines<int32_t>(aBands, thePixels);
+      aDateBands[aFeature - CTLRX_TF_DATE_MAX] = CBandLines<int32_t>(aPlan.mBand, thePixels);
     else
-      aValueBands[aFeature] = CBandLines<float>(aBands, thePixels);
+      aValueBands[aFeature] = CBandLines<float>(aPlan.mBand, thePixels);
   }
   auto aLinesAt = [&](int32_t theLine) {
     STemporalLines aLines;
@@ -252,15 +253,15 @@ void fdfWriteFeatureLines(CInputRows &theSource, const CTemporalSeries &theSerie
   // Every thread reduces its pixels' series with a copy of its own.
   std::vector<CTemporalSeries> aSeries(static_cast<size_t>(fdfThreadCount()), theSeries);
   CLineProgress aProgress(100.0);
-  fdfRunLineBands(
-      aBands,
-      [&](int32_t theFirst, int32_t theCount) {
-        aRows.start(theFirst);
+  fdfRunBands(
+      aPlan, fdfParallelFor,
+      [&](const SLineBand &theBand) {
+        aRows.start(theBand.mFirst);
         for (auto &aBand : aValueBands)
-          aBand.start(theFirst);
+          aBand.start(theBand.mFirst);
         for (auto &aBand : aDateBands)
-          aBand.start(theFirst);
-        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+          aBand.start(theBand.mFirst);
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, theLines);
           theSource.read(l, aRows.line(l));
         }
@@ -269,8 +270,8 @@ void fdfWriteFeatureLines(CInputRows &theSource, const CTemporalSeries &theSerie
         for (int32_t l = theFirst; l < theFirst + theCount; ++l)
           aSeries[static_cast<size_t>(theThread)].line(aRows.line(l), thePixels, aLinesAt(l));
       },
-      [&](int32_t theFirst, int32_t theCount) {
-        for (int32_t l = theFirst; l < theFirst + theCount; ++l) {
+      [&](const SLineBand &theBand) {
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           const STemporalLines aLines = aLinesAt(l);
           for (const auto &aOutput : theOpen) {
             const int aFeature = aOutput->mFeature;

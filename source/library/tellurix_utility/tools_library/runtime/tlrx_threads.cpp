@@ -89,28 +89,3 @@ void fdfParallelFor(int64_t theCount, const TLRXPieceBody &theBody) {
   }
   aFailure.rethrow();
 }
-
-SLineBands fdfLineBands(int32_t theLines, int32_t theBlock, int32_t theBlocksPerThread) {
-  SLineBands aBands;
-  aBands.mLines = std::max(0, theLines);
-  aBands.mBlock = std::max(1, theBlock);
-  const int64_t aBand = int64_t(aBands.mBlock) * std::max(1, theBlocksPerThread) * fdfThreadCount();
-  // No band longer than the image rounded up to whole blocks.
-  const int64_t aImage = (int64_t(aBands.mLines) + aBands.mBlock - 1) / aBands.mBlock * aBands.mBlock;
-  aBands.mBand = static_cast<int32_t>(std::max<int64_t>(aBands.mBlock, std::min(aBand, aImage)));
-  return aBands;
-}
-
-void fdfRunLineBands(const SLineBands &theBands, const TLRXLineRange &theRead, const TLRXLineBlock &theCompute,
-                     const TLRXLineRange &theWrite) {
-  for (int32_t aFirst = 0; aFirst < theBands.mLines; aFirst += theBands.mBand) {
-    const int32_t aCount = std::min(theBands.mBand, theBands.mLines - aFirst);
-    theRead(aFirst, aCount);
-    const int64_t aBlocks = (aCount + theBands.mBlock - 1) / theBands.mBlock;
-    fdfParallelFor(aBlocks, [&](int64_t theBlock, int theThread) {
-      const int32_t aStart = aFirst + static_cast<int32_t>(theBlock) * theBands.mBlock;
-      theCompute(aStart, std::min(theBands.mBlock, aFirst + aCount - aStart), theThread);
-    });
-    theWrite(aFirst, aCount);
-  }
-}
