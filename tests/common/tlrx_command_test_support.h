@@ -9,7 +9,10 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <dirent.h>
 #include <functional>
+#include <regex>
 #include <map>
 #include <string>
 #include <vector>
@@ -34,6 +37,32 @@ inline int32_t tlrxRaisedCode(const std::function<void()> &theBody, std::string 
     return aError.mCode;
   }
   return 0;
+}
+
+// Every file of theFolder, by name: "name\ncontent", the folder's own path
+// in the contents replaced by "T/" (headers name their rasters).
+inline std::vector<std::string> tlrxFolderContents(const std::string &theFolder) {
+  std::vector<std::string> aNames;
+  if (DIR *aDir = opendir(theFolder.c_str())) {
+    while (const dirent *aEntry = readdir(aDir))
+      if (aEntry->d_name[0] != '.')
+        aNames.push_back(aEntry->d_name);
+    closedir(aDir);
+  }
+  std::sort(aNames.begin(), aNames.end());
+  for (std::string &aName : aNames)
+    aName += "\n" + std::regex_replace(tlrxReadFile(theFolder + aName), std::regex(theFolder), "T/");
+  return aNames;
+}
+
+// theFolders hold the same files as theReference, byte for byte.
+inline void tlrxExpectSameFolders(const std::vector<std::string> &theReference,
+                                  const std::vector<std::string> &theOther, const std::string &theWhat) {
+  ASSERT_GE(theReference.size(), 1u) << theWhat;
+  ASSERT_EQ(theOther.size(), theReference.size()) << theWhat << ": the files written differ";
+  for (size_t f = 0; f < theReference.size(); ++f)
+    EXPECT_TRUE(theOther[f] == theReference[f]) << theWhat << ": " << theReference[f].substr(0, theReference[f].find('\n'))
+                                                << " differs";
 }
 
 class CommandTest : public ::testing::Test {

@@ -6,26 +6,12 @@
 #include "tlrx_temporal_test_support.h"
 
 #include <chrono>
-#include <dirent.h>
 #include <future>
 #include <regex>
 #include <sys/stat.h>
 #include <thread>
 
 namespace {
-
-// The files of a folder, by name.
-std::vector<std::string> tlrxFolderFiles(const std::string &theFolder) {
-  std::vector<std::string> aNames;
-  if (DIR *aDir = opendir(theFolder.c_str())) {
-    while (const dirent *aEntry = readdir(aDir))
-      if (aEntry->d_name[0] != '.')
-        aNames.push_back(aEntry->d_name);
-    closedir(aDir);
-  }
-  std::sort(aNames.begin(), aNames.end());
-  return aNames;
-}
 
 class ThreadsTest : public CommandTest {
 protected:
@@ -54,19 +40,10 @@ protected:
       const STLRXRun aRun = theRun(aFolder, aThreads);
       ASSERT_EQ(aRun.mExitStatus, 0) << theWhat << " with " << aThreads << " threads: " << error() << aRun.mOutput;
       EXPECT_TRUE(tlrxContains(trace(), "threads = " + std::string(aThreads) + "\n")) << theWhat;
-      std::vector<std::string> aFiles;
-      for (const std::string &aName : tlrxFolderFiles(aFolder))
-        aFiles.push_back(aName + "\n" + std::regex_replace(tlrxReadFile(aFolder + aName), std::regex(aFolder), "T/"));
-      aContents.push_back(aFiles);
+      aContents.push_back(tlrxFolderContents(aFolder));
     }
-    ASSERT_GE(aContents[0].size(), 1u) << theWhat;
-    for (size_t t = 1; t < aContents.size(); ++t) {
-      ASSERT_EQ(aContents[t].size(), aContents[0].size()) << theWhat << ": the files written differ";
-      for (size_t f = 0; f < aContents[0].size(); ++f)
-        EXPECT_TRUE(aContents[t][f] == aContents[0][f])
-            << theWhat << ": " << aContents[0][f].substr(0, aContents[0][f].find('\n')) << " differs with " << t + 1
-            << " threads";
-    }
+    for (size_t t = 1; t < aContents.size(); ++t)
+      tlrxExpectSameFolders(aContents[0], aContents[t], theWhat + " with " + std::to_string(t + 1) + " threads");
   }
   // The test's configuration (tracing on) and the thread count.
   std::map<std::string, std::string> threads(const std::string &theCount) const {
