@@ -98,6 +98,20 @@ protected:
   }
 
   std::string log() const { return tlrxReadFile(mDir.file("Process.log")); }
+
+  // A NUMBER raster theName of theLines x thePixels cells theValue(l, p).
+  std::string numberRaster(const char *theName, int theLines, int thePixels,
+                           const std::function<double(int, int)> &theValue) {
+    STLRXTestRaster aTest;
+    aTest.mLines = theLines;
+    aTest.mPixels = thePixels;
+    aTest.mDataUnits = "NUMBER";
+    for (int l = 0; l < theLines; ++l)
+      for (int p = 0; p < thePixels; ++p)
+        aTest.mValues.push_back(theValue(l, p));
+    tlrxWriteTestRaster(mDir.file(theName), aTest);
+    return mDir.file(theName);
+  }
 };
 
 // Rewrites the header of theRaster after theEdit.
@@ -331,15 +345,7 @@ TEST_F(Interferogram, ThreadCountDoesNotChangeTheResult) {
   const int aLines = 203, aPixels = 53;
   const std::string aRoot = simulate("thr", {"--lines", "203", "--pixels", "53", "--coherence", "0.8", "--shift",
                                              "0.3,-0.45", "--doppler", "0.05,-0.05", "--range-band-shift", "0.1"});
-  STLRXTestRaster aPhase;
-  aPhase.mLines = aLines;
-  aPhase.mPixels = aPixels;
-  aPhase.mDataUnits = "NUMBER";
-  for (int l = 0; l < aLines; ++l)
-    for (int p = 0; p < aPixels; ++p)
-      aPhase.mValues.push_back(0.3 * p - 0.02 * l);
-  tlrxWriteTestRaster(mDir.file("sint"), aPhase);
-  const std::string aSint = mDir.file("sint");
+  const std::string aSint = numberRaster("sint", aLines, aPixels, [](int l, int p) { return 0.3 * p - 0.02 * l; });
   // Arguments 7 on, and the result's pixels: 53 x 2 oversampled, in groups
   // of 2 x range looks (1 for -2).
   const struct {
@@ -440,15 +446,7 @@ TEST_F(Interferogram, ShiftRastersSyntheticPhaseAndIncidence) {
                                              "1,-0.5", "--phase-ramp", "0,0.05"});
   parameters(aRoot + "_1", 1, -0.5);
   const auto aRaster = [&](const char *theName, const std::function<double(int, int)> &theValue) {
-    STLRXTestRaster aTest;
-    aTest.mLines = n;
-    aTest.mPixels = aPixels;
-    aTest.mDataUnits = "NUMBER";
-    for (int l = 0; l < n; ++l)
-      for (int p = 0; p < aPixels; ++p)
-        aTest.mValues.push_back(theValue(l, p));
-    tlrxWriteTestRaster(mDir.file(theName), aTest);
-    return mDir.file(theName);
+    return numberRaster(theName, n, aPixels, theValue);
   };
   const std::string aRange = aRaster("shr", [](int, int) { return 1.0; }),
                     aAzimuth = aRaster("sha", [](int, int) { return -0.5; });
