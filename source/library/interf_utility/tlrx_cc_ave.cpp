@@ -240,15 +240,13 @@ private:
 class CCcOutput {
 public:
   CCcOutput(CResultRaster &theOut, int32_t theLines, int32_t thePixels, int32_t theBandLines)
-      : mOut(theOut), mLines(theLines), mPixels(static_cast<size_t>(thePixels)),
-        mValues(static_cast<size_t>(theBandLines) * mPixels) {}
+      : mOut(theOut), mLines(theLines), mValues(theBandLines, thePixels) {}
 
   void start(const SLineBand &theBand) {
     for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
       mProgress.update(l, mLines);
-    mFirst = theBand.mFirst;
   }
-  float *line(int32_t theLine) { return &mValues[static_cast<size_t>(theLine - mFirst) * mPixels]; }
+  float *line(int32_t theLine) { return mValues.line(theLine); }
   void write(const SLineBand &theBand) {
     for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
       mOut.file().putLine(l, line(l));
@@ -257,10 +255,8 @@ public:
 private:
   CResultRaster &mOut;
   int32_t mLines;
-  size_t mPixels;
-  std::vector<float> mValues;
+  CBandLines<float> mValues;
   CLineProgress mProgress{97.0, 1};
-  int32_t mFirst = 0;
 };
 
 // Plain path: running sums through the window rings.

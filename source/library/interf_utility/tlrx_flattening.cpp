@@ -113,14 +113,9 @@ int tlrx_flattening(int argc, char **argv) {
   std::vector<int64_t> aBlockCounts(static_cast<size_t>(aPlan.mBand / aPlan.mBlock + 1), 0);
   CLineProgress aProgress(99.0);
   int64_t aFlattened = 0;
-  int32_t aBandFirst = 0;
   fdfRunBands(
       aPlan, fdfParallelFor,
       [&](const SLineBand &theBand) {
-        aBandFirst = theBand.mFirst;
-        aCells.start(theBand.mFirst);
-        aValid.start(theBand.mFirst);
-        aPhases.start(theBand.mFirst);
         for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, aLines);
           aZ.getComplexLine(aCells.line(l), l, 0, -1, aValid.line(l));
@@ -131,7 +126,7 @@ int tlrx_flattening(int argc, char **argv) {
         int64_t aCount = 0;
         for (int32_t l = theFirst; l < theFirst + theCount; ++l)
           aCount += fdfFlattenLine(aCells.line(l), aValid.line(l), aPhases.line(l), aPixels, aPhaseNull);
-        aBlockCounts[static_cast<size_t>((theFirst - aBandFirst) / aPlan.mBlock)] = aCount;
+        aBlockCounts[static_cast<size_t>(theFirst % aPlan.mBand / aPlan.mBlock)] = aCount;
       },
       [&](const SLineBand &theBand) {
         for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)

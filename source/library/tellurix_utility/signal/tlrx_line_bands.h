@@ -5,6 +5,7 @@
 // caller's (fdfParallelFor of the runtime), so this library uses no other.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <functional>
 #include <vector>
@@ -63,18 +64,20 @@ using TLRXBlockStep = std::function<void(int32_t theFirst, int32_t theCount, int
 void fdfRunBands(const SBandPlan &thePlan, const TLRXParallelFor &theParallelFor, const TLRXBandStep &theRead,
                  const TLRXBlockStep &theCompute, const TLRXBandStep &theWrite);
 
-// The lines of the band in hand for one raster or result: line l of the
-// image at (l - first) * pixels. Blocks write disjoint lines.
+// The lines of the band in hand for one raster or result, for bands of
+// theBandLines lines that start at multiples of theBandLines (as the runner's
+// do): line l of the image at (l mod theBandLines) * pixels. Blocks write
+// disjoint lines.
 template <typename T>
 class CBandLines {
 public:
   CBandLines(int32_t theBandLines, int32_t thePixels)
-      : mPixels(static_cast<size_t>(thePixels)), mValues(static_cast<size_t>(theBandLines) * mPixels) {}
-  void start(int32_t theFirst) { mFirst = theFirst; }
-  T *line(int32_t theLine) { return &mValues[static_cast<size_t>(theLine - mFirst) * mPixels]; }
+      : mBand(std::max(1, theBandLines)), mPixels(static_cast<size_t>(thePixels)),
+        mValues(static_cast<size_t>(mBand) * mPixels) {}
+  T *line(int32_t theLine) { return &mValues[static_cast<size_t>(theLine % mBand) * mPixels]; }
 
 private:
+  int32_t mBand;
   size_t mPixels;
   std::vector<T> mValues;
-  int32_t mFirst = 0;
 };

@@ -154,10 +154,6 @@ int32_t fdfRunMinMax(const char *theArguments) {
   fdfRunBands(
       aPlan, fdfParallelFor,
       [&](const SLineBand &theBand) {
-        for (auto &aBand : aInBand)
-          aBand.start(theBand.mFirst);
-        for (auto &aBand : aOutBand)
-          aBand.start(theBand.mFirst);
         for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, aLines);
           for (int32_t i = 0; i < aInputs; ++i)

@@ -96,8 +96,6 @@ int ratio_images(int argc, char **argv) {
   fdfRunBands(
       aPlan, fdfParallelFor,
       [&](const SLineBand &theBand) {
-        for (CBandLines<float> *aBand : {&aBand1, &aBand2, &aResult})
-          aBand->start(theBand.mFirst);
         for (int32_t aLine = theBand.mFirst; aLine < theBand.mFirst + theBand.mCount; ++aLine) {
           aProgress.update(aLine, aLines);
           aFirst.readFloatLine(aLine, aBand1.line(aLine));

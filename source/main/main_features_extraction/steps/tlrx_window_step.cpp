@@ -173,31 +173,27 @@ void CWindowStep::runLines(CResultRaster &theOutput, int theChannels, const TLRX
                            const TLRXWindowValues &theValues) {
   CWindowInput &aFirst = *mInputs[0];
   const int32_t aLines = aFirst.lines();
-  const size_t aPixels = static_cast<size_t>(aFirst.pixels());
   CWindowBands aBands(mShape, aLines, aFirst.pixels(), theChannels, threads(), fdfParallelFor);
-  std::vector<float> aOut(static_cast<size_t>(aBands.plan().mBand) * aPixels);
+  CBandLines<float> aOut(aBands.plan().mBand, aFirst.pixels());
   for (const auto &aInput : mInputs)
     aInput->reserveLines(aBands.plan().bandInputLines());
   CLineProgress aProgress(97.0, 2);
-  int32_t aBandFirst = 0;
   aBands.run(
       [&](const SLineBand &theBand) {
         for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
           aProgress.update(l, aLines);
         for (const auto &aInput : mInputs)
           aInput->readBand(theBand.mInFirst, theBand.mInCount);
-        aBandFirst = theBand.mFirst;
       },
       [&](CWindowRing &theRing, int32_t theLine, int) {
         theTerms(theLine, theRing.termArrays().data(), theRing.centre(theLine));
       },
       [&](CWindowRing &theRing, int32_t theLine, int theThread) {
-        theValues(theThread, theRing.columnArrays().data(), theRing.centre(theLine),
-                  &aOut[static_cast<size_t>(theLine - aBandFirst) * aPixels]);
+        theValues(theThread, theRing.columnArrays().data(), theRing.centre(theLine), aOut.line(theLine));
       },
       [&](const SLineBand &theBand) {
-        for (int32_t l = 0; l < theBand.mCount; ++l)
-          theOutput.file().putLine(theBand.mFirst + l, &aOut[static_cast<size_t>(l) * aPixels]);
+        for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l)
+          theOutput.file().putLine(l, aOut.line(l));
       });
   for (const auto &aInput : mInputs)
     aInput->close();

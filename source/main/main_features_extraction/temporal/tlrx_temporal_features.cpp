@@ -256,11 +256,6 @@ void fdfWriteFeatureLines(CInputRows &theSource, const CTemporalSeries &theSerie
   fdfRunBands(
       aPlan, fdfParallelFor,
       [&](const SLineBand &theBand) {
-        aRows.start(theBand.mFirst);
-        for (auto &aBand : aValueBands)
-          aBand.start(theBand.mFirst);
-        for (auto &aBand : aDateBands)
-          aBand.start(theBand.mFirst);
         for (int32_t l = theBand.mFirst; l < theBand.mFirst + theBand.mCount; ++l) {
           aProgress.update(l, theLines);
           theSource.read(l, aRows.line(l));
